@@ -1,0 +1,68 @@
+#include "tests/support/log_capture.h"
+
+#include <QLoggingCategory>
+#include <QStringList>
+
+#include <atomic>
+
+namespace zaf::test {
+
+namespace {
+std::atomic<LogCapture *> g_active{nullptr};
+}
+
+LogCapture::LogCapture()
+{
+    // Debug output of every category is captured, whatever the environment's filter rules say.
+    QLoggingCategory::setFilterRules(QStringLiteral("*.debug=true"));
+    g_active.store(this);
+    m_previous = qInstallMessageHandler(&LogCapture::handler);
+}
+
+LogCapture::~LogCapture()
+{
+    qInstallMessageHandler(m_previous);
+    g_active.store(nullptr);
+}
+
+void LogCapture::handler(QtMsgType type, const QMessageLogContext &context, const QString &message)
+{
+    LogCapture *self = g_active.load();
+    if (!self)
+        return;
+    std::lock_guard lock(self->m_mutex);
+    self->m_entries.append({type, QString::fromLatin1(context.category ? context.category : "default"), message});
+}
+
+QList<LogEntry> LogCapture::entries() const
+{
+    std::lock_guard lock(m_mutex);
+    return m_entries;
+}
+
+QStringList LogCapture::messages(const QString &category) const
+{
+    std::lock_guard lock(m_mutex);
+    QStringList out;
+    for (const LogEntry &e : m_entries)
+        if (e.category == category)
+            out << e.message;
+    return out;
+}
+
+int LogCapture::count(const QString &message) const
+{
+    std::lock_guard lock(m_mutex);
+    int n = 0;
+    for (const LogEntry &e : m_entries)
+        n += e.message == message;
+    return n;
+}
+
+void LogCapture::clear()
+{
+    std::lock_guard lock(m_mutex);
+    m_entries.clear();
+}
+
+} // namespace zaf::test

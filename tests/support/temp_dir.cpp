@@ -1,0 +1,30 @@
+#include "tests/support/temp_dir.h"
+
+#include <QFile>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+namespace zaf::test {
+
+ScratchDir::ScratchDir() = default;
+
+QString ScratchDir::write(const QString &name, qint64 bytes) const
+{
+    const QString path = file(name);
+    QFile f(path);
+    if (f.open(QIODevice::WriteOnly))
+        f.write(QByteArray(int(bytes), 'z'));
+    return path;
+}
+
+bool setModificationTime(const QString &path, qint64 secondsSinceEpoch)
+{
+    struct timespec times[2];
+    times[0].tv_sec = secondsSinceEpoch;
+    times[0].tv_nsec = 0;
+    times[1] = times[0];
+    return ::utimensat(AT_FDCWD, QFile::encodeName(path).constData(), times, AT_SYMLINK_NOFOLLOW) == 0;
+}
+
+} // namespace zaf::test

@@ -1,0 +1,27 @@
+#pragma once
+
+// A private scratch directory for one test, removed with everything in it afterwards.
+
+#include <QString>
+#include <QTemporaryDir>
+
+namespace zaf::test {
+
+class ScratchDir {
+public:
+    ScratchDir();
+    // The directory's absolute path, without a trailing "/".
+    QString path() const { return m_dir.path(); }
+    // A path inside it.
+    QString file(const QString &name) const { return m_dir.filePath(name); }
+    // Writes `bytes` bytes to a file inside it and returns its path.
+    QString write(const QString &name, qint64 bytes) const;
+
+private:
+    QTemporaryDir m_dir;
+};
+
+// Sets a file's modification time to `secondsSinceEpoch` exactly (nanoseconds 0).
+bool setModificationTime(const QString &path, qint64 secondsSinceEpoch);
+
+} // namespace zaf::test
