@@ -1,0 +1,250 @@
+#include "platform/files/file_manager.h"
+
+#include <QByteArray>
+#include <QFile>
+
+#include <cerrno>
+#include <cstdio>
+#include <dirent.h>
+#include <fcntl.h>
+#include <filesystem>
+#include <sys/stat.h>
+#include <sys/statvfs.h>
+#include <unistd.h>
+
+namespace zaf {
+
+namespace {
+
+QByteArray encoded(const QString &path)
+{
+    return QFile::encodeName(path);
+}
+
+// The item a path names: "dir/" names "dir" (so a file in the way is found, and a link is not
+// followed merely because of the slash).
+QByteArray itemPath(const QString &path)
+{
+    QByteArray p = encoded(path);
+    while (p.size() > 1 && p.endsWith('/'))
+        p.chop(1);
+    return p;
+}
+
+Date toDate(const struct statx_timestamp &ts)
+{
+    using namespace std::chrono;
+    return Date(duration_cast<system_clock::duration>(seconds(ts.tv_sec) + nanoseconds(ts.tv_nsec)));
+}
+
+// Retries a system call interrupted by a signal.
+template <typename F>
+auto retrying(F f)
+{
+    decltype(f()) r;
+    do {
+        r = f();
+    } while (r == -1 && errno == EINTR);
+    return r;
+}
+
+OptionalError copyFileData(int in, int out, const QString &from)
+{
+    char buffer[1 << 16];
+    for (;;) {
+        const ssize_t n = retrying([&] { return ::read(in, buffer, sizeof buffer); });
+        if (n < 0)
+            return Error::fromErrno(errno, from);
+        if (n == 0)
+            return std::nullopt;
+        ssize_t written = 0;
+        while (written < n) {
+            const ssize_t w = retrying([&] { return ::write(out, buffer + written, size_t(n - written)); });
+            if (w < 0)
+                return Error::fromErrno(errno);
+            written += w;
+        }
+    }
+}
+
+} // namespace
+
+FileManager::~FileManager() = default;
+
+FileManager &FileManager::defaultManager()
+{
+    static FileManager instance;
+    return instance;
+}
+
+bool FileManager::fileExistsAtPath(const QString &path) const
+{
+    struct stat st;
+    return ::lstat(itemPath(path).constData(), &st) == 0;
+}
+
+OptionalError FileManager::createDirectoryAtPath(const QString &path, bool intermediates, mode_t mode) const
+{
+    if (intermediates) {
+        const int slash = path.lastIndexOf(QLatin1Char('/'), path.endsWith(QLatin1Char('/')) ? -2 : -1);
+        if (slash > 0) {
+            const QString parent = path.left(slash);
+            if (!fileExistsAtPath(parent)) {
+                if (OptionalError e = createDirectoryAtPath(parent, true, mode))
+                    return e;
+            }
+        }
+    }
+    if (::mkdir(encoded(path).constData(), mode) != 0) {
+        if (intermediates && errno == EEXIST) {
+            struct stat st;
+            if (::stat(encoded(path).constData(), &st) == 0 && S_ISDIR(st.st_mode))
+                return std::nullopt;
+        }
+        return Error::fromErrno(errno, path);
+    }
+    return std::nullopt;
+}
+
+Result<QStringList> FileManager::contentsOfDirectoryAtPath(const QString &path) const
+{
+    DIR *dir = ::opendir(encoded(path).constData());
+    if (!dir)
+        return Result<QStringList>::failure(Error::fromErrno(errno, path));
+    QStringList names;
+    errno = 0;
+    while (struct dirent *entry = ::readdir(dir)) {
+        const char *name = entry->d_name;
+        if (name[0] == '.' && (name[1] == '\0' || (name[1] == '.' && name[2] == '\0')))
+            continue;
+        names.append(QFile::decodeName(name));
+        errno = 0;
+    }
+    const int readError = errno;
+    ::closedir(dir);
+    if (readError != 0)
+        return Result<QStringList>::failure(Error::fromErrno(readError, path));
+    return Result<QStringList>::success(names);
+}
+
+Result<FileAttributes> FileManager::attributesOfItemAtPath(const QString &path) const
+{
+    struct statx sx;
+    if (::statx(AT_FDCWD, itemPath(path).constData(), AT_SYMLINK_NOFOLLOW,
+                STATX_BASIC_STATS | STATX_BTIME, &sx) != 0)
+        return Result<FileAttributes>::failure(Error::fromErrno(errno, path));
+    FileAttributes a;
+    a.size = std::int64_t(sx.stx_size);
+    a.modificationDate = toDate(sx.stx_mtime);
+    a.creationDate = (sx.stx_mask & STATX_BTIME) ? toDate(sx.stx_btime) : toDate(sx.stx_ctime);
+    a.isDirectory = S_ISDIR(sx.stx_mode);
+    a.isSymbolicLink = S_ISLNK(sx.stx_mode);
+    return Result<FileAttributes>::success(a);
+}
+
+OptionalError FileManager::removeItemAtPath(const QString &path) const
+{
+    const std::filesystem::path p(encoded(path).toStdString());
+    std::error_code ec;
+    const auto status = std::filesystem::symlink_status(p, ec);
+    if (ec || !std::filesystem::exists(status))
+        return Error::fromErrno(ec ? ec.value() : ENOENT, path);
+    std::filesystem::remove_all(p, ec);
+    if (ec)
+        return Error::fromErrno(ec.value(), path);
+    return std::nullopt;
+}
+
+OptionalError FileManager::moveItemAtPath(const QString &from, const QString &to) const
+{
+    const QByteArray src = encoded(from), dst = encoded(to);
+    if (::renameat2(AT_FDCWD, src.constData(), AT_FDCWD, dst.constData(), RENAME_NOREPLACE) == 0)
+        return std::nullopt;
+    const int err = errno;
+    if (err == EINVAL || err == ENOSYS) {
+        // The file system cannot refuse to replace atomically; check, then rename.
+        if (fileExistsAtPath(to))
+            return Error::fromErrno(EEXIST, to);
+        if (::rename(src.constData(), dst.constData()) == 0)
+            return std::nullopt;
+        return Error::fromErrno(errno, from);
+    }
+    if (err != EXDEV)
+        return Error::fromErrno(err, err == EEXIST ? to : from);
+    // Another file system: copy safely, then remove the source.
+    if (OptionalError e = copyItemAtPath(from, to))
+        return e;
+    return removeItemAtPath(from);
+}
+
+OptionalError FileManager::copyItemAtPath(const QString &from, const QString &to) const
+{
+    const int in = retrying([&] { return ::open(encoded(from).constData(), O_RDONLY | O_CLOEXEC); });
+    if (in < 0)
+        return Error::fromErrno(errno, from);
+    struct stat st;
+    const int statError = ::fstat(in, &st) != 0 ? errno : (S_ISREG(st.st_mode) ? 0 : EINVAL);
+    if (statError != 0) {
+        ::close(in);
+        return Error::fromErrno(statError, from);
+    }
+
+    // An unnamed file in the destination directory, linked in only when complete: a crash or a full
+    // disk never leaves a partial file under the destination's name.
+    const int slash = to.lastIndexOf(QLatin1Char('/'));
+    const QString dir = slash > 0 ? to.left(slash) : QStringLiteral(".");
+    QString tempPath;
+    int out = retrying([&] { return ::open(encoded(dir).constData(), O_TMPFILE | O_WRONLY | O_CLOEXEC, 0644); });
+    if (out < 0) {
+        // No O_TMPFILE on this file system: a hidden temporary name instead.
+        QByteArray pattern = encoded(dir + QStringLiteral("/.zaf-copy-XXXXXX"));
+        out = ::mkostemp(pattern.data(), O_CLOEXEC);
+        if (out < 0) {
+            const int err = errno;
+            ::close(in);
+            return Error::fromErrno(err, to);
+        }
+        tempPath = QFile::decodeName(pattern);
+    }
+
+    OptionalError failure = copyFileData(in, out, from);
+    ::close(in);
+    if (!failure && ::fsync(out) != 0)
+        failure = Error::fromErrno(errno, to);
+    if (!failure) {
+        int rc;
+        if (tempPath.isEmpty()) {
+            const QByteArray procPath = "/proc/self/fd/" + QByteArray::number(out);
+            rc = ::linkat(AT_FDCWD, procPath.constData(), AT_FDCWD, encoded(to).constData(), AT_SYMLINK_FOLLOW);
+        } else {
+            rc = ::link(encoded(tempPath).constData(), encoded(to).constData());
+        }
+        if (rc != 0)
+            failure = Error::fromErrno(errno, to);
+    }
+    ::close(out);
+    if (!tempPath.isEmpty())
+        ::unlink(encoded(tempPath).constData());
+    if (!failure) {
+        // Make the new directory entry durable too.
+        const int d = ::open(encoded(dir).constData(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+        if (d >= 0) {
+            ::fsync(d);
+            ::close(d);
+        }
+    }
+    return failure;
+}
+
+Result<FileSystemAttributes> FileManager::attributesOfFileSystemForPath(const QString &path) const
+{
+    struct statvfs vfs;
+    if (::statvfs(encoded(path).constData(), &vfs) != 0)
+        return Result<FileSystemAttributes>::failure(Error::fromErrno(errno, path));
+    FileSystemAttributes a;
+    a.freeSize = std::uint64_t(vfs.f_bavail) * vfs.f_frsize;
+    a.totalSize = std::uint64_t(vfs.f_blocks) * vfs.f_frsize;
+    return Result<FileSystemAttributes>::success(a);
+}
+
+} // namespace zaf
