@@ -1,0 +1,379 @@
+#include "platform/media/export_pipeline.h"
+#include "platform/media/media_log.h"
+
+#include "platform/log.h"
+#include "platform/media/export_audio_encoder.h"
+#include "platform/media/export_video_encoder.h"
+
+#include <QFile>
+
+#include <algorithm>
+#include <cstring>
+#include <vector>
+
+namespace zaf::media::exportpipe {
+
+const QLoggingCategory &lcExport()
+{
+    return lcMedia();
+}
+
+namespace {
+
+// Audio before the cut is decoded from a little ahead of it, so the first kept samples do not come
+// from a decoder that has just started (no overlap from the previous frame).
+constexpr std::int64_t kAudioPreRollMicros = 50000;
+// Read errors that the demuxer asks to retry are retried this many times in a row at most.
+constexpr int kMaxConsecutiveRetries = 1000;
+// An upper bound on the packets of one export: far beyond any real movie, it only stops a demuxer
+// that never reaches its end.
+constexpr std::int64_t kMaxPackets = std::int64_t(1) << 32;
+
+enum class Route { Drop, Copy, Video, Audio };
+
+struct StreamRoute {
+    Route route = Route::Drop;
+    int outputIndex = -1;                        // for Copy
+    ExportAudioEncoder *audio = nullptr;         // for Audio
+};
+
+class Pipeline {
+public:
+    Pipeline(const ExportJob &job, CancelFlag &cancel, const std::function<void(float)> &progress)
+        : m_job(job), m_cancel(cancel), m_progress(progress)
+    {
+    }
+
+    OptionalError run()
+    {
+        OptionalError result = runSteps();
+        if (m_cancel.isSet())
+            return makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
+        return result;
+    }
+
+private:
+    OptionalError runSteps()
+    {
+        if (StageResult r = openInput())
+            return r;
+        if (StageResult r = openOutput())
+            return r;
+        if (StageResult r = planStreams())
+            return r;
+        if (StageResult r = writeHeader())
+            return r;
+        if (StageResult r = seekToCut())
+            return r;
+        if (StageResult r = pump())
+            return r;
+        return finish();
+    }
+
+    StageResult openInput()
+    {
+        AVFormatContext *raw = avformat_alloc_context();
+        if (!raw)
+            return stageError(kMediaErrorUnknown, QStringLiteral("out of memory"));
+        raw->interrupt_callback = AVIOInterruptCB{&CancelFlag::interruptCallback, &m_cancel};
+        const QByteArray path = QFile::encodeName(m_job.sourcePath);
+        int rc = avformat_open_input(&raw, path.constData(), nullptr, nullptr);
+        if (rc < 0)
+            return stageError(kMediaErrorCannotOpen, QStringLiteral("cannot open %1").arg(m_job.sourcePath), rc);
+        m_input.reset(raw);
+        rc = avformat_find_stream_info(m_input.get(), nullptr);
+        if (rc < 0)
+            return stageError(kMediaErrorCannotOpen, QStringLiteral("cannot read the streams of %1").arg(m_job.sourcePath), rc);
+        return std::nullopt;
+    }
+
+    StageResult openOutput()
+    {
+        AVFormatContext *raw = nullptr;
+        const QByteArray path = QFile::encodeName(m_job.outputPath);
+        int rc = avformat_alloc_output_context2(&raw, nullptr, "mp4", path.constData());
+        if (rc < 0 || !raw)
+            return stageError(kMediaErrorWriteFailed, QStringLiteral("no MPEG-4 muxer"), rc);
+        m_output.reset(raw);
+        m_output->interrupt_callback = AVIOInterruptCB{&CancelFlag::interruptCallback, &m_cancel};
+        return std::nullopt;
+    }
+
+    PacketWriter writer()
+    {
+        AVFormatContext *out = m_output.get();
+        return [out](AVPacket *packet, AVRational timeBase, int outputIndex) {
+            packet->stream_index = outputIndex;
+            av_packet_rescale_ts(packet, timeBase, out->streams[outputIndex]->time_base);
+            packet->pos = -1;
+            return av_interleaved_write_frame(out, packet);
+        };
+    }
+
+    StageResult addCopy(const AVStream *in, StreamRoute &route)
+    {
+        AVStream *out = avformat_new_stream(m_output.get(), nullptr);
+        if (!out)
+            return stageError(kMediaErrorUnknown, QStringLiteral("out of memory"));
+        int rc = avcodec_parameters_copy(out->codecpar, in->codecpar);
+        if (rc < 0)
+            return stageError(kMediaErrorWriteFailed, QStringLiteral("stream parameters"), rc);
+        out->codecpar->codec_tag = 0;
+        out->time_base = in->time_base;
+        out->avg_frame_rate = in->avg_frame_rate;
+        out->r_frame_rate = in->r_frame_rate;
+        out->sample_aspect_ratio = in->sample_aspect_ratio;
+        out->disposition = in->disposition;
+        av_dict_copy(&out->metadata, in->metadata, 0);
+        for (int i = 0; i < in->nb_side_data; ++i) {
+            const AVPacketSideData &side = in->side_data[i];
+            if (uint8_t *copy = av_stream_new_side_data(out, side.type, side.size))
+                std::memcpy(copy, side.data, side.size);
+        }
+        route.route = Route::Copy;
+        route.outputIndex = out->index;
+        return std::nullopt;
+    }
+
+    StageResult planStreams()
+    {
+        const unsigned count = m_input->nb_streams;
+        m_routes.assign(count, StreamRoute{});
+        std::optional<ExportAudioEncoder::Cut> audioCut;
+        if (m_job.cut)
+            audioCut = ExportAudioEncoder::Cut{m_job.cut->startMicros + startOffset(), m_job.cut->endMicros + startOffset()};
+
+        for (unsigned i = 0; i < count; ++i) {
+            const AVStream *in = m_input->streams[i];
+            const AVMediaType type = in->codecpar->codec_type;
+            StreamRoute &route = m_routes[i];
+            const bool attachedPicture = in->disposition & AV_DISPOSITION_ATTACHED_PIC;
+            if (type == AVMEDIA_TYPE_VIDEO && !attachedPicture) {
+                if (!m_job.cut) {
+                    if (StageResult r = addCopy(in, route))
+                        return r;
+                    continue;
+                }
+                Error error;
+                auto stage = ExportVideoEncoder::create({in, m_job.cut->startMicros + startOffset(), m_job.cut->endMicros + startOffset()},
+                                                        m_output.get(), writer(), &error);
+                if (!stage)
+                    return error;
+                route.route = Route::Video;
+                m_video.push_back(std::move(stage));
+            } else if (type == AVMEDIA_TYPE_AUDIO) {
+                if (m_job.mixStreamIndices) {
+                    const QList<int> &mixed = *m_job.mixStreamIndices;
+                    if (!mixed.contains(int(i)))
+                        continue; // not in the mix: dropped
+                    if (!m_mixer) {
+                        ExportAudioEncoder::Options options;
+                        for (int index : mixed) {
+                            if (index < 0 || unsigned(index) >= count || m_input->streams[index]->codecpar->codec_type != AVMEDIA_TYPE_AUDIO)
+                                return stageError(kMediaErrorInvalidArgument, QStringLiteral("stream %1 is not an audio stream").arg(index));
+                            options.inputs.append(m_input->streams[index]);
+                        }
+                        options.mix = true;
+                        options.cut = audioCut;
+                        Error error;
+                        auto stage = ExportAudioEncoder::create(options, m_output.get(), writer(), &error);
+                        if (!stage)
+                            return error;
+                        m_mixer = stage.get();
+                        m_audio.push_back(std::move(stage));
+                    }
+                    route.route = Route::Audio;
+                    route.audio = m_mixer;
+                } else if (m_job.cut) {
+                    Error error;
+                    auto stage = ExportAudioEncoder::create({{in}, false, audioCut}, m_output.get(), writer(), &error);
+                    if (!stage)
+                        return error;
+                    route.route = Route::Audio;
+                    route.audio = stage.get();
+                    m_audio.push_back(std::move(stage));
+                } else if (StageResult r = addCopy(in, route)) {
+                    return r;
+                }
+            } else if (!m_job.cut && !attachedPicture
+                       && avformat_query_codec(m_output->oformat, in->codecpar->codec_id, FF_COMPLIANCE_NORMAL) == 1) {
+                if (StageResult r = addCopy(in, route))
+                    return r;
+            } else {
+                zaf::log::info(lcExport(), QStringLiteral("ExportSession: stream %1 (%2) is not exported")
+                                               .arg(i).arg(QString::fromLatin1(avcodec_get_name(in->codecpar->codec_id))));
+            }
+        }
+        if (m_output->nb_streams == 0)
+            return stageError(kMediaErrorNoTracks, QStringLiteral("nothing to export from %1").arg(m_job.sourcePath));
+        return std::nullopt;
+    }
+
+    // Source timestamps of the movie's first instant (ranges are relative to it).
+    std::int64_t startOffset() const
+    {
+        const std::int64_t start = m_input->start_time;
+        return start != AV_NOPTS_VALUE && start > 0 ? start : 0;
+    }
+
+    StageResult writeHeader()
+    {
+        const QByteArray path = QFile::encodeName(m_job.outputPath);
+        int rc = avio_open2(&m_output->pb, path.constData(), AVIO_FLAG_WRITE, &m_output->interrupt_callback, nullptr);
+        if (rc < 0)
+            return writeError(QStringLiteral("cannot write %1").arg(m_job.outputPath), rc);
+        rc = avformat_write_header(m_output.get(), nullptr);
+        if (rc < 0)
+            return writeError(QStringLiteral("cannot write the header of %1").arg(m_job.outputPath), rc);
+        return std::nullopt;
+    }
+
+    StageResult seekToCut()
+    {
+        if (!m_job.cut || m_job.cut->startMicros <= 0)
+            return std::nullopt;
+        const std::int64_t target = std::max<std::int64_t>(0, m_job.cut->startMicros - kAudioPreRollMicros) + startOffset();
+        // The latest keyframe at or before the target, for every stream.
+        const int rc = avformat_seek_file(m_input.get(), -1, INT64_MIN, target, target, 0);
+        if (rc < 0) {
+            zaf::log::info(lcExport(), QStringLiteral("ExportSession: seek failed (%1); reading from the start").arg(ff::errorString(rc)));
+            avformat_seek_file(m_input.get(), -1, INT64_MIN, 0, 0, 0);
+        }
+        return std::nullopt;
+    }
+
+    bool allStagesPastEnd() const
+    {
+        if (!m_job.cut)
+            return false;
+        for (const auto &v : m_video) {
+            if (!v->isPastEnd())
+                return false;
+        }
+        for (const auto &a : m_audio) {
+            if (!a->isPastEnd())
+                return false;
+        }
+        return true;
+    }
+
+    void reportProgress(const AVPacket *packet)
+    {
+        double done = 0, total = 0;
+        if (m_job.cut) {
+            total = double(m_job.cut->endMicros - m_job.cut->startMicros) / AV_TIME_BASE;
+            if (!m_video.empty())
+                done = m_video.front()->encodedSeconds();
+            else if (packet->pts != AV_NOPTS_VALUE)
+                done = packet->pts * av_q2d(m_input->streams[packet->stream_index]->time_base)
+                       - double(m_job.cut->startMicros + startOffset()) / AV_TIME_BASE;
+        } else {
+            total = m_job.durationSeconds;
+            if (packet->dts != AV_NOPTS_VALUE)
+                done = packet->dts * av_q2d(m_input->streams[packet->stream_index]->time_base);
+        }
+        if (total > 0 && m_progress)
+            m_progress(float(std::clamp(done / total, 0.0, 0.99)));
+    }
+
+    StageResult routePacket(AVPacket *packet)
+    {
+        if (packet->stream_index < 0 || std::size_t(packet->stream_index) >= m_routes.size())
+            return std::nullopt; // a stream that appeared after the header was read
+        const StreamRoute &route = m_routes[packet->stream_index];
+        switch (route.route) {
+        case Route::Drop:
+            return std::nullopt;
+        case Route::Copy: {
+            const AVRational timeBase = m_input->streams[packet->stream_index]->time_base;
+            const int rc = writer()(packet, timeBase, route.outputIndex);
+            if (rc < 0)
+                return writeError(QStringLiteral("writing %1").arg(m_job.outputPath), rc);
+            return std::nullopt;
+        }
+        case Route::Video:
+            for (const auto &v : m_video) {
+                if (v->sourceStreamIndex() == packet->stream_index)
+                    return v->sendPacket(packet);
+            }
+            return std::nullopt;
+        case Route::Audio:
+            return route.audio->sendPacket(packet);
+        }
+        return std::nullopt;
+    }
+
+    StageResult pump()
+    {
+        ff::AVPacketPtr packet = ff::makePacket();
+        int retries = 0;
+        for (std::int64_t n = 0; n < kMaxPackets; ++n) {
+            if (m_cancel.isSet())
+                return makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
+            const int rc = av_read_frame(m_input.get(), packet.get());
+            if (rc == AVERROR_EOF)
+                return std::nullopt;
+            if (rc == AVERROR(EAGAIN)) {
+                if (++retries > kMaxConsecutiveRetries)
+                    return stageError(kMediaErrorDecodeFailed, QStringLiteral("the source stopped delivering data"), rc);
+                continue;
+            }
+            if (rc < 0)
+                return stageError(kMediaErrorDecodeFailed, QStringLiteral("the source is damaged or truncated: %1").arg(m_job.sourcePath), rc);
+            retries = 0;
+            reportProgress(packet.get());
+            StageResult r = routePacket(packet.get());
+            av_packet_unref(packet.get());
+            if (r)
+                return r;
+            if (allStagesPastEnd())
+                return std::nullopt;
+        }
+        return stageError(kMediaErrorDecodeFailed, QStringLiteral("the source never ends: %1").arg(m_job.sourcePath));
+    }
+
+    StageResult finish()
+    {
+        for (const auto &v : m_video) {
+            if (StageResult r = v->finish())
+                return r;
+        }
+        for (const auto &a : m_audio) {
+            if (StageResult r = a->finish())
+                return r;
+        }
+        int rc = av_write_trailer(m_output.get());
+        if (rc < 0)
+            return writeError(QStringLiteral("cannot finish %1").arg(m_job.outputPath), rc);
+        avio_flush(m_output->pb);
+        if (m_output->pb->error < 0)
+            return writeError(QStringLiteral("cannot write %1").arg(m_job.outputPath), m_output->pb->error);
+        rc = avio_closep(&m_output->pb);
+        if (rc < 0)
+            return writeError(QStringLiteral("cannot close %1").arg(m_job.outputPath), rc);
+        if (m_progress)
+            m_progress(1.0f);
+        return std::nullopt;
+    }
+
+    const ExportJob &m_job;
+    CancelFlag &m_cancel;
+    const std::function<void(float)> &m_progress;
+    ff::InputFormatContextPtr m_input;
+    // Declared before the stages: the stages' writers point at it, and it outlives them.
+    ff::OutputFormatContextPtr m_output;
+    std::vector<StreamRoute> m_routes;
+    std::vector<std::unique_ptr<ExportVideoEncoder>> m_video;
+    std::vector<std::unique_ptr<ExportAudioEncoder>> m_audio;
+    ExportAudioEncoder *m_mixer = nullptr;
+};
+
+} // namespace
+
+OptionalError runExport(const ExportJob &job, CancelFlag &cancel, const std::function<void(float)> &progress)
+{
+    Pipeline pipeline(job, cancel, progress);
+    return pipeline.run();
+}
+
+} // namespace zaf::media::exportpipe

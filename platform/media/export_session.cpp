@@ -1,0 +1,280 @@
+#include "platform/media/export_session.h"
+
+#include "platform/log.h"
+#include "platform/media/export_common.h"
+#include "platform/media/export_output_file.h"
+#include "platform/media/export_pipeline.h"
+
+#include <algorithm>
+#include <atomic>
+#include <mutex>
+#include <thread>
+
+namespace zaf::media {
+
+using namespace exportpipe;
+
+struct ExportSession::Private {
+    std::shared_ptr<MediaAsset> asset;
+    QString preset;
+
+    mutable std::mutex mutex; // guards the settings and the error
+    QUrl outputURL;
+    QString fileType;
+    std::optional<MediaTimeRange> timeRange;
+    std::optional<AudioMix> audioMix;
+    OptionalError error;
+
+    std::atomic<int> status{int(ExportStatus::Unknown)};
+    std::atomic<float> progress{0.0f};
+    std::atomic<bool> started{false};
+    CancelFlag cancel;
+
+    // Sets the final status; the error first, so that a reader that sees the status sees the error.
+    void finish(ExportStatus final, OptionalError finalError)
+    {
+        {
+            std::lock_guard lock(mutex);
+            error = std::move(finalError);
+        }
+        if (final == ExportStatus::Completed)
+            progress.store(1.0f);
+        status.store(int(final));
+    }
+};
+
+std::shared_ptr<ExportSession> ExportSession::exportSessionWithAsset(std::shared_ptr<MediaAsset> asset, const QString &preset)
+{
+    if (!asset) {
+        zaf::log::error(lcExport(), QStringLiteral("ExportSession: no asset"));
+        return nullptr;
+    }
+    if (preset != QLatin1String(kExportPresetHighestQuality)) {
+        zaf::log::error(lcExport(), QStringLiteral("ExportSession: unknown preset \"%1\"").arg(preset));
+        return nullptr;
+    }
+    return std::shared_ptr<ExportSession>(new ExportSession(std::move(asset), preset));
+}
+
+ExportSession::ExportSession(std::shared_ptr<MediaAsset> asset, const QString &preset)
+    : d(std::make_unique<Private>())
+{
+    d->asset = std::move(asset);
+    d->preset = preset;
+}
+
+ExportSession::~ExportSession() = default;
+
+std::shared_ptr<MediaAsset> ExportSession::asset() const { return d->asset; }
+QString ExportSession::presetName() const { return d->preset; }
+
+void ExportSession::setOutputURL(const QUrl &url)
+{
+    std::lock_guard lock(d->mutex);
+    d->outputURL = url;
+}
+
+QUrl ExportSession::outputURL() const
+{
+    std::lock_guard lock(d->mutex);
+    return d->outputURL;
+}
+
+void ExportSession::setOutputFileType(const QString &type)
+{
+    std::lock_guard lock(d->mutex);
+    d->fileType = type;
+}
+
+QString ExportSession::outputFileType() const
+{
+    std::lock_guard lock(d->mutex);
+    return d->fileType;
+}
+
+void ExportSession::setTimeRange(const MediaTimeRange &range)
+{
+    std::lock_guard lock(d->mutex);
+    d->timeRange = range;
+}
+
+std::optional<MediaTimeRange> ExportSession::timeRange() const
+{
+    std::lock_guard lock(d->mutex);
+    return d->timeRange;
+}
+
+void ExportSession::setAudioMix(std::optional<AudioMix> mix)
+{
+    std::lock_guard lock(d->mutex);
+    d->audioMix = std::move(mix);
+}
+
+std::optional<AudioMix> ExportSession::audioMix() const
+{
+    std::lock_guard lock(d->mutex);
+    return d->audioMix;
+}
+
+ExportStatus ExportSession::status() const
+{
+    return ExportStatus(d->status.load());
+}
+
+OptionalError ExportSession::error() const
+{
+    std::lock_guard lock(d->mutex);
+    return d->error;
+}
+
+float ExportSession::progress() const
+{
+    return d->progress.load();
+}
+
+void ExportSession::cancelExport()
+{
+    d->cancel.cancelled.store(true);
+    // An export that has not started ends here; a running one notices the flag in its loops.
+    int expected = int(ExportStatus::Unknown);
+    if (d->status.compare_exchange_strong(expected, int(ExportStatus::Cancelled))) {
+        std::lock_guard lock(d->mutex);
+        d->error = makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
+    }
+}
+
+void ExportSession::exportAsynchronously(std::function<void()> completion)
+{
+    if (d->started.exchange(true)) {
+        zaf::log::error(lcExport(), QStringLiteral("ExportSession: the session has already exported; nothing new starts"));
+        std::thread([completion = std::move(completion)] {
+            if (completion)
+                completion();
+        }).detach();
+        return;
+    }
+    int expected = int(ExportStatus::Unknown);
+    d->status.compare_exchange_strong(expected, int(ExportStatus::Waiting));
+    // The thread holds the session until the completion has run.
+    std::thread([self = shared_from_this(), completion = std::move(completion)]() mutable {
+        self->run(std::move(completion));
+    }).detach();
+}
+
+namespace {
+
+// The checks that need no file I/O beyond the asset's header; the job on success.
+std::optional<ExportJob> prepareJob(const MediaAsset &asset, const QUrl &outputURL, const QString &fileType,
+                                    const std::optional<MediaTimeRange> &timeRange,
+                                    const std::optional<AudioMix> &audioMix, Error *error)
+{
+    if (fileType != QLatin1String(kFileTypeMPEG4)) {
+        *error = makeMediaError(kMediaErrorInvalidArgument, QStringLiteral("unsupported output file type \"%1\"").arg(fileType));
+        return std::nullopt;
+    }
+    if (outputURL.isEmpty() || !outputURL.isLocalFile() || outputURL.toLocalFile().isEmpty()) {
+        *error = makeMediaError(kMediaErrorInvalidArgument, QStringLiteral("no output file URL (\"%1\")").arg(outputURL.toString()));
+        return std::nullopt;
+    }
+    if (!asset.load()) {
+        *error = asset.loadError().value_or(makeMediaError(kMediaErrorCannotOpen, QStringLiteral("the source cannot be read")));
+        return std::nullopt;
+    }
+    ExportJob job;
+    job.sourcePath = asset.url().toLocalFile();
+    const MediaTime duration = asset.duration();
+    job.durationSeconds = duration.isNumeric() ? duration.seconds() : 0.0;
+
+    if (timeRange) {
+        const MediaTime zero = MediaTime::zero();
+        if (!timeRange->isValid() || timeRange->start < zero || timeRange->duration <= zero
+            || (duration.isNumeric() && timeRange->start >= duration)) {
+            *error = makeMediaError(kMediaErrorInvalidArgument, QStringLiteral("invalid time range: start %1, duration %2")
+                                                                    .arg(timeRange->start.debugDescription(), timeRange->duration.debugDescription()));
+            return std::nullopt;
+        }
+        MediaTime end = timeRange->end();
+        if (duration.isNumeric() && end > duration)
+            end = duration;
+        job.cut = ExportJob::Cut{timeRange->start.convertScale(1000000).value, end.convertScale(1000000).value};
+        if (job.cut->endMicros <= job.cut->startMicros) {
+            *error = makeMediaError(kMediaErrorInvalidArgument, QStringLiteral("the time range is shorter than a microsecond"));
+            return std::nullopt;
+        }
+    }
+    if (audioMix) {
+        QList<int> streams;
+        const QList<AssetTrack> audioTracks = asset.tracksWithMediaType(MediaType::Audio);
+        for (const AudioMixInputParameters &input : audioMix->inputParameters) {
+            auto it = std::find_if(audioTracks.begin(), audioTracks.end(),
+                                   [&](const AssetTrack &t) { return t.trackID == input.trackID; });
+            if (it == audioTracks.end()) {
+                *error = makeMediaError(kMediaErrorInvalidArgument, QStringLiteral("the audio mix names track %1, which is not an audio track").arg(input.trackID));
+                return std::nullopt;
+            }
+            if (!streams.contains(it->streamIndex))
+                streams.append(it->streamIndex);
+        }
+        job.mixStreamIndices = streams;
+    }
+    return job;
+}
+
+} // namespace
+
+void ExportSession::run(std::function<void()> completion)
+{
+    auto end = [&](ExportStatus final, OptionalError error) {
+        if (error && final == ExportStatus::Failed)
+            zaf::log::error(lcExport(), QStringLiteral("ExportSession: export to %1 failed: %2")
+                                            .arg(outputURL().toLocalFile(), error->message));
+        else if (final == ExportStatus::Cancelled)
+            zaf::log::notice(lcExport(), QStringLiteral("ExportSession: export to %1 cancelled").arg(outputURL().toLocalFile()));
+        d->finish(final, std::move(error));
+        if (completion)
+            completion();
+    };
+    const Error cancelled = makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
+    int expected = int(ExportStatus::Waiting);
+    if (d->cancel.isSet() || !d->status.compare_exchange_strong(expected, int(ExportStatus::Exporting)))
+        return end(ExportStatus::Cancelled, cancelled);
+
+    QUrl url;
+    QString fileType;
+    std::optional<MediaTimeRange> range;
+    std::optional<AudioMix> mix;
+    {
+        std::lock_guard lock(d->mutex);
+        url = d->outputURL;
+        fileType = d->fileType;
+        range = d->timeRange;
+        mix = d->audioMix;
+    }
+    Error error;
+    std::optional<ExportJob> job = prepareJob(*d->asset, url, fileType, range, mix, &error);
+    if (!job)
+        return end(ExportStatus::Failed, error);
+    std::unique_ptr<ExportOutputFile> output = ExportOutputFile::create(url.toLocalFile(), &error);
+    if (!output)
+        return end(ExportStatus::Failed, error);
+    job->outputPath = output->temporaryPath();
+
+    const std::function<void(float)> progress = [this](float value) { d->progress.store(value); };
+    OptionalError result = runExport(*job, d->cancel, progress);
+    if (d->cancel.isSet()) {
+        output->discard();
+        return end(ExportStatus::Cancelled, cancelled);
+    }
+    if (result) {
+        output->discard();
+        return end(ExportStatus::Failed, result);
+    }
+    if (OptionalError commitError = output->commit()) {
+        output->discard();
+        return end(ExportStatus::Failed, commitError);
+    }
+    zaf::log::info(lcExport(), QStringLiteral("ExportSession: wrote %1").arg(url.toLocalFile()));
+    end(ExportStatus::Completed, std::nullopt);
+}
+
+} // namespace zaf::media

@@ -1,0 +1,78 @@
+#pragma once
+
+// ExportSession: writes an MPEG-4 copy of a MediaAsset, whole or cut to a time range, with its
+// audio tracks kept one by one or mixed into one track.
+//
+// Threads: the session is configured on any thread (normally the main thread) before
+// exportAsynchronously(). The export then runs on a worker thread of its own; status(), progress(),
+// error() and cancelExport() may be called from any thread at any time.
+// Callbacks, in order: exactly one completion, on the export's worker thread (never the main thread),
+// after status() holds its final value (Completed, Failed or Cancelled). Nothing runs after it.
+//
+// Output rules: the file is written under a temporary name in the output's directory and renamed
+// into place without replacing anything; a failed or cancelled export leaves no file behind.
+// Without a time range or an audio mix every stream is copied bit-exact. An audio mix replaces the
+// audio with one AAC track (48 kHz stereo) summing the listed tracks; the video is still copied
+// when no time range is set. A time range re-encodes the video with H.264 frame-accurately and
+// cuts the audio sample-accurately, both starting at time 0 in the output.
+
+#include "platform/error.h"
+#include "platform/media/audio_mix.h"
+#include "platform/media/media_asset.h"
+#include "platform/media/media_time.h"
+
+#include <QString>
+#include <QUrl>
+
+#include <functional>
+#include <memory>
+#include <optional>
+
+namespace zaf::media {
+
+enum class ExportStatus { Unknown = 0, Waiting = 1, Exporting = 2, Completed = 3, Failed = 4, Cancelled = 5 };
+
+// The preset that never lowers quality: copies what needs no change, re-encodes video at visually
+// lossless quality, audio as AAC at 48 kHz.
+inline constexpr const char *kExportPresetHighestQuality = "HighestQuality";
+inline constexpr const char *kFileTypeMPEG4 = "public.mpeg-4";
+
+class ExportSession : public std::enable_shared_from_this<ExportSession> {
+public:
+    // nullptr when the asset is null or the preset unknown (callers handle "no session").
+    static std::shared_ptr<ExportSession> exportSessionWithAsset(std::shared_ptr<MediaAsset> asset, const QString &preset);
+    ~ExportSession();
+
+    std::shared_ptr<MediaAsset> asset() const;
+    QString presetName() const;
+
+    void setOutputURL(const QUrl &url);
+    QUrl outputURL() const;
+    void setOutputFileType(const QString &type);   // kFileTypeMPEG4 is the only type written
+    QString outputFileType() const;
+    // Default: the whole movie. A range ending past the movie's end is cut at the end.
+    void setTimeRange(const MediaTimeRange &range);
+    std::optional<MediaTimeRange> timeRange() const;
+    void setAudioMix(std::optional<AudioMix> mix);
+    std::optional<AudioMix> audioMix() const;
+
+    // Starts the export on a worker thread and returns at once. The completion runs exactly once,
+    // on that worker thread (never the main thread), after status() has its final value. The session
+    // keeps itself alive until then. A session exports once: a second call runs its completion on a
+    // worker thread without exporting again.
+    void exportAsynchronously(std::function<void()> completion);
+
+    ExportStatus status() const;
+    OptionalError error() const;   // domain "zaf.media", code from MediaErrorCode
+    float progress() const;        // 0..1
+    // Any thread. A running or waiting export ends in Cancelled and leaves no output file.
+    void cancelExport();
+
+private:
+    ExportSession(std::shared_ptr<MediaAsset> asset, const QString &preset);
+    void run(std::function<void()> completion);
+    struct Private;
+    std::unique_ptr<Private> d;
+};
+
+} // namespace zaf::media

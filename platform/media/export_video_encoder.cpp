@@ -1,0 +1,298 @@
+#include "platform/media/export_video_encoder.h"
+
+extern "C" {
+#include <libavutil/opt.h>
+#include <libavutil/pixdesc.h>
+}
+
+#include <cstring>
+
+namespace zaf::media::exportpipe {
+
+namespace {
+
+// x264 settings of a cut: visually lossless quality (crf 18) with the "veryfast" preset, a fair
+// trade between speed and file size for movies that are re-cut interactively.
+constexpr const char *kX264Preset = "veryfast";
+constexpr const char *kX264Crf = "18";
+constexpr int kMaxConsecutiveDecodeErrors = 100;
+
+bool encoderSupports(const AVCodec *codec, AVPixelFormat format)
+{
+    if (!codec->pix_fmts)
+        return true;
+    for (const AVPixelFormat *f = codec->pix_fmts; *f != AV_PIX_FMT_NONE; ++f) {
+        if (*f == format)
+            return true;
+    }
+    return false;
+}
+
+} // namespace
+
+struct ExportVideoEncoder::Private {
+    const AVStream *input = nullptr;
+    ff::CodecContextPtr decoder;
+    ff::CodecContextPtr encoder;
+    ff::SwsContextPtr scaler;
+    ff::AVFramePtr decoded = ff::makeFrame();
+    ff::AVFramePtr pending = ff::makeFrame();   // the latest frame before the cut's start
+    ff::AVFramePtr converted;
+    ff::AVPacketPtr encoded = ff::makePacket();
+    PacketWriter writer;
+    int outputIndex = -1;
+    std::int64_t startPts = 0, endPts = 0;      // in the input's time base
+    std::int64_t lastOutputPts = AV_NOPTS_VALUE;
+    bool hasPending = false;
+    bool emittedAny = false;
+    bool pastEnd = false;
+    int consecutiveErrors = 0;
+
+    StageResult handleFrame(AVFrame *frame);
+    StageResult emit(AVFrame *frame, std::int64_t sourcePts);
+    StageResult encode(AVFrame *frame);
+    StageResult decode(const AVPacket *packet);
+};
+
+ExportVideoEncoder::ExportVideoEncoder()
+    : d(std::make_unique<Private>())
+{
+}
+
+ExportVideoEncoder::~ExportVideoEncoder() = default;
+
+std::unique_ptr<ExportVideoEncoder> ExportVideoEncoder::create(const Options &options, AVFormatContext *output,
+                                                               PacketWriter writer, Error *error)
+{
+    std::unique_ptr<ExportVideoEncoder> stage(new ExportVideoEncoder);
+    Private &p = *stage->d;
+    auto failed = [&](const Error &e) {
+        *error = e;
+        return std::unique_ptr<ExportVideoEncoder>();
+    };
+    const AVStream *in = options.input;
+    const AVCodecParameters *par = in->codecpar;
+    p.input = in;
+    p.writer = std::move(writer);
+    p.startPts = av_rescale_q(options.startMicros, AV_TIME_BASE_Q, in->time_base);
+    p.endPts = av_rescale_q(options.endMicros, AV_TIME_BASE_Q, in->time_base);
+    if (par->width <= 0 || par->height <= 0 || std::int64_t(par->width) * par->height > ff::kMaxPixels)
+        return failed(stageError(kMediaErrorDecodeFailed, QStringLiteral("video stream %1 has an unusable size %2x%3")
+                                                              .arg(in->index).arg(par->width).arg(par->height)));
+
+    const AVCodec *decoderCodec = avcodec_find_decoder(par->codec_id);
+    if (!decoderCodec)
+        return failed(stageError(kMediaErrorDecodeFailed, QStringLiteral("no decoder for video codec %1").arg(QString::fromLatin1(avcodec_get_name(par->codec_id)))));
+    p.decoder.reset(avcodec_alloc_context3(decoderCodec));
+    if (!p.decoder)
+        return failed(stageError(kMediaErrorUnknown, QStringLiteral("out of memory")));
+    int rc = avcodec_parameters_to_context(p.decoder.get(), par);
+    if (rc < 0)
+        return failed(stageError(kMediaErrorDecodeFailed, QStringLiteral("video decoder parameters"), rc));
+    p.decoder->pkt_timebase = in->time_base;
+    p.decoder->max_pixels = ff::kMaxPixels;
+    p.decoder->thread_count = 0;
+    p.decoder->thread_type = FF_THREAD_FRAME | FF_THREAD_SLICE;
+    rc = avcodec_open2(p.decoder.get(), decoderCodec, nullptr);
+    if (rc < 0)
+        return failed(stageError(kMediaErrorDecodeFailed, QStringLiteral("cannot open the video decoder"), rc));
+
+    const AVCodec *codec = avcodec_find_encoder_by_name("libx264");
+    if (!codec)
+        return failed(stageError(kMediaErrorEncodeFailed, QStringLiteral("no H.264 encoder (libx264)")));
+    p.encoder.reset(avcodec_alloc_context3(codec));
+    if (!p.encoder)
+        return failed(stageError(kMediaErrorUnknown, QStringLiteral("out of memory")));
+    AVCodecContext *enc = p.encoder.get();
+    const AVPixelFormat sourceFormat = AVPixelFormat(par->format);
+    enc->pix_fmt = sourceFormat != AV_PIX_FMT_NONE && encoderSupports(codec, sourceFormat) ? sourceFormat : AV_PIX_FMT_YUV420P;
+    enc->width = par->width;
+    enc->height = par->height;
+    enc->sample_aspect_ratio = par->sample_aspect_ratio;
+    enc->color_range = par->color_range;
+    enc->color_primaries = par->color_primaries;
+    enc->color_trc = par->color_trc;
+    enc->colorspace = par->color_space;
+    enc->chroma_sample_location = par->chroma_location;
+    enc->time_base = in->time_base;
+    AVRational rate = in->avg_frame_rate.num > 0 && in->avg_frame_rate.den > 0 ? in->avg_frame_rate : in->r_frame_rate;
+    if (rate.num > 0 && rate.den > 0)
+        enc->framerate = rate;
+    enc->thread_count = 0; // x264 picks its own thread count
+    if (output->oformat->flags & AVFMT_GLOBALHEADER)
+        enc->flags |= AV_CODEC_FLAG_GLOBAL_HEADER;
+    AVDictionary *opts = nullptr;
+    av_dict_set(&opts, "preset", kX264Preset, 0);
+    av_dict_set(&opts, "crf", kX264Crf, 0);
+    rc = avcodec_open2(enc, codec, &opts);
+    av_dict_free(&opts);
+    if (rc < 0)
+        return failed(stageError(kMediaErrorEncodeFailed, QStringLiteral("cannot open the H.264 encoder"), rc));
+
+    AVStream *stream = avformat_new_stream(output, nullptr);
+    if (!stream)
+        return failed(stageError(kMediaErrorUnknown, QStringLiteral("out of memory")));
+    rc = avcodec_parameters_from_context(stream->codecpar, enc);
+    if (rc < 0)
+        return failed(stageError(kMediaErrorEncodeFailed, QStringLiteral("video stream parameters"), rc));
+    stream->time_base = enc->time_base;
+    stream->avg_frame_rate = enc->framerate;
+    stream->sample_aspect_ratio = enc->sample_aspect_ratio;
+    // The rotation of the source stays a property of the stream, as in the source.
+    size_t matrixSize = 0;
+    if (const uint8_t *matrix = av_stream_get_side_data(in, AV_PKT_DATA_DISPLAYMATRIX, &matrixSize)) {
+        if (uint8_t *copy = av_stream_new_side_data(stream, AV_PKT_DATA_DISPLAYMATRIX, matrixSize))
+            std::memcpy(copy, matrix, matrixSize);
+    }
+    p.outputIndex = stream->index;
+    return stage;
+}
+
+int ExportVideoEncoder::sourceStreamIndex() const
+{
+    return d->input->index;
+}
+
+bool ExportVideoEncoder::isPastEnd() const
+{
+    return d->pastEnd;
+}
+
+double ExportVideoEncoder::encodedSeconds() const
+{
+    return d->lastOutputPts == AV_NOPTS_VALUE ? 0.0 : d->lastOutputPts * av_q2d(d->input->time_base);
+}
+
+StageResult ExportVideoEncoder::Private::encode(AVFrame *frame)
+{
+    int rc = avcodec_send_frame(encoder.get(), frame);
+    if (rc < 0 && rc != AVERROR_EOF)
+        return stageError(kMediaErrorEncodeFailed, QStringLiteral("H.264 encoding"), rc);
+    for (;;) {
+        rc = avcodec_receive_packet(encoder.get(), encoded.get());
+        if (rc == AVERROR(EAGAIN) || rc == AVERROR_EOF)
+            return std::nullopt;
+        if (rc < 0)
+            return stageError(kMediaErrorEncodeFailed, QStringLiteral("H.264 encoding"), rc);
+        rc = writer(encoded.get(), encoder->time_base, outputIndex);
+        av_packet_unref(encoded.get());
+        if (rc < 0)
+            return writeError(QStringLiteral("writing video"), rc);
+    }
+}
+
+StageResult ExportVideoEncoder::Private::emit(AVFrame *frame, std::int64_t sourcePts)
+{
+    const std::int64_t pts = sourcePts - startPts;
+    if (lastOutputPts != AV_NOPTS_VALUE && pts <= lastOutputPts)
+        return std::nullopt; // a repeated or out-of-order timestamp: the frame cannot be placed
+    AVFrame *toEncode = frame;
+    if (frame->format != encoder->pix_fmt || frame->width != encoder->width || frame->height != encoder->height) {
+        scaler.reset(sws_getCachedContext(scaler.release(), frame->width, frame->height, AVPixelFormat(frame->format),
+                                          encoder->width, encoder->height, encoder->pix_fmt, SWS_BICUBIC,
+                                          nullptr, nullptr, nullptr));
+        if (!scaler)
+            return stageError(kMediaErrorEncodeFailed, QStringLiteral("no conversion from pixel format %1")
+                                                          .arg(QString::fromLatin1(av_get_pix_fmt_name(AVPixelFormat(frame->format)))));
+        converted = ff::makeFrame();
+        converted->format = encoder->pix_fmt;
+        converted->width = encoder->width;
+        converted->height = encoder->height;
+        int rc = av_frame_get_buffer(converted.get(), 0);
+        if (rc < 0)
+            return stageError(kMediaErrorUnknown, QStringLiteral("out of memory"), rc);
+        sws_scale(scaler.get(), frame->data, frame->linesize, 0, frame->height, converted->data, converted->linesize);
+        av_frame_copy_props(converted.get(), frame);
+        toEncode = converted.get();
+    }
+    toEncode->pts = pts;
+    toEncode->pict_type = AV_PICTURE_TYPE_NONE;
+    lastOutputPts = pts;
+    emittedAny = true;
+    return encode(toEncode);
+}
+
+StageResult ExportVideoEncoder::Private::handleFrame(AVFrame *frame)
+{
+    const std::int64_t pts = frame->best_effort_timestamp;
+    if (pts == AV_NOPTS_VALUE || pastEnd)
+        return std::nullopt;
+    if (pts < startPts) {
+        // Shown before the start; it becomes the first frame if the next one starts after it.
+        av_frame_unref(pending.get());
+        av_frame_move_ref(pending.get(), frame);
+        pending->best_effort_timestamp = pts;
+        hasPending = true;
+        return std::nullopt;
+    }
+    if (hasPending) {
+        hasPending = false;
+        if (pts > startPts && !emittedAny) {
+            StageResult r = emit(pending.get(), startPts);
+            av_frame_unref(pending.get());
+            if (r)
+                return r;
+        }
+        av_frame_unref(pending.get());
+    }
+    if (pts >= endPts) {
+        pastEnd = true;
+        return std::nullopt;
+    }
+    return emit(frame, pts);
+}
+
+StageResult ExportVideoEncoder::Private::decode(const AVPacket *packet)
+{
+    int rc = avcodec_send_packet(decoder.get(), packet);
+    if (rc == AVERROR_INVALIDDATA) {
+        if (++consecutiveErrors > kMaxConsecutiveDecodeErrors)
+            return stageError(kMediaErrorDecodeFailed, QStringLiteral("the video cannot be decoded"), rc);
+        return std::nullopt;
+    }
+    if (rc < 0 && rc != AVERROR_EOF)
+        return stageError(kMediaErrorDecodeFailed, QStringLiteral("video decoding"), rc);
+    for (;;) {
+        rc = avcodec_receive_frame(decoder.get(), decoded.get());
+        if (rc == AVERROR(EAGAIN) || rc == AVERROR_EOF)
+            return std::nullopt;
+        if (rc == AVERROR_INVALIDDATA) {
+            if (++consecutiveErrors > kMaxConsecutiveDecodeErrors)
+                return stageError(kMediaErrorDecodeFailed, QStringLiteral("the video cannot be decoded"), rc);
+            continue;
+        }
+        if (rc < 0)
+            return stageError(kMediaErrorDecodeFailed, QStringLiteral("video decoding"), rc);
+        consecutiveErrors = 0;
+        StageResult r = handleFrame(decoded.get());
+        av_frame_unref(decoded.get());
+        if (r)
+            return r;
+    }
+}
+
+StageResult ExportVideoEncoder::sendPacket(const AVPacket *packet)
+{
+    if (d->pastEnd)
+        return std::nullopt;
+    return d->decode(packet);
+}
+
+StageResult ExportVideoEncoder::finish()
+{
+    if (!d->pastEnd) {
+        if (StageResult r = d->decode(nullptr))
+            return r;
+    }
+    // A cut that starts on the last frame: that frame is the only one shown in the range.
+    if (d->hasPending && !d->emittedAny) {
+        d->hasPending = false;
+        if (StageResult r = d->emit(d->pending.get(), d->startPts))
+            return r;
+    }
+    if (!d->emittedAny)
+        return stageError(kMediaErrorDecodeFailed, QStringLiteral("no video frame in the range"));
+    return d->encode(nullptr);
+}
+
+} // namespace zaf::media::exportpipe
