@@ -1,0 +1,48 @@
+#pragma once
+
+// Fixture movies for media tests, and readers that check movies with the ffmpeg and ffprobe
+// command-line tools, independently of our own engine.
+//
+// Every function runs on the calling thread and waits (bounded) for the tools it starts. Failures
+// are reported with ADD_FAILURE naming the command and its error output; the functions then return
+// an empty value ("" / empty list / empty object / -1 level).
+
+#include "tools/fixture/fixture_movie.h"
+
+#include <QImage>
+#include <QJsonObject>
+#include <QList>
+#include <QString>
+
+namespace zaf::test {
+
+// Writes a fixture movie with a unique name into `dir` and returns its path ("" on failure).
+QString makeFixtureMovie(const QString &dir, const zaf::fixture::FixtureSpec &spec = {});
+
+// The number shown by every frame of the first video stream, in presentation order, as displayed
+// (the display rotation applied). -1 for a frame without a readable number.
+QList<int> readFrameNumbers(const QString &moviePath);
+
+// The number a decoded picture shows, or -1 (see tools/fixture/frame_pattern.h).
+int readFrameNumber(const QImage &image);
+
+// The amplitude of the `frequency` component of audio stream `audioStreamIndex` (0-based among
+// the audio streams), mixed to mono: ~0.5 for a fixture tone, ~0 for an absent one. -1 on failure.
+double toneLevel(const QString &moviePath, int audioStreamIndex, double frequency);
+
+// ffprobe -show_streams -show_format, parsed.
+QJsonObject ffprobe(const QString &path);
+// The streams of one kind ("video", "audio") from an ffprobe answer, in file order.
+QList<QJsonObject> probeStreams(const QJsonObject &probe, const QString &codecType);
+// The clockwise display rotation of a probed video stream (0, 90, 180, 270).
+int probeRotation(const QJsonObject &stream);
+// The number of video frames of the first video stream, counted by decoding with ffprobe.
+int countVideoFrames(const QString &path);
+
+// The presentation-order indexes of the key frames of the first video stream.
+QList<int> keyFrameIndexes(const QString &path);
+
+// MD5 of the packets of the streams selected by `map` ("0:v:0", "0:a:1", ...), copied unchanged.
+QString streamMD5(const QString &path, const QString &map);
+
+} // namespace zaf::test
