@@ -2,6 +2,7 @@
 
 #include <QDir>
 
+#include <cmath>
 #include <ctime>
 
 namespace {
@@ -36,4 +37,9 @@ const QString &ZafScreenRecorderTempDirectory()
 QString ZafTempMovieFileName(const QString &stem)
 {
     return stem + QString::number(qint64(std::time(nullptr))) + QStringLiteral(".mp4");
+}
+
+QString ZafTempMovieFileNameAt(const QString &stem, double secondsSince1970)
+{
+    return stem + QString::number(qint64(std::trunc(secondsSince1970))) + QStringLiteral(".mp4");
 }

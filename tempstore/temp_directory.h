@@ -17,3 +17,5 @@ inline constexpr std::int64_t ZafScreenRecorderRequiredFreeSpace = 100000000;
 // A movie name in the temporary directory: the stem, the current time in whole seconds since
 // 1970 (truncated), then ".mp4". Stems hold the directory path, e.g. "<dir>/ZafReplay_Final".
 QString ZafTempMovieFileName(const QString &stem);
+// The same for a given time in seconds since 1970 (the fraction dropped toward zero).
+QString ZafTempMovieFileNameAt(const QString &stem, double secondsSince1970);

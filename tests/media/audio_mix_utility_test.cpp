@@ -1,0 +1,156 @@
+// The audio mix utility on generated movies: its output file, its single mixed track and its errors.
+#include "identity/user_error.h"
+#include "media/audio_mix_utility.h"
+#include "platform/media/export_session.h"
+#include "tempstore/temp_store.h"
+#include "tests/support/log_capture.h"
+#include "tests/support/media/fixture_movies.h"
+#include "tests/support/temp_dir.h"
+
+#include <QCoreApplication>
+#include <QFileInfo>
+#include <QJsonArray>
+#include <QThread>
+#include <gtest/gtest.h>
+
+#include <future>
+
+namespace zaf::test {
+namespace {
+
+// The whole program shares one temporary directory, as the editor's process does.
+class TempDirectoryEnvironment : public ::testing::Environment {
+public:
+    void SetUp() override
+    {
+        qputenv("ZAF_TEMP_DIRECTORY", QFile::encodeName(m_root.path() + QStringLiteral("/Zafrel")));
+        ZafTempStore::defaultStore().prepareAtProcessStart();
+    }
+
+private:
+    QTemporaryDir m_root;
+};
+const auto *const g_environment = ::testing::AddGlobalTestEnvironment(new TempDirectoryEnvironment);
+
+struct MixResult {
+    QUrl url;
+    OptionalError error;
+    bool onCallingThread = false;
+};
+
+MixResult mix(const QUrl &movie)
+{
+    std::promise<MixResult> promise;
+    QThread *caller = QThread::currentThread();
+    ZafAudioMixUtility::mixAudioForMovieWithCompletionHandler(movie, [&](const QUrl &url, const OptionalError &error) {
+        promise.set_value({url, error, QThread::currentThread() == caller});
+    });
+    auto future = promise.get_future();
+    EXPECT_EQ(future.wait_for(std::chrono::seconds(120)), std::future_status::ready);
+    return future.get();
+}
+
+int audioStreamCount(const QString &path)
+{
+    int n = 0;
+    for (const QJsonValue &s : ffprobe(path).value(QStringLiteral("streams")).toArray())
+        n += s.toObject().value(QStringLiteral("codec_type")).toString() == QLatin1String("audio");
+    return n;
+}
+
+TEST(AudioMixUtility, AbsentMovieFailsAtOnceWithNoMovieCode)
+{
+    const MixResult r = mix(QUrl());
+    EXPECT_TRUE(r.url.isEmpty());
+    ASSERT_TRUE(r.error.has_value());
+    EXPECT_EQ(r.error->code, -5818);
+    EXPECT_EQ(r.error->domain, QLatin1String(ZafUserErrorDomain));
+    EXPECT_TRUE(r.onCallingThread);
+}
+
+TEST(AudioMixUtility, TwoTrackMovieBecomesOneTrackCarryingBothTonesWithTheVideoCopied)
+{
+    ScratchDir scratch;
+    fixture::FixtureSpec spec;
+    spec.seconds = 3;
+    spec.audioTracks = 2;
+    const QString source = makeFixtureMovie(scratch.path(), spec);
+    ASSERT_FALSE(source.isEmpty());
+
+    const QUrl expected = ZafAudioMixUtility::tempFileURL();
+    const MixResult r = mix(QUrl::fromLocalFile(source));
+    ASSERT_FALSE(r.error.has_value()) << r.error->description().toStdString();
+    EXPECT_FALSE(r.onCallingThread);
+    // The URL named when the export started (allowing for a second boundary in between).
+    EXPECT_TRUE(r.url == expected || r.url.toLocalFile().startsWith(ZafTempStore::defaultStore()._srTempPath()));
+    const QString out = r.url.toLocalFile();
+    EXPECT_TRUE(QFileInfo(out).fileName().startsWith(QStringLiteral("ZafReplay_Final")));
+
+    EXPECT_EQ(audioStreamCount(out), 1);
+    EXPECT_GT(toneLevel(out, 0, fixture::toneFrequency(0)), 0.3);
+    EXPECT_GT(toneLevel(out, 0, fixture::toneFrequency(1)), 0.3);
+    EXPECT_EQ(streamMD5(out, QStringLiteral("0:v")), streamMD5(source, QStringLiteral("0:v")));
+}
+
+TEST(AudioMixUtility, MovieWithoutAudioExportsWithAnEmptyMix)
+{
+    ScratchDir scratch;
+    fixture::FixtureSpec spec;
+    spec.audioTracks = 0;
+    const QString source = makeFixtureMovie(scratch.path(), spec);
+    ASSERT_FALSE(source.isEmpty());
+
+    const auto session = ZafAudioMixUtility::exportSessionForMixingAudio(QUrl::fromLocalFile(source),
+                                                                         QUrl::fromLocalFile(scratch.file(QStringLiteral("o.mp4"))));
+    ASSERT_TRUE(session);
+    const std::optional<media::AudioMix> audioMix = session->audioMix();
+    ASSERT_TRUE(audioMix.has_value());
+    EXPECT_TRUE(audioMix->inputParameters.isEmpty());
+
+    const MixResult r = mix(QUrl::fromLocalFile(source));
+    ASSERT_FALSE(r.error.has_value());
+    EXPECT_EQ(audioStreamCount(r.url.toLocalFile()), 0);
+}
+
+TEST(AudioMixUtility, MixListsEveryAudioTrackInOrderAndNothingElse)
+{
+    ScratchDir scratch;
+    fixture::FixtureSpec spec;
+    spec.audioTracks = 3;
+    const QString source = makeFixtureMovie(scratch.path(), spec);
+    const auto session = ZafAudioMixUtility::exportSessionForMixingAudio(QUrl::fromLocalFile(source),
+                                                                         QUrl::fromLocalFile(scratch.file(QStringLiteral("o.mp4"))));
+    ASSERT_TRUE(session);
+    const std::optional<media::AudioMix> audioMix = session->audioMix();
+    ASSERT_TRUE(audioMix.has_value());
+    QList<std::int32_t> ids;
+    for (const auto &p : audioMix->inputParameters)
+        ids << p.trackID;
+    EXPECT_EQ(ids, (QList<std::int32_t>{2, 3, 4})) << "the video is track 1";
+}
+
+TEST(AudioMixUtility, UnreadableMovieFailsWithExportCodeAndLogs)
+{
+    ScratchDir scratch;
+    const QString garbage = scratch.write(QStringLiteral("garbage.mp4"), 5000);
+    LogCapture logs;
+    for (const QString &path : {garbage, scratch.file(QStringLiteral("missing.mp4"))}) {
+        const MixResult r = mix(QUrl::fromLocalFile(path));
+        EXPECT_TRUE(r.url.isEmpty());
+        ASSERT_TRUE(r.error.has_value());
+        EXPECT_EQ(r.error->code, -5812);
+    }
+    EXPECT_EQ(logs.count(QStringLiteral("ZafAudioMixUtility: MvAssetExportSessionFailed")), 2);
+}
+
+TEST(AudioMixUtility, TempFileURLIsTheDirectoryStemAndWholeSeconds)
+{
+    const QString dir = ZafTempStore::defaultStore()._srTempPath();
+    EXPECT_EQ(ZafAudioMixUtility::tempFileURLForTime(1000000000.9).toLocalFile(),
+              dir + QStringLiteral("/ZafReplay_Final1000000000.mp4"));
+    EXPECT_TRUE(ZafAudioMixUtility::tempFileURLForTime(1000000000.9).toLocalFile().contains(QStringLiteral("//ZafReplay")));
+    EXPECT_EQ(ZafAudioMixUtility::tempFileURLForTime(5.0), ZafAudioMixUtility::tempFileURLForTime(5.99));
+}
+
+} // namespace
+} // namespace zaf::test
