@@ -24,7 +24,8 @@ build: configure
 	@cmake --build $(BUILD_DIR)
 
 test: build
-	@cd $(BUILD_DIR) && QT_QPA_PLATFORM=offscreen ctest --output-on-failure -j2 --timeout 600
+	@cd $(BUILD_DIR) && QT_QPA_PLATFORM=offscreen TSAN_OPTIONS="suppressions=$(CURDIR)/scripts/tsan.supp $(TSAN_OPTIONS)" \
+	  ctest --output-on-failure -j2 --timeout 600
 
 run: build
 	@scripts/run-main
