@@ -1,0 +1,303 @@
+#pragma once
+
+// ZafVideoEditorViewController: the editor. It plays the recorded movie under two toolbars with
+// the timeline, lets the user trim, save and share, and reports the actions carried out to its
+// delegate when the user is done.
+//
+// Threads. Everything runs on the main thread: construction, the actions, the timeline's delegate
+// and data-source calls, the player's observers, layout and destruction. Work that finishes
+// elsewhere comes back to the main thread before it touches the editor: the trim export's
+// completion (synchronously, so the export's thread waits for the reload), the thumbnail
+// generator's answers (stored into the cache on the main thread), and the end of a save.
+//
+// Order of events for one movie: construction loads the movie (status unknown); the item's status
+// change to ready makes the editor the timeline's delegate and data source and reloads it; the
+// timeline then asks for duration, aspect ratio, timestamps and thumbnails. Play, pause, the
+// timeline callbacks and the end of playback follow as the user acts. A trim export's success
+// reloads a new player and the sequence starts again at "status unknown" for the new movie.
+//
+// The class is split by concern over several files: editor_construction.cpp (data model,
+// initializers, appearance, destruction), editor_playback.cpp, editor_modes.cpp,
+// editor_trimming.cpp, editor_thumbnails.cpp, editor_layout.cpp, editor_save.cpp,
+// editor_share.cpp and editor_keyboard.cpp (desktop shortcuts).
+
+#include "platform/media/media_time.h"
+#include "platform/media/player.h"
+#include "platform/ui/movie_scrubber.h"
+#include "platform/ui/view_controller.h"
+
+#include <QColor>
+#include <QHash>
+#include <QImage>
+#include <QLoggingCategory>
+#include <QPointer>
+#include <QRectF>
+#include <QStringList>
+#include <QUrl>
+#include <QtPlugin>
+
+#include <atomic>
+#include <memory>
+#include <optional>
+
+class QLabel;
+class QWidget;
+class ZafVideoOverlayButton;
+
+namespace zaf::media {
+class ExportSession;
+class ImageGenerator;
+class MediaAsset;
+class PlayerItem;
+class PlayerLayer;
+} // namespace zaf::media
+
+namespace zaf::ui {
+class BackdropView;
+class BarButtonItem;
+class Toolbar;
+} // namespace zaf::ui
+
+Q_DECLARE_LOGGING_CATEGORY(lcEditor)
+
+class ZafVideoEditorViewController;
+
+// The editor's delegate: told once the user is done, with the activity types carried out.
+// Implemented by a QObject (the editor keeps it weakly). Called on the main thread.
+class ZafVideoEditorViewControllerDelegate {
+public:
+    virtual ~ZafVideoEditorViewControllerDelegate() = default;
+    virtual void videoEditorDidFinishWithActivityTypes(ZafVideoEditorViewController *editor,
+                                                       const QStringList &activityTypes) = 0;
+};
+#define ZafVideoEditorViewControllerDelegate_iid "com.zafrel.VideoEditor.ZafVideoEditorViewControllerDelegate"
+Q_DECLARE_INTERFACE(ZafVideoEditorViewControllerDelegate, ZafVideoEditorViewControllerDelegate_iid)
+
+// The activity type of a save to the video library, as the share sheet names it.
+extern const char *const ZafActivityTypeSaveToPhotoLibrary;
+
+class ZafVideoEditorViewController : public zaf::ui::ViewController,
+                                     public zaf::ui::MovieScrubberDelegate,
+                                     public zaf::ui::MovieScrubberDataSource {
+    Q_OBJECT
+public:
+    using MediaTime = zaf::media::MediaTime;
+
+    // The full initializer: the movie at url of the recording application (identifier, name); a tint
+    // colour for the top toolbar (invalid: none); the frame of the editor's view (empty: leave it).
+    ZafVideoEditorViewController(const QString &bundleIdentifier, const QUrl &url, const QString &applicationName,
+                                 const QColor &overrideTintColor, const QRectF &size, QObject *parent = nullptr);
+    ZafVideoEditorViewController(const QString &bundleIdentifier, const QUrl &url, const QString &applicationName,
+                                 QObject *parent = nullptr);
+    ~ZafVideoEditorViewController() override;
+
+    // Whether the device has a home button (asked once per process).
+    static bool deviceHasHomeButton();
+
+    // --- Appearance (construction file) ---
+    void viewWillAppear(bool animated) override;
+    void viewDidAppear(bool animated) override;
+    void viewWillDisappear(bool animated) override;
+    bool canBecomeFirstResponder() const override { return true; }
+
+    // --- Playback ---
+    // The "status" observation of the current player item.
+    void observeValueForKeyPathOfObjectChangeContext(const QString &keyPath, QObject *object,
+                                                     const QVariantMap &change, void *context);
+    Q_INVOKABLE void itemDidFinishPlaying(QObject *notificationObject);
+    Q_INVOKABLE void playAction();
+    Q_INVOKABLE void pauseAction();
+    void reloadMvLayerWithURL(const QUrl &url);
+    double getPlayerDuration() const;
+    QSizeF getVideoSize() const;
+
+    // --- Preview and edit modes ---
+    Q_INVOKABLE void handleSingleTap(QObject *recognizer);
+    void configureReplayUIHidden();
+    void showUI();
+    void hideUI();
+    void editMode();
+    void previewMode();
+    void motionEnded(zaf::ui::MotionSubtype subtype, const zaf::ui::MotionEvent &event) override;
+
+    // --- Trimming ---
+    QUrl trimFileURL() const;
+    void trimVideo();
+    Q_INVOKABLE void undoAction();
+    void movieScrubberValueDidChange(zaf::ui::MovieScrubber *scrubber, double value) override;
+    void movieScrubberDidBeginScrubbingWithHandle(zaf::ui::MovieScrubber *scrubber, zaf::ui::MovieScrubberHandle handle) override;
+    void movieScrubberDidEndScrubbingWithHandle(zaf::ui::MovieScrubber *scrubber, zaf::ui::MovieScrubberHandle handle) override;
+    void movieScrubberEditingStartValueDidChange(zaf::ui::MovieScrubber *scrubber, double value) override;
+    void movieScrubberEditingEndValueDidChange(zaf::ui::MovieScrubber *scrubber, double value) override;
+    void movieScrubberDidBeginEditing(zaf::ui::MovieScrubber *scrubber) override;
+    void movieScrubberDidCancelEditing(zaf::ui::MovieScrubber *scrubber) override;
+
+    // --- Thumbnails (the timeline's data source) ---
+    double movieScrubberDuration(zaf::ui::MovieScrubber *scrubber) override;
+    double movieScrubberThumbnailAspectRatio(zaf::ui::MovieScrubber *scrubber) override;
+    QList<double> movieScrubberEvenlySpacedTimestampsStartingAtEndingAt(zaf::ui::MovieScrubber *scrubber, int count,
+                                                                        double start, double end) override;
+    void movieScrubberRequestThumbnailImageForTimestamp(zaf::ui::MovieScrubber *scrubber, double timestamp) override;
+    void setThumbnailFromCacheWithTimeStamp(double timestamp);
+    QSizeF getThumbnailSize() const;
+
+    // --- Layout and rotation ---
+    void applyPhoneUILayout();
+    void applyPadUILayout();
+    void applyPhoneConstraints();
+    void applyPadConstraints();
+    void viewDidLayoutSubviews() override;
+    int currentOrientation();
+    void viewWillTransitionToSize(const QSizeF &size, zaf::ui::TransitionCoordinator &coordinator) override;
+    void refreshMvRotation();
+
+    // --- Save and done ---
+    Q_INVOKABLE void saveAction();
+    Q_INVOKABLE void doneAction();
+
+    // --- Share ---
+    Q_INVOKABLE void shareAction();
+    void displayShareSheetWithVideoURL(const QUrl &url);
+
+    // --- Data model: plain getters and setters, no side effects ---
+    QUrl videoURL() const { return m_videoURL; }
+    void setVideoURL(const QUrl &url) { m_videoURL = url; }
+    zaf::media::Player *mvPlayer() const { return m_mvPlayer.get(); }
+    zaf::media::PlayerLayer *mvPlayerLayer() const { return m_mvPlayerLayer; }
+    std::shared_ptr<zaf::media::PlayerItem> mvPlayerItem() const { return m_mvPlayerItem; }
+    std::shared_ptr<zaf::media::MediaAsset> mvAsset() const { return m_mvAsset; }
+    zaf::ui::BackdropView *scrubberContainterView() const { return m_scrubberContainterView; }
+    zaf::media::TimeObserverToken playbackTimeObserver() const { return m_playbackTimeObserver; }
+    QString applicationName() const { return m_applicationName; }
+    void setApplicationName(const QString &name) { m_applicationName = name; }
+    QString bundleIdentifier() const { return m_bundleIdentifier; }
+    void setBundleIdentifier(const QString &identifier) { m_bundleIdentifier = identifier; }
+    zaf::media::TimeObserverToken timeObserver() const { return m_timeObserver; }
+    bool isExporting() const { return m_exporting; }
+    void setExporting(bool v) { m_exporting = v; }
+    bool isScrubbing() const { return m_scrubbing; }
+    void setScrubbing(bool v) { m_scrubbing = v; }
+    bool isTrimming() const { return m_trimming; }
+    void setTrimming(bool v) { m_trimming = v; }
+    bool isPadMode() const { return m_padMode; }
+    void setPadMode(bool v) { m_padMode = v; }
+    bool isIntroMode() const { return m_introMode; }
+    void setIntroMode(bool v) { m_introMode = v; }
+    bool isUIHidden() const { return m_uiHidden; }
+    void setUiHidden(bool v) { m_uiHidden = v; }
+    bool isShareSheetUp() const { return m_shareSheetUp; }
+    void setShareSheetUp(bool v) { m_shareSheetUp = v; }
+    zaf::ui::Toolbar *bottomToolBar() const { return m_bottomToolBar; }
+    zaf::ui::Toolbar *topToolBar() const { return m_topToolBar; }
+    zaf::ui::BarButtonItem *shareButton() const { return m_shareButton; }
+    zaf::ui::BarButtonItem *pauseButton() const { return m_pauseButton; }
+    zaf::ui::BarButtonItem *saveButton() const { return m_saveButton; }
+    zaf::ui::BarButtonItem *flexSpace() const { return m_flexSpace; }
+    zaf::ui::BarButtonItem *doneButton() const { return m_doneButton; }
+    zaf::ui::BarButtonItem *cancelButton() const { return m_cancelButton; }
+    zaf::ui::BarButtonItem *cancelTrimButton() const { return m_cancelTrimButton; }
+    zaf::ui::BarButtonItem *trimButton() const { return m_trimButton; }
+    zaf::ui::BarButtonItem *undoButton() const { return m_undoButton; }
+    zaf::ui::BarButtonItem *titleButton() const { return m_titleButton; }
+    zaf::ui::BarButtonItem *playButton() const { return m_playButton; }
+    zaf::ui::BarButtonItem *fixSpace() const { return m_fixSpace; }
+    ZafVideoOverlayButton *videoOverlayPlayButton() const { return m_videoOverlayPlayButton; }
+    QWidget *videoOverlay() const { return m_videoOverlay; }
+    QLabel *titleLabel() const { return m_titleLabel; }
+    double editStartTime() const { return m_editStartTime; }
+    void setEditStartTime(double v) { m_editStartTime = v; }
+    double editEndTime() const { return m_editEndTime; }
+    void setEditEndTime(double v) { m_editEndTime = v; }
+    QUrl trimFilePath() const { return m_trimFilePath; }
+    void setTrimFilePath(const QUrl &url) { m_trimFilePath = url; }
+    QUrl originalVideoURL() const { return m_originalVideoURL; }
+    std::shared_ptr<zaf::media::ExportSession> exportSession() const { return m_exportSession; }
+    zaf::ui::MovieScrubber *mvTrimmer() const { return m_mvTrimmer; }
+    std::shared_ptr<zaf::media::ImageGenerator> thumbnailGenerator() const { return m_thumbnailGenerator; }
+    // The thumbnail cache (absent until the first request and after each discard).
+    const std::optional<QHash<double, QImage>> &cachedTimeStamps() const { return m_cachedTimeStamps; }
+    const QStringList &activityTypes() const { return m_activityTypes; }
+    bool hasEdit() const { return m_hasEdit; }
+    void setHasEdit(bool v) { m_hasEdit = v; }
+    bool hasHomeButton() const { return m_hasHomeButton; }
+    QObject *delegate() const { return m_delegate.data(); }
+    // Must implement ZafVideoEditorViewControllerDelegate; kept weakly.
+    void setDelegate(QObject *delegate) { m_delegate = delegate; }
+    QUrl fileAttachmentURL() const { return m_fileAttachmentURL; }
+    void setFileAttachmentURL(const QUrl &url) { m_fileAttachmentURL = url; }
+    QString overrideShareMessage() const { return m_overrideShareMessage; }
+    void setOverrideShareMessage(const QString &message) { m_overrideShareMessage = message; }
+
+private:
+    // Construction helpers (construction file).
+    void createBarButtonItems();
+    void createToolbars(const QColor &tint);
+    QLabel *makeTitleLabel();
+    void addPlaybackTimeObserver();
+    // Observation of the current item: "status" and the end-of-playback notification.
+    void observeStatusOfCurrentItem();
+    void stopObservingStatusOfCurrentItem();
+    void registerForEndOfPlayback();
+    void removeAllNotificationRegistrations();
+    // The seconds-to-time rule: the timescale of the player's current time (0 without a player).
+    MediaTime mediaTimeFromSeconds(double seconds) const;
+    // The layout choice: tablet idiom, else the view's orientation.
+    void applyLayoutChoice();
+    void setToolbarItems(zaf::ui::Toolbar *toolbar, const QList<zaf::ui::BarButtonItem *> &items);
+    void finishWithDelegate();
+    void installKeyboardShortcuts();
+    void setTrimPointAtPlayhead(bool start);
+
+    QUrl m_videoURL;
+    std::unique_ptr<zaf::media::Player> m_mvPlayer;
+    zaf::media::PlayerLayer *m_mvPlayerLayer = nullptr;
+    std::shared_ptr<zaf::media::PlayerItem> m_mvPlayerItem;
+    std::shared_ptr<zaf::media::MediaAsset> m_mvAsset;
+    zaf::ui::BackdropView *m_scrubberContainterView = nullptr;
+    zaf::media::TimeObserverToken m_playbackTimeObserver = 0;
+    QString m_applicationName;
+    QString m_bundleIdentifier;
+    zaf::media::TimeObserverToken m_timeObserver = 0;
+    bool m_exporting = false;
+    bool m_scrubbing = false;
+    bool m_trimming = false;
+    bool m_padMode = false;
+    bool m_introMode = true;
+    bool m_uiHidden = false;
+    bool m_shareSheetUp = false;
+    zaf::ui::Toolbar *m_bottomToolBar = nullptr;
+    zaf::ui::Toolbar *m_topToolBar = nullptr;
+    zaf::ui::BarButtonItem *m_shareButton = nullptr;
+    zaf::ui::BarButtonItem *m_pauseButton = nullptr;
+    zaf::ui::BarButtonItem *m_saveButton = nullptr;
+    zaf::ui::BarButtonItem *m_flexSpace = nullptr;
+    zaf::ui::BarButtonItem *m_doneButton = nullptr;
+    zaf::ui::BarButtonItem *m_cancelButton = nullptr;
+    zaf::ui::BarButtonItem *m_cancelTrimButton = nullptr;
+    zaf::ui::BarButtonItem *m_trimButton = nullptr;
+    zaf::ui::BarButtonItem *m_undoButton = nullptr;
+    zaf::ui::BarButtonItem *m_titleButton = nullptr;
+    zaf::ui::BarButtonItem *m_playButton = nullptr;
+    zaf::ui::BarButtonItem *m_fixSpace = nullptr;
+    // Owned by the editor's view once added to it (as every subview is).
+    ZafVideoOverlayButton *m_videoOverlayPlayButton = nullptr;
+    QWidget *m_videoOverlay = nullptr;
+    QLabel *m_titleLabel = nullptr;
+    double m_editStartTime = 0;
+    double m_editEndTime = 0;
+    QUrl m_trimFilePath;
+    QUrl m_originalVideoURL;
+    std::shared_ptr<zaf::media::ExportSession> m_exportSession;
+    zaf::ui::MovieScrubber *m_mvTrimmer = nullptr;
+    std::shared_ptr<zaf::media::ImageGenerator> m_thumbnailGenerator;
+    std::optional<QHash<double, QImage>> m_cachedTimeStamps;
+    QStringList m_activityTypes;
+    std::atomic<bool> m_hasEdit{false};
+    std::atomic<bool> m_hasHomeButton{true};
+    QPointer<QObject> m_delegate;
+    QUrl m_fileAttachmentURL;
+    QString m_overrideShareMessage;
+
+    QList<QMetaObject::Connection> m_statusObservation;
+    QList<QMetaObject::Connection> m_notificationRegistrations;
+};

@@ -1,0 +1,96 @@
+// Desktop keys: Space plays and pauses, Escape cancels (the trim, or the editor), Return applies a
+// trim, Ctrl+S saves, I and O set the trim range at the playhead, the arrow keys step the playhead
+// (one frame, or one second with Shift). Ctrl+Z is the shake, delivered by the window.
+#include "editor/editor.h"
+
+#include "platform/media/player.h"
+#include "platform/ui/movie_scrubber.h"
+
+#include <QApplication>
+#include <QKeyEvent>
+#include <QShortcut>
+#include <QWidget>
+
+#include <algorithm>
+#include <cmath>
+
+using namespace zaf::ui;
+
+namespace {
+constexpr double kMinimumTrimLength = 1.0;
+}
+
+void ZafVideoEditorViewController::installKeyboardShortcuts()
+{
+    QWidget *root = view();
+    auto shortcut = [root](const QKeySequence &keys, std::function<void()> fn) {
+        auto *s = new QShortcut(keys, root);
+        s->setContext(Qt::WindowShortcut);
+        QObject::connect(s, &QShortcut::activated, root, std::move(fn));
+    };
+    shortcut(QKeySequence(Qt::Key_Space), [this] {
+        if (m_mvPlayer->rate() > 0)
+            pauseAction();
+        else
+            playAction();
+    });
+    shortcut(QKeySequence(Qt::Key_Escape), [this] {
+        if (m_trimming)
+            undoAction();
+        else
+            doneAction();
+    });
+    for (Qt::Key key : {Qt::Key_Return, Qt::Key_Enter}) {
+        shortcut(QKeySequence(key), [this] {
+            if (m_trimming)
+                saveAction();
+        });
+    }
+    shortcut(QKeySequence::Save, [this] {
+        if (!m_trimming)
+            saveAction();
+    });
+    shortcut(QKeySequence(Qt::Key_I), [this] { setTrimPointAtPlayhead(true); });
+    shortcut(QKeySequence(Qt::Key_O), [this] { setTrimPointAtPlayhead(false); });
+    // The arrow keys go to the timeline, which steps its playhead as a short scrub.
+    const QKeyCombination steps[] = {QKeyCombination(Qt::Key_Left), QKeyCombination(Qt::Key_Right),
+                                     QKeyCombination(Qt::ShiftModifier, Qt::Key_Left),
+                                     QKeyCombination(Qt::ShiftModifier, Qt::Key_Right), QKeyCombination(Qt::Key_Home),
+                                     QKeyCombination(Qt::Key_End)};
+    for (const QKeyCombination keys : steps) {
+        shortcut(QKeySequence(keys), [this, keys] {
+            QKeyEvent press(QEvent::KeyPress, keys.key(), keys.keyboardModifiers());
+            QApplication::sendEvent(m_mvTrimmer, &press);
+        });
+    }
+}
+
+void ZafVideoEditorViewController::setTrimPointAtPlayhead(bool start)
+{
+    // Only a ready movie has a range to edit (the timeline has its delegate then).
+    if (m_mvTrimmer->delegate() != this || m_exporting)
+        return;
+    const double duration = getPlayerDuration();
+    if (!std::isfinite(duration) || duration < kMinimumTrimLength)
+        return;
+    if (!m_mvTrimmer->isEditing()) {
+        // As a handle drag does: the timeline enters editing and the editor its edit mode.
+        m_mvTrimmer->setEditing(true, true);
+        movieScrubberDidBeginEditing(m_mvTrimmer);
+    }
+    const double playhead = std::clamp(m_mvTrimmer->value(), 0.0, duration);
+    double rangeStart = m_mvTrimmer->editingStartValue();
+    double rangeEnd = m_mvTrimmer->editingEndValue();
+    if (start) {
+        rangeStart = std::min(playhead, duration - kMinimumTrimLength);
+        rangeEnd = std::max(rangeEnd, rangeStart + kMinimumTrimLength);
+    } else {
+        rangeEnd = std::max(playhead, kMinimumTrimLength);
+        rangeStart = std::min(rangeStart, rangeEnd - kMinimumTrimLength);
+    }
+    m_mvTrimmer->setEditingRange(rangeStart, rangeEnd);
+    if (start)
+        movieScrubberEditingStartValueDidChange(m_mvTrimmer, rangeStart);
+    else
+        movieScrubberEditingEndValueDidChange(m_mvTrimmer, rangeEnd);
+}

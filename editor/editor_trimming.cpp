@@ -1,0 +1,155 @@
+// Trimming: the timeline's callbacks, the trim export and its completion, the trimmed file's name,
+// cancelling a trim (button, Escape or the shake).
+#include "editor/editor.h"
+
+#include "platform/dispatch.h"
+#include "platform/log.h"
+#include "platform/media/export_session.h"
+#include "platform/media/media_asset.h"
+#include "platform/media/player_item.h"
+#include "tempstore/temp_directory.h"
+#include "tempstore/temp_store.h"
+
+using namespace zaf::media;
+using namespace zaf::ui;
+
+QUrl ZafVideoEditorViewController::trimFileURL() const
+{
+    const QString stem = ZafTempStore::defaultStore()._srTempPath() + QLatin1Char('/') + m_applicationName + QLatin1Char('_');
+    return QUrl::fromLocalFile(ZafTempMovieFileName(stem));
+}
+
+void ZafVideoEditorViewController::trimVideo()
+{
+    // One export at a time: a second apply while one runs is ignored.
+    if (m_exporting)
+        return;
+    // The file of the previous trim is the movie being trimmed now; it is retired only once the
+    // new export has finished, so the export never reads a file that is being removed.
+    const QUrl previousTrimFile = m_trimFilePath;
+    m_exporting = true;
+    const std::shared_ptr<MediaAsset> asset = MediaAsset::assetWithURL(m_videoURL);
+    m_exportSession = ExportSession::exportSessionWithAsset(asset, QLatin1String(kExportPresetHighestQuality));
+    m_trimFilePath = trimFileURL();
+    if (!m_exportSession) {
+        zaf::log::notice(lcEditor(), QStringLiteral("ZavVideoEditorViewController: Export Trim Video Failed, due to error: %1")
+                                         .arg(int(kMediaErrorInvalidArgument)));
+        m_exporting = false;
+        return;
+    }
+    m_exportSession->setOutputURL(m_trimFilePath);
+    m_exportSession->setOutputFileType(QLatin1String(kFileTypeMPEG4));
+    const MediaTime start = mediaTimeFromSeconds(m_editStartTime);
+    const MediaTime end = mediaTimeFromSeconds(m_editEndTime);
+    m_exportSession->setTimeRange(MediaTimeRange::fromStartEnd(start, end));
+
+    const std::shared_ptr<ExportSession> session = m_exportSession;
+    QPointer<ZafVideoEditorViewController> weakSelf(this);
+    // Runs on the export's thread.
+    session->exportAsynchronously([session, weakSelf, previousTrimFile] {
+        switch (session->status()) {
+        case ExportStatus::Failed: {
+            const zaf::OptionalError error = session->error();
+            zaf::log::notice(lcEditor(), QStringLiteral("ZavVideoEditorViewController: Export Trim Video Failed, due to error: %1")
+                                             .arg(error ? error->code : 0));
+            // The user must be able to cancel the trim or try again.
+            zaf::dispatch::main([weakSelf] {
+                if (weakSelf)
+                    weakSelf->m_exporting = false;
+            });
+            break;
+        }
+        case ExportStatus::Cancelled:
+            zaf::log::notice(lcEditor(), QStringLiteral("ZavVideoEditorViewController: Export Trim Video Cancelled"));
+            zaf::dispatch::main([weakSelf] {
+                if (weakSelf)
+                    weakSelf->m_exporting = false;
+            });
+            break;
+        default:
+            // The export's thread waits until the new movie is loaded.
+            zaf::dispatch::mainSync([weakSelf, session, previousTrimFile] {
+                ZafVideoEditorViewController *self = weakSelf.data();
+                if (!self)
+                    return;
+                self->m_exporting = false;
+                self->removeAllNotificationRegistrations();
+                self->reloadMvLayerWithURL(session->outputURL());
+                self->registerForEndOfPlayback();
+                if (previousTrimFile != session->outputURL())
+                    ZafTempStore::defaultStore()._srRemoveFile(previousTrimFile);
+            });
+            break;
+        }
+    });
+}
+
+void ZafVideoEditorViewController::undoAction()
+{
+    if (m_exporting)
+        return;
+    if (MovieScrubberDelegate *delegate = m_mvTrimmer->delegate())
+        delegate->movieScrubberDidCancelEditing(m_mvTrimmer);
+}
+
+void ZafVideoEditorViewController::motionEnded(MotionSubtype subtype, const MotionEvent &event)
+{
+    if (subtype == MotionSubtype::Shake && m_trimming && !m_exporting)
+        undoAction();
+    ViewController::motionEnded(subtype, event);
+}
+
+void ZafVideoEditorViewController::movieScrubberValueDidChange(MovieScrubber *, double value)
+{
+    m_mvPlayer->seekToTime(mediaTimeFromSeconds(value));
+}
+
+void ZafVideoEditorViewController::movieScrubberDidBeginScrubbingWithHandle(MovieScrubber *, MovieScrubberHandle)
+{
+    m_scrubbing = true;
+    pauseAction();
+}
+
+void ZafVideoEditorViewController::movieScrubberDidEndScrubbingWithHandle(MovieScrubber *scrubber, MovieScrubberHandle)
+{
+    m_mvPlayer->seekToTime(mediaTimeFromSeconds(scrubber->value()));
+    m_scrubbing = false;
+}
+
+void ZafVideoEditorViewController::movieScrubberDidBeginEditing(MovieScrubber *)
+{
+    editMode();
+    m_trimming = true;
+}
+
+void ZafVideoEditorViewController::movieScrubberEditingStartValueDidChange(MovieScrubber *, double value)
+{
+    m_mvPlayer->pause();
+    m_editStartTime = value;
+    QPointer<ZafVideoEditorViewController> weakSelf(this);
+    // The frame under the handle is shown once this callback has returned.
+    zaf::dispatch::main([weakSelf, value] {
+        if (weakSelf && weakSelf->m_mvPlayer)
+            weakSelf->m_mvPlayer->seekToTime(weakSelf->mediaTimeFromSeconds(value));
+    });
+    m_trimming = true;
+}
+
+void ZafVideoEditorViewController::movieScrubberEditingEndValueDidChange(MovieScrubber *, double value)
+{
+    m_mvPlayer->pause();
+    m_editEndTime = value;
+    QPointer<ZafVideoEditorViewController> weakSelf(this);
+    zaf::dispatch::main([weakSelf, value] {
+        if (weakSelf && weakSelf->m_mvPlayer)
+            weakSelf->m_mvPlayer->seekToTime(weakSelf->mediaTimeFromSeconds(value));
+    });
+    m_trimming = true;
+}
+
+void ZafVideoEditorViewController::movieScrubberDidCancelEditing(MovieScrubber *scrubber)
+{
+    scrubber->setEditing(false, true);
+    previewMode();
+    m_trimming = false;
+}
