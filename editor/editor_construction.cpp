@@ -2,6 +2,7 @@
 // and the clean-up when the editor goes away.
 #include "editor/editor.h"
 
+#include "editor/editor_constants.h"
 #include "editor/date_extensions.h"
 #include "overlay/video_overlay_button.h"
 #include "platform/capability/capability_service.h"
@@ -37,11 +38,6 @@ constexpr double kTitleLineHeight = 17;
 constexpr int kTitleFontSize = 15;
 constexpr int kDateFontSize = 10;
 constexpr double kFixedSpaceWidthFraction = 0.005;
-constexpr double kTopToolbarHeightWithHomeButton = 60;
-constexpr double kTopToolbarHeightWithoutHomeButton = 85;
-constexpr double kBottomToolbarHeightWithHomeButton = 44;
-constexpr double kBottomToolbarHeightWithoutHomeButton = 64;
-constexpr double kMinimumTrimLength = 1.0;
 constexpr double kZoomDelay = 0.5;
 constexpr double kScrubberEdgeInset = 10.0;
 constexpr int kTimelineBackdropStyle = 2010;
@@ -138,7 +134,7 @@ ZafVideoEditorViewController::ZafVideoEditorViewController(const QString &bundle
 
     m_mvTrimmer = new MovieScrubber(m_scrubberContainterView);
     m_mvTrimmer->setObjectName(QStringLiteral("mvTrimmer"));
-    m_mvTrimmer->setMinimumTrimLength(kMinimumTrimLength);
+    m_mvTrimmer->setMinimumTrimLength(zaf::editor::kMinimumTrimLength);
     m_mvTrimmer->setEditable(true);
     m_mvTrimmer->setZoomDelay(kZoomDelay);
     m_mvTrimmer->setEdgeInset(kScrubberEdgeInset);
@@ -236,7 +232,7 @@ void ZafVideoEditorViewController::createToolbars(const QColor &tint)
 {
     QWidget *root = view();
     const QRect bounds(QPoint(0, 0), root->size());
-    const double topHeight = m_hasHomeButton ? kTopToolbarHeightWithHomeButton : kTopToolbarHeightWithoutHomeButton;
+    const double topHeight = zaf::editor::topToolbarHeight(m_hasHomeButton);
     m_topToolBar = new Toolbar(root);
     m_topToolBar->setObjectName(QStringLiteral("topToolBar"));
     m_topToolBar->setGeometry(frameRect(0, 0, bounds.width(), topHeight));
@@ -244,8 +240,7 @@ void ZafVideoEditorViewController::createToolbars(const QColor &tint)
     if (tint.isValid())
         m_topToolBar->setTintColor(tint);
 
-    const double bottomHeight =
-        m_hasHomeButton ? kBottomToolbarHeightWithHomeButton : kBottomToolbarHeightWithoutHomeButton;
+    const double bottomHeight = zaf::editor::bottomToolbarHeight(m_hasHomeButton);
     m_bottomToolBar = new Toolbar(root);
     m_bottomToolBar->setObjectName(QStringLiteral("bottomToolBar"));
     m_bottomToolBar->setGeometry(frameRect(0, bounds.height() - bottomHeight, bounds.width(), bottomHeight));

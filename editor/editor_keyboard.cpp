@@ -3,11 +3,10 @@
 // (one frame, or one second with Shift). Ctrl+Z is the shake, delivered by the window.
 #include "editor/editor.h"
 
+#include "editor/editor_constants.h"
 #include "platform/media/player.h"
 #include "platform/ui/movie_scrubber.h"
 
-#include <QApplication>
-#include <QKeyEvent>
 #include <QShortcut>
 #include <QWidget>
 
@@ -15,10 +14,6 @@
 #include <cmath>
 
 using namespace zaf::ui;
-
-namespace {
-constexpr double kMinimumTrimLength = 1.0;
-}
 
 void ZafVideoEditorViewController::installKeyboardShortcuts()
 {
@@ -58,10 +53,8 @@ void ZafVideoEditorViewController::installKeyboardShortcuts()
                                      QKeyCombination(Qt::ShiftModifier, Qt::Key_Right), QKeyCombination(Qt::Key_Home),
                                      QKeyCombination(Qt::Key_End)};
     for (const QKeyCombination keys : steps) {
-        shortcut(QKeySequence(keys), [this, keys] {
-            QKeyEvent press(QEvent::KeyPress, keys.key(), keys.keyboardModifiers());
-            QApplication::sendEvent(m_mvTrimmer, &press);
-        });
+        shortcut(QKeySequence(keys),
+                 [this, keys] { m_mvTrimmer->stepPlayheadForKey(keys.key(), keys.keyboardModifiers()); });
     }
 }
 
@@ -71,7 +64,7 @@ void ZafVideoEditorViewController::setTrimPointAtPlayhead(bool start)
     if (m_mvTrimmer->delegate() != this || m_exporting)
         return;
     const double duration = getPlayerDuration();
-    if (!std::isfinite(duration) || duration < kMinimumTrimLength)
+    if (!std::isfinite(duration) || duration < zaf::editor::kMinimumTrimLength)
         return;
     if (!m_mvTrimmer->isEditing()) {
         // As a handle drag does: the timeline enters editing and the editor its edit mode.
@@ -82,11 +75,11 @@ void ZafVideoEditorViewController::setTrimPointAtPlayhead(bool start)
     double rangeStart = m_mvTrimmer->editingStartValue();
     double rangeEnd = m_mvTrimmer->editingEndValue();
     if (start) {
-        rangeStart = std::min(playhead, duration - kMinimumTrimLength);
-        rangeEnd = std::max(rangeEnd, rangeStart + kMinimumTrimLength);
+        rangeStart = std::min(playhead, duration - zaf::editor::kMinimumTrimLength);
+        rangeEnd = std::max(rangeEnd, rangeStart + zaf::editor::kMinimumTrimLength);
     } else {
-        rangeEnd = std::max(playhead, kMinimumTrimLength);
-        rangeStart = std::min(rangeStart, rangeEnd - kMinimumTrimLength);
+        rangeEnd = std::max(playhead, zaf::editor::kMinimumTrimLength);
+        rangeStart = std::min(rangeStart, rangeEnd - zaf::editor::kMinimumTrimLength);
     }
     m_mvTrimmer->setEditingRange(rangeStart, rangeEnd);
     if (start)

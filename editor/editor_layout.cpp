@@ -2,6 +2,7 @@
 // refit of the video, the toolbars and the timeline when the view changes size.
 #include "editor/editor.h"
 
+#include "editor/editor_constants.h"
 #include "platform/media/player_layer.h"
 #include "platform/ui/backdrop_view.h"
 #include "platform/ui/bar_button_item.h"
@@ -17,11 +18,6 @@ using namespace zaf::ui;
 
 namespace {
 
-constexpr double kTimelineHeight = 38;
-constexpr double kTopToolbarHeightWithHomeButton = 60;
-constexpr double kTopToolbarHeightWithoutHomeButton = 85;
-constexpr double kBottomToolbarHeightWithHomeButton = 44;
-constexpr double kBottomToolbarHeightWithoutHomeButton = 64;
 const EdgeInsets kNoInsets{0, 0, 0, 0};
 const EdgeInsets kPadPlayInsets{8, 0, -8, 0};
 const EdgeInsets kPadShareInsets{5, 0, -5, 0};
@@ -96,7 +92,7 @@ void ZafVideoEditorViewController::applyPhoneConstraints()
         {m_scrubberContainterView, LayoutAttribute::Leading, view(), LayoutAttribute::Leading, 1, 0, kTimelineRules},
         {m_scrubberContainterView, LayoutAttribute::Trailing, view(), LayoutAttribute::Trailing, 1, 0, kTimelineRules},
         {m_scrubberContainterView, LayoutAttribute::Bottom, m_bottomToolBar, LayoutAttribute::Top, 1, 0, kTimelineRules},
-        {m_scrubberContainterView, LayoutAttribute::Height, nullptr, LayoutAttribute::Leading, 1, kTimelineHeight,
+        {m_scrubberContainterView, LayoutAttribute::Height, nullptr, LayoutAttribute::Leading, 1, zaf::editor::kTimelineHeight,
          kTimelineRules},
     });
     rules->layoutIfNeeded();
@@ -110,7 +106,7 @@ void ZafVideoEditorViewController::applyPadConstraints()
         {m_scrubberContainterView, LayoutAttribute::Leading, view(), LayoutAttribute::Leading, 1, 0, kTimelineRules},
         {m_scrubberContainterView, LayoutAttribute::Trailing, view(), LayoutAttribute::Trailing, 1, 0, kTimelineRules},
         {m_scrubberContainterView, LayoutAttribute::Bottom, view(), LayoutAttribute::Bottom, 1, 0, kTimelineRules},
-        {m_scrubberContainterView, LayoutAttribute::Height, nullptr, LayoutAttribute::Leading, 1, kTimelineHeight,
+        {m_scrubberContainterView, LayoutAttribute::Height, nullptr, LayoutAttribute::Leading, 1, zaf::editor::kTimelineHeight,
          kTimelineRules},
     });
     rules->layoutIfNeeded();
@@ -128,9 +124,9 @@ void ZafVideoEditorViewController::refreshMvRotation()
 {
     const QRect bounds(QPoint(0, 0), view()->size());
     m_mvPlayerLayer->setGeometry(bounds);
-    const double top = m_hasHomeButton ? kTopToolbarHeightWithHomeButton : kTopToolbarHeightWithoutHomeButton;
+    const double top = zaf::editor::topToolbarHeight(m_hasHomeButton);
     m_topToolBar->setGeometry(QRectF(0, 0, bounds.width(), top).toRect());
-    const double bottom = m_hasHomeButton ? kBottomToolbarHeightWithHomeButton : kBottomToolbarHeightWithoutHomeButton;
+    const double bottom = zaf::editor::bottomToolbarHeight(m_hasHomeButton);
     m_bottomToolBar->setGeometry(QRectF(0, bounds.height() - bottom, bounds.width(), bottom).toRect());
     m_thumbnailGenerator.reset();
     m_cachedTimeStamps.reset();

@@ -2,6 +2,7 @@
 // thumbnails, generated in the background and cached by timestamp.
 #include "editor/editor.h"
 
+#include "editor/editor_constants.h"
 #include "platform/dispatch.h"
 #include "platform/media/image_generator.h"
 #include "platform/media/media_asset.h"
@@ -14,7 +15,6 @@ using namespace zaf::media;
 using namespace zaf::ui;
 
 namespace {
-constexpr double kTimelineHeight = 38;
 // Timestamps are handed to the generator in nanoseconds: the same instant for every practical value.
 constexpr std::int32_t kThumbnailTimescale = 1000000000;
 } // namespace
@@ -77,8 +77,8 @@ QSizeF ZafVideoEditorViewController::getThumbnailSize() const
     const double scale = Screen::mainScreenScale();
     const QSizeF video = getVideoSize();
     const float ratio = float(video.width() / video.height());
-    const double height = scale * kTimelineHeight;
-    const float points = float(scale * kTimelineHeight * double(ratio));
+    const double height = scale * zaf::editor::kTimelineHeight;
+    const float points = float(scale * zaf::editor::kTimelineHeight * double(ratio));
     const double width = scale * double(std::rint(points)); // ties to even in the default rounding mode
     return QSizeF(width, height);
 }

@@ -789,30 +789,33 @@ void MovieScrubber::keyPressEvent(QKeyEvent *event)
             d->delegate->movieScrubberDidCancelEditing(this);
         return;
     }
-    if (!d->hasDuration() || d->drag != Private::Drag::None) {
+    if (stepPlayheadForKey(event->key(), event->modifiers()))
+        event->accept();
+    else
         QWidget::keyPressEvent(event);
-        return;
-    }
-    const bool shift = event->modifiers() & Qt::ShiftModifier;
-    const double step = shift ? kLongStep : kFrameStep;
-    switch (event->key()) {
+}
+
+bool MovieScrubber::stepPlayheadForKey(int key, Qt::KeyboardModifiers modifiers)
+{
+    if (!d->hasDuration() || d->drag != Private::Drag::None)
+        return false;
+    const double step = (modifiers & Qt::ShiftModifier) ? kLongStep : kFrameStep;
+    switch (key) {
     case Qt::Key_Left:
         d->stepTo(d->value - step);
-        break;
+        return true;
     case Qt::Key_Right:
         d->stepTo(d->value + step);
-        break;
+        return true;
     case Qt::Key_Home:
         d->stepTo(0.0);
-        break;
+        return true;
     case Qt::Key_End:
         d->stepTo(d->duration);
-        break;
+        return true;
     default:
-        QWidget::keyPressEvent(event);
-        return;
+        return false;
     }
-    event->accept();
 }
 
 void MovieScrubber::leaveEvent(QEvent *event)

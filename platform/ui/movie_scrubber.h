@@ -114,6 +114,11 @@ public:
     // True while a held handle has zoomed the strip in.
     bool isZoomed() const;
 
+    // Steps the playhead for Left/Right (Shift: one second), Home or End as a short scrub, as the
+    // keyboard does when the timeline has focus; false (nothing done) for other keys, while a drag
+    // runs or before the duration is known. Lets a window's shortcuts drive the timeline.
+    bool stepPlayheadForKey(int key, Qt::KeyboardModifiers modifiers);
+
     // Forgets the thumbnails and asks the data source again from the start.
     void reloadData();
     // A thumbnail for a timestamp the scrubber asked for; a null image is ignored.
