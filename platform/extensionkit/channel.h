@@ -1,0 +1,89 @@
+#pragma once
+
+// Channel: the extension's end of the host connection, a connected stream socket carrying framed
+// JSON-RPC 2.0 messages (see frame_codec.h and json_rpc.h).
+//
+// Threads: created, started, closed and destroyed on the main thread, which reads the socket
+// through a QSocketNotifier; every signal is emitted there. The send functions may be called from
+// any thread: writes are serialised under a mutex and each frame is written completely (partial
+// writes are continued; a full socket buffer is waited on with a bounded poll). Writes never raise
+// SIGPIPE; a failed write returns an Error in the POSIX domain whose code is the errno.
+//
+// Incoming messages: valid requests and notifications are emitted; responses are logged (this side
+// never asks the host anything). A malformed message is logged and emitted as protocolError(), and
+// answered with a JSON-RPC error when it carried a request id. A frame length above the cap, a
+// failed read or the peer's end of stream closes the channel: closed() is emitted once, the socket
+// is closed and later sends fail with EPIPE.
+//
+// Lifetime: use create(), whose shared pointer may be released on any thread (the object is then
+// deleted on its own thread). Slots must not delete the channel directly.
+
+#include "platform/error.h"
+#include "platform/extensionkit/frame_codec.h"
+
+#include <QJsonArray>
+#include <QJsonObject>
+#include <QJsonValue>
+#include <QObject>
+#include <QString>
+
+#include <memory>
+#include <mutex>
+
+class QSocketNotifier;
+
+namespace zaf::extensionkit {
+
+class Channel : public QObject {
+    Q_OBJECT
+public:
+    // Takes ownership of `fd` (a connected stream socket; it is made non-blocking and close-on-exec).
+    static std::shared_ptr<Channel> create(int fd, std::uint32_t maxIncomingFrameLength = kDefaultMaxFrameLength);
+    ~Channel() override;
+
+    // Main thread: starts reading. False (with `error` filled) when the descriptor is not usable.
+    bool start(QString *error = nullptr);
+    // Main thread: closes the socket (idempotent); emits closed(reason) when it was open.
+    void close(const QString &reason);
+    bool isOpen() const;
+    int fd() const;
+
+    // Any thread: write one message. nullopt on success.
+    OptionalError sendMessage(const QJsonObject &message);
+    OptionalError sendNotification(const QString &method, const QJsonValue &params = QJsonValue::Undefined);
+    OptionalError sendResult(const QJsonValue &id, const QJsonValue &result);
+    OptionalError sendError(const QJsonValue &id, int code, const QString &message);
+    // Any thread: write one frame with this payload.
+    OptionalError sendFrame(const QByteArray &payload);
+
+    // The longest a send waits for room in a full socket buffer before failing with ETIMEDOUT.
+    void setWriteTimeout(int milliseconds) { m_writeTimeoutMs = milliseconds; }
+
+Q_SIGNALS:
+    // Main thread: a request; answer it with sendResult or sendError using `id`.
+    void requestReceived(const QJsonValue &id, const QString &method, const QJsonValue &params);
+    // Main thread: a notification (never answered).
+    void notificationReceived(const QString &method, const QJsonValue &params);
+    // Main thread: a malformed message or frame (already logged).
+    void protocolError(const QString &text);
+    // Main thread: the channel has closed (peer closed, read error, oversized frame, or close()).
+    // Emitted once.
+    void closed(const QString &reason);
+
+private:
+    Channel(int fd, std::uint32_t maxIncomingFrameLength);
+    void onReadable();
+    void handlePayload(const QByteArray &payload);
+    void reportProtocolError(const QString &text);
+
+    mutable std::mutex m_writeMutex;
+    int m_fd = -1;              // guarded by m_writeMutex for writes and closing
+    bool m_writeBroken = false; // a frame was cut off mid-way: the stream can no longer be written
+    int m_writeTimeoutMs = 5000;
+    bool m_started = false;
+    bool m_closed = false;
+    FrameDecoder m_decoder;
+    QSocketNotifier *m_notifier = nullptr;
+};
+
+} // namespace zaf::extensionkit

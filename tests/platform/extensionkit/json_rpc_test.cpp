@@ -1,0 +1,159 @@
+// JSON-RPC 2.0 parsing and validation: what is accepted, what is refused with which code, and which
+// refusals may be answered (only those that carried a request id).
+
+#include "platform/extensionkit/json_rpc.h"
+
+#include <QJsonArray>
+#include <QJsonDocument>
+
+#include <gtest/gtest.h>
+
+#include <random>
+
+namespace rpc = zaf::extensionkit::jsonrpc;
+
+TEST(JsonRpc, ParsesRequestsNotificationsResultsAndErrors)
+{
+    auto request = rpc::parseMessage(R"({"jsonrpc":"2.0","id":7,"method":"beginExtensionRequest","params":{"inputItems":[]}})");
+    ASSERT_TRUE(request.ok()) << request.errorText.toStdString();
+    EXPECT_EQ(request.message->kind, rpc::MessageKind::Request);
+    EXPECT_EQ(request.message->id, QJsonValue(7));
+    EXPECT_EQ(request.message->method, "beginExtensionRequest");
+    EXPECT_TRUE(request.message->params.toObject().value("inputItems").isArray());
+
+    auto notification = rpc::parseMessage(R"({"jsonrpc":"2.0","method":"removeExtensionView"})");
+    ASSERT_TRUE(notification.ok());
+    EXPECT_EQ(notification.message->kind, rpc::MessageKind::Notification);
+    EXPECT_TRUE(notification.message->id.isUndefined());
+    EXPECT_TRUE(notification.message->params.isUndefined());
+
+    auto stringId = rpc::parseMessage(R"({"jsonrpc":"2.0","id":"abc","method":"m","params":[1,2]})");
+    ASSERT_TRUE(stringId.ok());
+    EXPECT_EQ(stringId.message->id, QJsonValue("abc"));
+    EXPECT_EQ(stringId.message->params.toArray().size(), 2);
+
+    auto result = rpc::parseMessage(R"({"jsonrpc":"2.0","id":1,"result":{"accepted":true}})");
+    ASSERT_TRUE(result.ok());
+    EXPECT_EQ(result.message->kind, rpc::MessageKind::Response);
+    EXPECT_TRUE(result.message->result.toObject().value("accepted").toBool());
+
+    auto error = rpc::parseMessage(R"({"jsonrpc":"2.0","id":null,"error":{"code":-32700,"message":"bad","data":[1]}})");
+    ASSERT_TRUE(error.ok());
+    EXPECT_EQ(error.message->kind, rpc::MessageKind::ErrorResponse);
+    EXPECT_EQ(error.message->errorCode, -32700);
+    EXPECT_EQ(error.message->errorMessage, "bad");
+    EXPECT_TRUE(error.message->errorData.isArray());
+}
+
+struct MalformedCase {
+    const char *name;
+    QByteArray payload;
+    int code;
+    // The id an answer must carry; nullopt when the failure must not be answered.
+    std::optional<QJsonValue> answerId;
+};
+
+TEST(JsonRpc, RefusesMalformedMessagesWithTheRightCodeAndAnswerability)
+{
+    const QJsonValue null(QJsonValue::Null);
+    const QList<MalformedCase> cases{
+        {"empty payload", "", rpc::ParseError, std::nullopt},
+        {"truncated JSON", R"({"jsonrpc":"2.0","id":1,"meth)", rpc::ParseError, std::nullopt},
+        {"invalid UTF-8 in a string", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"m\xff\xfe\"}"), rpc::ParseError, std::nullopt},
+        {"overlong UTF-8 encoding", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xc0\xaf\"}"), rpc::ParseError, std::nullopt},
+        {"lone surrogate in UTF-8", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xed\xa0\x80\"}"), rpc::ParseError, std::nullopt},
+        {"trailing garbage", R"({"jsonrpc":"2.0","method":"m"} x)", rpc::ParseError, std::nullopt},
+        {"a number", "42", rpc::ParseError, std::nullopt},
+        {"a string", R"("hello")", rpc::ParseError, std::nullopt},
+        {"a batch", R"([{"jsonrpc":"2.0","method":"m"}])", rpc::InvalidRequest, std::nullopt},
+        {"empty batch", "[]", rpc::InvalidRequest, std::nullopt},
+        {"missing version", R"({"id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
+        {"version 1.0", R"({"jsonrpc":"1.0","id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
+        {"numeric version", R"({"jsonrpc":2.0,"id":"x","method":"m"})", rpc::InvalidRequest, QJsonValue("x")},
+        {"method a number", R"({"jsonrpc":"2.0","id":3,"method":12})", rpc::InvalidRequest, QJsonValue(3)},
+        {"method null", R"({"jsonrpc":"2.0","id":3,"method":null})", rpc::InvalidRequest, QJsonValue(3)},
+        {"method empty", R"({"jsonrpc":"2.0","id":3,"method":""})", rpc::InvalidRequest, QJsonValue(3)},
+        {"method an object in a notification", R"({"jsonrpc":"2.0","method":{}})", rpc::InvalidRequest, std::nullopt},
+        {"id an object", R"({"jsonrpc":"2.0","id":{},"method":"m"})", rpc::InvalidRequest, null},
+        {"id an array", R"({"jsonrpc":"2.0","id":[1],"method":"m"})", rpc::InvalidRequest, null},
+        {"id a boolean", R"({"jsonrpc":"2.0","id":true,"method":"m"})", rpc::InvalidRequest, null},
+        {"params a string", R"({"jsonrpc":"2.0","id":4,"method":"m","params":"x"})", rpc::InvalidRequest, QJsonValue(4)},
+        {"params a number", R"({"jsonrpc":"2.0","method":"m","params":5})", rpc::InvalidRequest, std::nullopt},
+        {"params null", R"({"jsonrpc":"2.0","id":4,"method":"m","params":null})", rpc::InvalidRequest, QJsonValue(4)},
+        {"method and result", R"({"jsonrpc":"2.0","id":4,"method":"m","result":1})", rpc::InvalidRequest, QJsonValue(4)},
+        {"neither method nor result", R"({"jsonrpc":"2.0","id":4})", rpc::InvalidRequest, std::nullopt},
+        {"result and error", R"({"jsonrpc":"2.0","id":4,"result":1,"error":{"code":1,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
+        {"result without id", R"({"jsonrpc":"2.0","result":1})", rpc::InvalidRequest, std::nullopt},
+        {"result for a null id", R"({"jsonrpc":"2.0","id":null,"result":1})", rpc::InvalidRequest, std::nullopt},
+        {"error a string", R"({"jsonrpc":"2.0","id":4,"error":"bad"})", rpc::InvalidRequest, std::nullopt},
+        {"error code a string", R"({"jsonrpc":"2.0","id":4,"error":{"code":"1","message":"m"}})", rpc::InvalidRequest, std::nullopt},
+        {"error code fractional", R"({"jsonrpc":"2.0","id":4,"error":{"code":1.5,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
+        {"error code out of range", R"({"jsonrpc":"2.0","id":4,"error":{"code":1e12,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
+        {"error message missing", R"({"jsonrpc":"2.0","id":4,"error":{"code":1}})", rpc::InvalidRequest, std::nullopt},
+    };
+    for (const MalformedCase &c : cases) {
+        SCOPED_TRACE(c.name);
+        const rpc::ParseResult result = rpc::parseMessage(c.payload);
+        EXPECT_FALSE(result.ok());
+        EXPECT_EQ(result.errorCode, c.code);
+        EXPECT_FALSE(result.errorText.isEmpty());
+        EXPECT_EQ(result.answerId, c.answerId);
+    }
+}
+
+TEST(JsonRpc, MadeMessagesParseBackAsTheSameKind)
+{
+    const auto request = rpc::parseMessage(rpc::serialize(rpc::makeRequest(5, "doIt", QJsonArray{1})));
+    ASSERT_TRUE(request.ok());
+    EXPECT_EQ(request.message->kind, rpc::MessageKind::Request);
+    EXPECT_EQ(request.message->params, QJsonValue(QJsonArray{1}));
+
+    const auto notification = rpc::parseMessage(rpc::serialize(rpc::makeNotification("extensionDidFinishWithActivityTypes",
+                                                                                       QJsonArray{QJsonArray{"a", "b"}})));
+    ASSERT_TRUE(notification.ok());
+    EXPECT_EQ(notification.message->kind, rpc::MessageKind::Notification);
+    EXPECT_EQ(notification.message->params, QJsonValue(QJsonArray{QJsonArray{"a", "b"}}));
+
+    // A notification made without params leaves the member out rather than sending null.
+    EXPECT_FALSE(rpc::makeNotification("removeExtensionView").contains("params"));
+
+    const auto result = rpc::parseMessage(rpc::serialize(rpc::makeResult("id", QJsonValue())));
+    ASSERT_TRUE(result.ok());
+    EXPECT_EQ(result.message->kind, rpc::MessageKind::Response);
+
+    const auto error = rpc::parseMessage(rpc::serialize(rpc::makeError(9, rpc::MethodNotFound, "no such method")));
+    ASSERT_TRUE(error.ok());
+    EXPECT_EQ(error.message->errorCode, -32601);
+    EXPECT_EQ(error.message->id, QJsonValue(9));
+
+    // An error for an id that cannot be echoed goes out with a null id.
+    EXPECT_TRUE(rpc::makeError(QJsonObject{}, rpc::InvalidRequest, "x").value("id").isNull());
+}
+
+TEST(JsonRpc, MutatedAndRandomPayloadsNeverCrashAndAlwaysExplainARefusal)
+{
+    const QByteArray valid = R"({"jsonrpc":"2.0","id":1,"method":"beginExtensionRequest","params":{"inputItems":[{"title":"t","attachments":[{"type":"text/plain","value":"v"}]}]}})";
+    std::mt19937 random(99);
+    for (int i = 0; i < 3000; ++i) {
+        QByteArray payload = valid;
+        if (i % 3 == 0) {
+            payload = QByteArray(int(random() % 200), Qt::Uninitialized);
+            for (char &c : payload)
+                c = char(random());
+        } else {
+            const int edits = 1 + int(random() % 4);
+            for (int e = 0; e < edits; ++e)
+                payload[int(random() % payload.size())] = char(random());
+        }
+        const rpc::ParseResult result = rpc::parseMessage(payload);
+        if (!result.ok()) {
+            ASSERT_TRUE(result.errorCode == rpc::ParseError || result.errorCode == rpc::InvalidRequest) << result.errorCode;
+            ASSERT_FALSE(result.errorText.isEmpty());
+            if (result.answerId) {
+                ASSERT_TRUE(rpc::isValidId(*result.answerId));
+            }
+        } else {
+            ASSERT_FALSE(result.message->kind == rpc::MessageKind::Request && !rpc::isValidId(result.message->id));
+        }
+    }
+}
