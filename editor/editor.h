@@ -140,6 +140,8 @@ public:
     void movieScrubberRequestThumbnailImageForTimestamp(zaf::ui::MovieScrubber *scrubber, double timestamp) override;
     void setThumbnailFromCacheWithTimeStamp(double timestamp);
     QSizeF getThumbnailSize() const;
+    // The thumbnail size for a display size at a screen scale (what getThumbnailSize computes).
+    static QSizeF thumbnailSizeForVideoSize(const QSizeF &videoSize, double scale);
 
     // --- Layout and rotation ---
     void applyPhoneUILayout();
@@ -158,6 +160,9 @@ public:
     // --- Share ---
     Q_INVOKABLE void shareAction();
     void displayShareSheetWithVideoURL(const QUrl &url);
+    // The share sheet's completion (main thread): the sheet is down, and a completed activity's
+    // type is recorded for the report.
+    void shareSheetDidCompleteWithActivityType(const QString &activityType, bool completed);
 
     // --- Data model: plain getters and setters, no side effects ---
     QUrl videoURL() const { return m_videoURL; }
