@@ -1,0 +1,210 @@
+// zaf-host: the command-line host. Starts the video editor extension on a movie, prints every report
+// of the activity types the user carried out as one compact JSON array line, removes the extension's
+// view after the first report and waits for the extension to exit.
+//
+//   zaf-host --movie PATH --app-name NAME --bundle-id ID [--attachment PATH] [--share-message TEXT]
+//            [--tint #RRGGBB[AA]] [--extension PATH]
+//
+// Exit status: 0 after a report and a normal exit of the extension; 1 when the extension could not
+// start, died, refused the request or ended without a report; 2 for bad arguments.
+
+#include "host/extension_session.h"
+#include "platform/log.h"
+
+#include <QCommandLineParser>
+#include <QCoreApplication>
+#include <QDir>
+#include <QFileInfo>
+#include <QJsonArray>
+#include <QJsonDocument>
+#include <QStandardPaths>
+#include <QTimer>
+
+#include <csignal>
+#include <cstdio>
+
+namespace {
+
+constexpr char kExtensionName[] = "zaf-video-editor-extension";
+// How long the extension may take to exit once its channel is closed without a report, and once
+// its view has been removed (it empties its temporary directory first).
+constexpr int kExitAfterCloseMs = 10000;
+constexpr int kExitAfterRemoveMs = 60000;
+
+void complain(const QString &message)
+{
+    std::fprintf(stderr, "zaf-host: %s\n", qPrintable(message));
+    std::fflush(stderr);
+}
+
+int usage(const QString &problem, const QCommandLineParser &parser)
+{
+    complain(problem);
+    std::fprintf(stderr, "%s", qPrintable(parser.helpText()));
+    return 2;
+}
+
+bool isExecutableFile(const QString &path)
+{
+    const QFileInfo info(path);
+    return info.isFile() && info.isExecutable();
+}
+
+// --extension, else $ZAF_EXTENSION_PATH, else the build's extension directory beside ours, else our
+// own directory, else PATH. Empty (with `error` set) when none of these names a program.
+QString findExtension(const QString &given, QString *error)
+{
+    if (!given.isEmpty()) {
+        if (isExecutableFile(given))
+            return QFileInfo(given).absoluteFilePath();
+        *error = QStringLiteral("the extension %1 is not an executable file").arg(given);
+        return {};
+    }
+    const QString fromEnvironment = qEnvironmentVariable("ZAF_EXTENSION_PATH");
+    if (!fromEnvironment.isEmpty()) {
+        if (isExecutableFile(fromEnvironment))
+            return QFileInfo(fromEnvironment).absoluteFilePath();
+        *error = QStringLiteral("ZAF_EXTENSION_PATH=%1 is not an executable file").arg(fromEnvironment);
+        return {};
+    }
+    const QDir ownDir(QCoreApplication::applicationDirPath());
+    for (const QString &candidate : {ownDir.filePath(QStringLiteral("../extension/") + QLatin1String(kExtensionName)),
+                                     ownDir.filePath(QLatin1String(kExtensionName))}) {
+        if (isExecutableFile(candidate))
+            return QFileInfo(candidate).canonicalFilePath();
+    }
+    const QString onPath = QStandardPaths::findExecutable(QLatin1String(kExtensionName));
+    if (!onPath.isEmpty())
+        return onPath;
+    *error = QStringLiteral("cannot find %1 (give --extension PATH or set ZAF_EXTENSION_PATH)").arg(QLatin1String(kExtensionName));
+    return {};
+}
+
+} // namespace
+
+int main(int argc, char **argv)
+{
+    // A closed stdout or a vanished extension must give a write error, not kill the host.
+    std::signal(SIGPIPE, SIG_IGN);
+    QCoreApplication app(argc, argv);
+    zaf::log::hideInformationalEntriesByDefault();
+
+    QCommandLineParser parser;
+    parser.setApplicationDescription(QStringLiteral("Opens the video editor extension on a recorded movie and prints the "
+                                                    "activity types the user carried out as a JSON array."));
+    parser.addHelpOption();
+    const QCommandLineOption movieOption(QStringLiteral("movie"), QStringLiteral("The recorded movie."), QStringLiteral("PATH"));
+    const QCommandLineOption appNameOption(QStringLiteral("app-name"), QStringLiteral("The recording application's display name."),
+                                           QStringLiteral("NAME"));
+    const QCommandLineOption bundleIdOption(QStringLiteral("bundle-id"), QStringLiteral("The recording application's identifier."),
+                                            QStringLiteral("ID"));
+    const QCommandLineOption attachmentOption(QStringLiteral("attachment"), QStringLiteral("An extra file to share with the movie."),
+                                              QStringLiteral("PATH"));
+    const QCommandLineOption shareMessageOption(QStringLiteral("share-message"), QStringLiteral("Text replacing the default share text."),
+                                                QStringLiteral("TEXT"));
+    const QCommandLineOption tintOption(QStringLiteral("tint"), QStringLiteral("Tint colour, #RRGGBB or #RRGGBBAA."), QStringLiteral("COLOR"));
+    const QCommandLineOption extensionOption(QStringLiteral("extension"), QStringLiteral("The extension program."), QStringLiteral("PATH"));
+    parser.addOptions({movieOption, appNameOption, bundleIdOption, attachmentOption, shareMessageOption, tintOption, extensionOption});
+
+    if (!parser.parse(app.arguments()))
+        return usage(parser.errorText(), parser);
+    if (parser.isSet(QStringLiteral("help"))) {
+        std::fprintf(stdout, "%s", qPrintable(parser.helpText()));
+        return 0;
+    }
+    if (!parser.positionalArguments().isEmpty())
+        return usage(QStringLiteral("unexpected argument: %1").arg(parser.positionalArguments().constFirst()), parser);
+    for (const QCommandLineOption *required : {&movieOption, &appNameOption, &bundleIdOption}) {
+        if (!parser.isSet(*required) || parser.value(*required).isEmpty())
+            return usage(QStringLiteral("--%1 is required").arg(required->names().constFirst()), parser);
+    }
+    for (const QCommandLineOption *single : {&movieOption, &appNameOption, &bundleIdOption, &attachmentOption, &shareMessageOption,
+                                             &tintOption, &extensionOption}) {
+        if (parser.values(*single).size() > 1)
+            return usage(QStringLiteral("--%1 is given more than once").arg(single->names().constFirst()), parser);
+    }
+
+    zaf::host::RecordingDetails details;
+    details.moviePath = QFileInfo(parser.value(movieOption)).absoluteFilePath();
+    details.appName = parser.value(appNameOption);
+    details.bundleIdentifier = parser.value(bundleIdOption);
+    if (!QFileInfo(details.moviePath).isFile())
+        return usage(QStringLiteral("the movie %1 is not a file").arg(parser.value(movieOption)), parser);
+    if (parser.isSet(attachmentOption)) {
+        const QString path = QFileInfo(parser.value(attachmentOption)).absoluteFilePath();
+        if (!QFileInfo(path).isFile())
+            return usage(QStringLiteral("the attachment %1 is not a file").arg(parser.value(attachmentOption)), parser);
+        details.fileAttachmentPath = path;
+    }
+    if (parser.isSet(shareMessageOption))
+        details.shareMessage = parser.value(shareMessageOption);
+    if (parser.isSet(tintOption))
+        details.tintColor = parser.value(tintOption);
+    QString problem;
+    const std::optional<QList<zaf::host::InputItem>> items = zaf::host::makeInputItems(details, &problem);
+    if (!items)
+        return usage(problem, parser);
+
+    const QString extension = findExtension(parser.value(extensionOption), &problem);
+    if (extension.isEmpty()) {
+        complain(problem);
+        return 1;
+    }
+
+    zaf::host::ExtensionSession session;
+    bool reported = false;
+    bool rejected = false;
+    QTimer exitDeadline;
+    exitDeadline.setSingleShot(true);
+    auto awaitExit = [&exitDeadline](int milliseconds) {
+        if (!exitDeadline.isActive())
+            exitDeadline.start(milliseconds);
+    };
+
+    QObject::connect(&session, &zaf::host::ExtensionSession::activityTypesReported, [&](const QStringList &types) {
+        const QByteArray line = QJsonDocument(QJsonArray::fromStringList(types)).toJson(QJsonDocument::Compact);
+        std::fprintf(stdout, "%s\n", line.constData());
+        std::fflush(stdout);
+        if (!reported) {
+            reported = true;
+            session.removeView();
+            awaitExit(kExitAfterRemoveMs);
+        }
+    });
+    QObject::connect(&session, &zaf::host::ExtensionSession::requestRejected, [&](const QString &message) {
+        complain(message);
+        rejected = true;
+        session.removeView();
+        awaitExit(kExitAfterRemoveMs);
+    });
+    QObject::connect(&session, &zaf::host::ExtensionSession::channelClosed, [&]() {
+        if (!reported)
+            awaitExit(kExitAfterCloseMs);
+    });
+    QObject::connect(&session, &zaf::host::ExtensionSession::finished, [&](int exitCode, bool crashed) {
+        exitDeadline.stop();
+        if (crashed) {
+            complain(exitCode > 128 ? QStringLiteral("the extension died (signal %1)").arg(exitCode - 128)
+                                    : QStringLiteral("the extension failed (exit status %1)").arg(exitCode));
+            app.exit(1);
+        } else if (!reported) {
+            if (!rejected)
+                complain(QStringLiteral("the extension ended without reporting what the user did"));
+            app.exit(1);
+        } else {
+            app.exit(0);
+        }
+    });
+    QObject::connect(&exitDeadline, &QTimer::timeout, [&]() {
+        complain(reported ? QStringLiteral("the extension did not exit after its view was removed; ending it")
+                          : QStringLiteral("the extension closed the channel without a report and did not exit; ending it"));
+        app.exit(1);
+    });
+
+    if (!session.start(extension, *items, &problem)) {
+        complain(problem);
+        return 1;
+    }
+    return app.exec();
+    // The session's destructor ends an extension still running (after a deadline) and reaps it.
+}
