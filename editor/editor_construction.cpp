@@ -19,6 +19,7 @@
 #include "platform/ui/view_animation.h"
 #include "tempstore/temp_store.h"
 
+#include <QFontMetrics>
 #include <QLabel>
 #include <QWidget>
 
@@ -187,7 +188,9 @@ QLabel *ZafVideoEditorViewController::makeTitleLabel()
     title->setAutoFillBackground(false);
     title->setAttribute(Qt::WA_TranslucentBackground);
     title->setStyleSheet(QStringLiteral("color: black; background: transparent;"));
-    title->setText(m_applicationName);
+    // A name wider than the title is shortened with an ellipsis (the whole name is in the tooltip).
+    title->setText(QFontMetrics(font).elidedText(m_applicationName, Qt::ElideRight, int(kTitleLabelWidth)));
+    title->setToolTip(m_applicationName);
     title->setAlignment(Qt::AlignHCenter | Qt::AlignVCenter);
 
     auto *date = new QLabel(title);

@@ -74,8 +74,13 @@ QList<double> ZafVideoEditorViewController::movieScrubberEvenlySpacedTimestampsS
 
 QSizeF ZafVideoEditorViewController::getThumbnailSize() const
 {
-    const double scale = Screen::mainScreenScale();
-    const QSizeF video = getVideoSize();
+    return thumbnailSizeForVideoSize(getVideoSize(), Screen::mainScreenScale());
+}
+
+QSizeF ZafVideoEditorViewController::thumbnailSizeForVideoSize(const QSizeF &video, double scale)
+{
+    // The ratio is taken in single precision, and the width rounded in single precision with ties to
+    // even; the scale enters the width twice and the height once.
     const float ratio = float(video.width() / video.height());
     const double height = scale * zaf::editor::kTimelineHeight;
     const float points = float(scale * zaf::editor::kTimelineHeight * double(ratio));
