@@ -30,6 +30,7 @@ struct Batch {
 
 struct ImageGenerator::Private {
     std::shared_ptr<MediaAsset> asset;
+    std::atomic<int> requestedTimes{0};
 
     mutable std::mutex settingsMutex;
     QSize maximumSize;
@@ -164,10 +165,16 @@ MediaTime ImageGenerator::requestedTimeToleranceAfter() const
     return d->toleranceAfter;
 }
 
+int ImageGenerator::requestedTimeCount() const
+{
+    return d->requestedTimes.load();
+}
+
 void ImageGenerator::generateImagesAsynchronouslyForTimes(const QList<MediaTime> &times, Handler handler)
 {
     if (times.isEmpty() || !handler)
         return;
+    d->requestedTimes += int(times.size());
     Batch batch;
     batch.times = times;
     batch.handler = std::move(handler);

@@ -79,6 +79,10 @@ public:
     // as usual); a decode in progress is interrupted. Later requests are served normally.
     void cancelAllImageGeneration();
 
+    // How many times have been asked for since the generator was made (any thread): what a
+    // caller's cache saved can be seen here.
+    int requestedTimeCount() const;
+
 private:
     explicit ImageGenerator(std::shared_ptr<MediaAsset> asset);
     void runQueue();

@@ -56,8 +56,9 @@ PhotoLibrary &PhotoLibrary::sharedPhotoLibrary()
     return library;
 }
 
-PhotoLibrary::PhotoLibrary(QString directory)
+PhotoLibrary::PhotoLibrary(QString directory, const FileManager &fileManager)
     : m_directory(std::move(directory))
+    , m_fileManager(fileManager)
 {
 }
 
@@ -96,7 +97,7 @@ OptionalError PhotoLibrary::createVideo(const QUrl &source)
     if (sourcePath.isEmpty() || !asset->load() || !asset->isPlayable())
         return libraryError(kPhotoLibraryErrorNotPlayable, QStringLiteral("%1 is not a playable movie").arg(sourcePath));
 
-    const FileManager &fm = FileManager::defaultManager();
+    const FileManager &fm = m_fileManager;
     if (OptionalError e = fm.createDirectoryAtPath(m_directory, true, 0755))
         return libraryError(kPhotoLibraryErrorLibraryUnavailable, e->message);
     const std::int64_t size = QFileInfo(sourcePath).size();

@@ -10,6 +10,7 @@
 // linked into place: never a partial file, never an overwrite. The source file is left untouched.
 
 #include "platform/error.h"
+#include "platform/files/file_manager.h"
 
 #include <QList>
 #include <QString>
@@ -48,7 +49,8 @@ public:
 
     // The process-wide library: $ZAF_VIDEO_LIBRARY when set (tests), else the XDG Videos directory.
     static PhotoLibrary &sharedPhotoLibrary();
-    explicit PhotoLibrary(QString directory);
+    // A library in a directory, on a file manager (tests use one that reports a chosen free size).
+    explicit PhotoLibrary(QString directory, const FileManager &fileManager = FileManager::defaultManager());
 
     QString libraryDirectory() const { return m_directory; }
     void performChanges(ChangeBlock changes, Completion completion);
@@ -61,6 +63,7 @@ public:
 private:
     OptionalError createVideo(const QUrl &source);
     QString m_directory;
+    const FileManager &m_fileManager;
     mutable std::mutex m_mutex;
     QList<QString> m_created;
 };

@@ -640,6 +640,7 @@ void MovieScrubber::setThumbnailImageForTimestamp(const QImage &image, double ti
                                                                          : QImage::Format_RGB32);
     d->dropBackdropIfCovered();
     update();
+    Q_EMIT thumbnailImageReceived(timestamp);
 }
 
 QList<double> MovieScrubber::thumbnailTimestamps() const { return d->layout.timestamps; }

@@ -151,6 +151,10 @@ protected:
     void focusInEvent(QFocusEvent *event) override;
     void focusOutEvent(QFocusEvent *event) override;
 
+Q_SIGNALS:
+    // Main thread: an image for a timestamp the scrubber asked for was accepted.
+    void thumbnailImageReceived(double timestamp);
+
 private:
     struct Private;
     Private *d;

@@ -11,18 +11,6 @@
 namespace zaf::test {
 namespace {
 
-// Records the editor's report.
-class RecordingDelegate : public QObject, public ZafVideoEditorViewControllerDelegate {
-    Q_OBJECT
-    Q_INTERFACES(ZafVideoEditorViewControllerDelegate)
-public:
-    QList<QStringList> reports;
-    void videoEditorDidFinishWithActivityTypes(ZafVideoEditorViewController *, const QStringList &types) override
-    {
-        reports << types;
-    }
-};
-
 class EditorKeyboardTest : public EditorTest {
 protected:
     void open()
@@ -107,4 +95,3 @@ TEST_F(EditorKeyboardTest, ArrowsStepThePlayheadAndEscapeFinishesWithTheReport)
 } // namespace
 } // namespace zaf::test
 
-#include "editor_keyboard_test.moc"

@@ -8,6 +8,7 @@
 #include "platform/media/player_item.h"
 #include "platform/ui/bar_button_item.h"
 #include "platform/ui/toolbar.h"
+#include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tempstore/temp_store.h"
 #include "tests/support/temp_dir.h"
@@ -20,6 +21,18 @@
 #include <memory>
 
 namespace zaf::test {
+
+// Records the editor's reports (main thread, or the thread the editor calls on).
+class RecordingDelegate : public QObject, public ZafVideoEditorViewControllerDelegate {
+    Q_OBJECT
+    Q_INTERFACES(ZafVideoEditorViewControllerDelegate)
+public:
+    QList<QStringList> reports;
+    void videoEditorDidFinishWithActivityTypes(ZafVideoEditorViewController *, const QStringList &types) override
+    {
+        reports << types;
+    }
+};
 
 // Points the process at a capability file with these answers (before the first editor: the
 // home-button answer is read once per process, and each test runs in a process of its own).

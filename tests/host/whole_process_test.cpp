@@ -22,24 +22,46 @@ QString readText(const QString &path)
     return file.open(QIODevice::ReadOnly) ? QString::fromUtf8(file.readAll()) : QString();
 }
 
-TEST(ZafHostWholeProcess, EscapeInTheEditorReportsNothingAndLeavesNoTrace)
+bool toolsMissing(QString *which)
 {
     for (const char *tool : {"xvfb-run", "Xvfb", "xdotool"}) {
-        if (QStandardPaths::findExecutable(QString::fromLatin1(tool)).isEmpty())
-            GTEST_SKIP() << tool << " is not installed; the whole-process run needs an X server and xdotool";
+        if (QStandardPaths::findExecutable(QString::fromLatin1(tool)).isEmpty()) {
+            *which = QString::fromLatin1(tool);
+            return true;
+        }
     }
-    ScratchDir scratch;
+    return false;
+}
+
+// Runs the whole-process script for a scenario; false (with a failure) when it did not run through.
+bool runScenario(const ScratchDir &scratch, const QString &scenario)
+{
     QProcess script;
     script.setProcessChannelMode(QProcess::ForwardedChannels);
     script.start(QStringLiteral("bash"), {QStringLiteral(ZAF_WHOLE_PROCESS_SCRIPT), QStringLiteral(ZAF_HOST_BIN),
-                                          QStringLiteral(ZAF_EXTENSION_BIN), QStringLiteral(ZAF_FIXTURE_BIN), scratch.path()});
-    ASSERT_TRUE(script.waitForStarted(10000));
+                                          QStringLiteral(ZAF_EXTENSION_BIN), QStringLiteral(ZAF_FIXTURE_BIN), scratch.path(),
+                                          scenario});
+    if (!script.waitForStarted(10000)) {
+        ADD_FAILURE() << "the whole-process script did not start";
+        return false;
+    }
     if (!script.waitForFinished(240000)) {
         script.kill();
         script.waitForFinished(5000);
-        FAIL() << "the whole-process script did not finish";
+        ADD_FAILURE() << "the whole-process script did not finish";
+        return false;
     }
-    ASSERT_EQ(script.exitCode(), 0);
+    EXPECT_EQ(script.exitCode(), 0);
+    return script.exitCode() == 0;
+}
+
+TEST(ZafHostWholeProcess, EscapeInTheEditorReportsNothingAndLeavesNoTrace)
+{
+    QString missing;
+    if (toolsMissing(&missing))
+        GTEST_SKIP() << missing.toStdString() << " is not installed; the whole-process run needs an X server and xdotool";
+    ScratchDir scratch;
+    ASSERT_TRUE(runScenario(scratch, QStringLiteral("cancel")));
 
     const QString result = readText(scratch.file(QStringLiteral("result"))).trimmed();
     const QString hostErr = readText(scratch.file(QStringLiteral("host.err")));
@@ -58,6 +80,37 @@ TEST(ZafHostWholeProcess, EscapeInTheEditorReportsNothingAndLeavesNoTrace)
     ASSERT_TRUE(temp.exists());
     EXPECT_TRUE(temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot).isEmpty())
         << temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::NoDotAndDotDot).join(u' ').toStdString();
+}
+
+TEST(ZafHostWholeProcess, KeyboardTrimThenSavePutsTheTrimmedMixedMovieInTheLibrary)
+{
+    QString missing;
+    if (toolsMissing(&missing))
+        GTEST_SKIP() << missing.toStdString() << " is not installed; the whole-process run needs an X server and xdotool";
+    ScratchDir scratch;
+    ASSERT_TRUE(runScenario(scratch, QStringLiteral("trim-save")));
+    const QString hostErr = readText(scratch.file(QStringLiteral("host.err")));
+    ASSERT_EQ(readText(scratch.file(QStringLiteral("result"))).trimmed(), QStringLiteral("ok")) << hostErr.toStdString();
+    EXPECT_EQ(readText(scratch.file(QStringLiteral("host.status"))).trimmed(), QStringLiteral("0")) << hostErr.toStdString();
+    EXPECT_EQ(readText(scratch.file(QStringLiteral("host.out"))),
+              QStringLiteral("[\"com.zafrel.activity.SaveToPhotoLibrary\",\"com.zafrel.activity.SaveToPhotoLibrary\"]\n"));
+
+    // The library holds one movie: the range 1 s to 2.5 s, its two audio tracks mixed into one.
+    const QDir library(scratch.file(QStringLiteral("Videos")));
+    const QStringList saved = library.entryList(QDir::Files | QDir::NoDotAndDotDot);
+    ASSERT_EQ(saved.size(), 1);
+    QProcess probe;
+    probe.start(QStringLiteral("ffprobe"), {QStringLiteral("-v"), QStringLiteral("error"), QStringLiteral("-show_entries"),
+                                            QStringLiteral("stream=codec_type:format=duration"), QStringLiteral("-of"),
+                                            QStringLiteral("csv=p=0"), library.filePath(saved.first())});
+    ASSERT_TRUE(probe.waitForFinished(30000));
+    const QStringList lines = QString::fromUtf8(probe.readAllStandardOutput()).split(u'\n', Qt::SkipEmptyParts);
+    EXPECT_EQ(lines.count(QStringLiteral("audio")), 1);
+    EXPECT_EQ(lines.count(QStringLiteral("video")), 1);
+    EXPECT_NEAR(lines.last().toDouble(), 1.5, 0.1);
+
+    const QDir temp(scratch.file(QStringLiteral("temp")));
+    EXPECT_TRUE(temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot).isEmpty());
 }
 
 } // namespace
