@@ -9,6 +9,7 @@
 #include "platform/ui/bar_button_item.h"
 #include "platform/ui/toolbar.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/process_temp_directory.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tempstore/temp_store.h"
 #include "tests/support/temp_dir.h"
@@ -73,14 +74,7 @@ class EditorTest : public ::testing::Test {
 protected:
     void SetUp() override
     {
-        // The temporary directory is resolved once per process: one for the whole program.
-        static QTemporaryDir root;
-        static const bool prepared = [] {
-            qputenv("ZAF_TEMP_DIRECTORY", QFile::encodeName(root.path() + QStringLiteral("/Zafrel")));
-            ZafTempStore::defaultStore().prepareAtProcessStart();
-            return true;
-        }();
-        (void)prepared;
+        usePrivateTempDirectoryForProcess();
     }
 
     // A movie of the given shape in the scratch directory.

@@ -9,6 +9,7 @@
 #include "platform/extensionkit/frame_codec.h"
 #include "tempstore/temp_store.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/process_temp_directory.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/temp_dir.h"
 
@@ -106,13 +107,7 @@ class ExtensionTest : public ::testing::Test {
 protected:
     void SetUp() override
     {
-        static QTemporaryDir root;
-        static const bool prepared = [] {
-            qputenv("ZAF_TEMP_DIRECTORY", QFile::encodeName(root.path() + QStringLiteral("/Zafrel")));
-            ZafTempStore::defaultStore().prepareAtProcessStart();
-            return true;
-        }();
-        (void)prepared;
+        usePrivateTempDirectoryForProcess();
         fixture::FixtureSpec spec;
         spec.seconds = 1;
         moviePath = makeFixtureMovie(scratch.path(), spec);

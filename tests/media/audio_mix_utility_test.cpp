@@ -4,6 +4,7 @@
 #include "platform/media/export_session.h"
 #include "tempstore/temp_store.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/process_temp_directory.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/temp_dir.h"
 
@@ -21,14 +22,7 @@ namespace {
 // The whole program shares one temporary directory, as the editor's process does.
 class TempDirectoryEnvironment : public ::testing::Environment {
 public:
-    void SetUp() override
-    {
-        qputenv("ZAF_TEMP_DIRECTORY", QFile::encodeName(m_root.path() + QStringLiteral("/Zafrel")));
-        ZafTempStore::defaultStore().prepareAtProcessStart();
-    }
-
-private:
-    QTemporaryDir m_root;
+    void SetUp() override { usePrivateTempDirectoryForProcess(); }
 };
 const auto *const g_environment = ::testing::AddGlobalTestEnvironment(new TempDirectoryEnvironment);
 

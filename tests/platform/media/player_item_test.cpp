@@ -1,6 +1,7 @@
 // PlayerItem loading (ready with the file's duration, or failed with an error for bad files) and
 // the PlaybackClock arithmetic the Player builds on.
 #include "platform/media/player.h"
+#include "tests/platform/media/player_test_support.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/temp_dir.h"
@@ -17,17 +18,10 @@
 namespace zaf::media {
 namespace {
 
-bool runUntil(const std::function<bool()> &done, int boundMs = 15000)
-{
-    for (int waited = 0; !done(); waited += 10) {
-        if (waited >= boundMs)
-            return false;
-        QEventLoop loop;
-        QTimer::singleShot(10, &loop, &QEventLoop::quit);
-        loop.exec();
-    }
-    return true;
-}
+using test::readyPlayerOn;
+using test::runUntil;
+using test::seconds;
+
 
 std::shared_ptr<PlayerItem> itemFor(const QString &path)
 {

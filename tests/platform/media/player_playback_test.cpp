@@ -1,6 +1,7 @@
 // Playback on a stepped clock: boundary observers, periodic observers, the end of the item, and
 // tearing a Player down while its threads run.
 #include "platform/media/player.h"
+#include "tests/platform/media/player_test_support.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/temp_dir.h"
 
@@ -15,24 +16,11 @@
 namespace zaf::media {
 namespace {
 
-// Runs the event loop until `done` holds or the bound passes (waits for loading and decoding, not
-// for playback: playback time only moves when a test advances its clock).
-bool runUntil(const std::function<bool()> &done, int boundMs = 15000)
-{
-    for (int waited = 0; !done(); waited += 10) {
-        if (waited >= boundMs)
-            return false;
-        QEventLoop loop;
-        QTimer::singleShot(10, &loop, &QEventLoop::quit);
-        loop.exec();
-    }
-    return true;
-}
+using test::readyPlayerOn;
+using test::runUntil;
+using test::seconds;
 
-MediaTime seconds(double s)
-{
-    return MediaTime::fromSeconds(s, 1000000000);
-}
+
 
 class PlayerPlaybackTest : public ::testing::Test {
 protected:
@@ -58,15 +46,7 @@ protected:
     }
 
     // A Player of `path` on a manual clock, with its item ready.
-    std::unique_ptr<Player> readyPlayer(const QString &path)
-    {
-        auto item = std::make_shared<PlayerItem>(MediaAsset::assetWithURL(QUrl::fromLocalFile(path)));
-        auto player = std::make_unique<Player>(item);
-        player->setTimeSource(m_clock);
-        EXPECT_TRUE(runUntil([&] { return item->status() != PlayerItem::Status::Unknown; }));
-        EXPECT_EQ(item->status(), PlayerItem::Status::ReadyToPlay);
-        return player;
-    }
+    std::unique_ptr<Player> readyPlayer(const QString &path) { return readyPlayerOn(path, m_clock); }
 
     std::shared_ptr<ManualTimeSource> m_clock = std::make_shared<ManualTimeSource>(100.0);
     static zaf::test::ScratchDir *s_dir;

@@ -1,6 +1,7 @@
 // Pictures from the decoding thread: exact seeks, coalesced seeks, and pictures during playback,
 // checked against the frame numbers the fixture movie draws into every picture.
 #include "platform/media/player.h"
+#include "tests/platform/media/player_test_support.h"
 #include "platform/media/player_layer.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/temp_dir.h"
@@ -16,22 +17,11 @@
 namespace zaf::media {
 namespace {
 
-bool runUntil(const std::function<bool()> &done, int boundMs = 15000)
-{
-    for (int waited = 0; !done(); waited += 10) {
-        if (waited >= boundMs)
-            return false;
-        QEventLoop loop;
-        QTimer::singleShot(10, &loop, &QEventLoop::quit);
-        loop.exec();
-    }
-    return true;
-}
+using test::readyPlayerOn;
+using test::runUntil;
+using test::seconds;
 
-MediaTime seconds(double s)
-{
-    return MediaTime::fromSeconds(s, 1000000000);
-}
+
 
 class PlayerSeekTest : public ::testing::Test {
 protected:
@@ -54,15 +44,7 @@ protected:
         delete s_dir;
     }
 
-    std::unique_ptr<Player> readyPlayer(const QString &path)
-    {
-        auto item = std::make_shared<PlayerItem>(MediaAsset::assetWithURL(QUrl::fromLocalFile(path)));
-        auto player = std::make_unique<Player>(item);
-        player->setTimeSource(m_clock);
-        EXPECT_TRUE(runUntil([&] { return item->status() != PlayerItem::Status::Unknown; }));
-        EXPECT_EQ(item->status(), PlayerItem::Status::ReadyToPlay);
-        return player;
-    }
+    std::unique_ptr<Player> readyPlayer(const QString &path) { return readyPlayerOn(path, m_clock); }
 
     static int shownNumber(const Player &player) { return zaf::test::readFrameNumber(player.currentVideoFrame()); }
 
