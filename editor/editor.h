@@ -42,6 +42,7 @@
 
 class QLabel;
 class QWidget;
+class ZafStoreInfo;
 class ZafVideoOverlayButton;
 
 namespace zaf::media {
@@ -163,6 +164,14 @@ public:
     // The share sheet's completion (main thread): the sheet is down, and a completed activity's
     // type is recorded for the report.
     void shareSheetDidCompleteWithActivityType(const QString &activityType, bool completed);
+    // The items shared for a store record: the override message, or the share text and the store
+    // link; then the movie; then the host's attachment.
+    QVariantList shareItemsForStoreInfo(const ZafStoreInfo &info, const QUrl &movieURL) const;
+    // The share text: the localized format with the name and the author, or the name alone.
+    static QString shareTextForStoreInfo(const ZafStoreInfo &info);
+    // Whether the editor's own publishing action is offered: the video service's own share
+    // extension is not installed and the publishing plug-in is there.
+    static bool offersPublishingActivity();
 
     // --- Data model: plain getters and setters, no side effects ---
     QUrl videoURL() const { return m_videoURL; }
@@ -250,6 +259,7 @@ private:
     void applyLayoutChoice();
     void setToolbarItems(zaf::ui::Toolbar *toolbar, const QList<zaf::ui::BarButtonItem *> &items);
     void finishWithDelegate();
+    void presentShareSheet(const QVariantList &items, const QUrl &movieURL);
     void installKeyboardShortcuts();
     void setTrimPointAtPlayhead(bool start);
 
