@@ -12,6 +12,7 @@
 #include "platform/ui/share_activity.h"
 #include "platform/ui/share_sheet.h"
 #include "platform/ui/toolbar.h"
+#include "publishing/plugin_loader.h"
 #include "publishing/youtube_activity.h"
 
 #include <QFileInfo>
@@ -23,13 +24,6 @@ namespace {
 // The video service's own share extension: when it is installed and enabled, the editor does not
 // offer its own publishing action.
 constexpr const char *kVideoServiceShareExtensionIdentifier = "youtube-share-extension";
-
-// The publishing plug-in, whose presence means the video service can be reached.
-QString publishingPluginPath()
-{
-    const QString overridden = qEnvironmentVariable("ZAF_PUBLISHING_PLUGIN_PATH");
-    return overridden.isEmpty() ? QStringLiteral(ZAF_PUBLISHING_PLUGIN_FILE) : overridden;
-}
 
 } // namespace
 
@@ -95,7 +89,8 @@ bool ZafVideoEditorViewController::offersPublishingActivity()
 {
     const bool serviceExtensionInstalled = static_cast<bool>(
         zaf::extensionkit::ExtensionRegistry::extensionWithIdentifier(QLatin1String(kVideoServiceShareExtensionIdentifier)));
-    return !serviceExtensionInstalled && QFileInfo::exists(publishingPluginPath());
+    // The publishing plug-in's presence means the video service can be reached.
+    return !serviceExtensionInstalled && QFileInfo::exists(zaf::publishing::defaultPublishingPluginPath());
 }
 
 void ZafVideoEditorViewController::presentShareSheet(const QVariantList &items, const QUrl &)

@@ -77,6 +77,7 @@ TEST_F(EditorShareTest, ItemsFollowTheOverrideMessageOrTheStoreRecord)
 
 TEST_F(EditorShareTest, PublishingIsOfferedOnlyWithThePluginAndWithoutTheServicesOwnExtension)
 {
+    qputenv("ZAF_PUBLISHING_PLUGIN_PATH", QFile::encodeName(scratch.file(QStringLiteral("no-plugin.so"))));
     EXPECT_FALSE(ZafVideoEditorViewController::offersPublishingActivity()) << "no plug-in";
     installPlugin();
     EXPECT_TRUE(ZafVideoEditorViewController::offersPublishingActivity());
@@ -111,6 +112,7 @@ TEST_F(EditorShareTest, SheetPutsPublishingThirdExcludesCopyAndCancelRecordsNoth
 
 TEST_F(EditorShareTest, PadLayoutInIntroModeLeavesPlayOutAndSheetWithoutPluginHasNoOrder)
 {
+    qputenv("ZAF_PUBLISHING_PLUGIN_PATH", QFile::encodeName(scratch.file(QStringLiteral("no-plugin.so"))));
     auto e = makeEditor(movie(1), QRectF(0, 0, 900, 500));
     ASSERT_TRUE(e->isPadMode());
     e->shareAction();

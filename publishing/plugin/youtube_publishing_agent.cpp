@@ -1,0 +1,229 @@
+#include "publishing/plugin/youtube_publishing_agent.h"
+
+#include "platform/log.h"
+#include "platform/ui/bar_button_item.h"
+#include "platform/ui/toolbar.h"
+#include "publishing/plugin/youtube_publishing_form.h"
+
+#include <QDesktopServices>
+#include <QHostAddress>
+#include <QNetworkAccessManager>
+#include <QOAuth2AuthorizationCodeFlow>
+#include <QOAuthHttpServerReplyHandler>
+#include <QPushButton>
+#include <QVBoxLayout>
+
+namespace {
+
+Q_LOGGING_CATEGORY(lcPublishingAgent, "zaf.publishing.agent")
+
+constexpr const char *kAgentErrorDomain = "zaf.publishing.agent";
+enum AgentErrorCode { NoClientIdError = 1, AuthorizationError = 2, NoMediaError = 3 };
+
+constexpr const char *kDefaultApiBase = "https://www.googleapis.com";
+constexpr const char *kAuthorizationUrl = "https://accounts.google.com/o/oauth2/auth";
+constexpr const char *kTokenUrl = "https://oauth2.googleapis.com/token";
+constexpr const char *kUploadScope = "https://www.googleapis.com/auth/youtube.upload";
+
+QString environment(const char *name)
+{
+    return qEnvironmentVariable(name).trimmed();
+}
+
+} // namespace
+
+ZafYouTubeNavigationController::ZafYouTubeNavigationController(QObject *parent) : zaf::ui::ViewController(parent) {}
+
+void ZafYouTubeNavigationController::setToolbarItems(const QList<zaf::ui::BarButtonItem *> &items)
+{
+    m_items = items;
+    if (m_toolbar)
+        m_toolbar->setItems(m_items);
+}
+
+void ZafYouTubeNavigationController::loadView()
+{
+    auto *view = new QWidget;
+    auto *layout = new QVBoxLayout(view);
+    layout->setContentsMargins(0, 0, 0, 0);
+    layout->setSpacing(0);
+    m_toolbar = new zaf::ui::Toolbar(view);
+    m_toolbar->setFixedHeight(44);
+    m_toolbar->setItems(m_items);
+    layout->addWidget(m_toolbar);
+    const QList<zaf::ui::ViewController *> children = childViewControllers();
+    if (!children.isEmpty())
+        layout->addWidget(children.first()->view(), 1);
+    setView(view);
+}
+
+void ZafYouTubeNavigationController::viewWillAppear(bool animated)
+{
+    zaf::ui::ViewController::viewWillAppear(animated);
+    if (m_willAppear)
+        m_willAppear();
+}
+
+ZafYouTubePublishingAgent::ZafYouTubePublishingAgent(QObject *parent)
+    : ZafPublishingAgent(parent),
+      m_navigation(new ZafYouTubeNavigationController(this)),
+      m_form(new ZafYouTubePublishingForm(this)),
+      m_network(new QNetworkAccessManager(this))
+{
+    m_navigation->addChildViewController(m_form);
+    m_navigation->didMoveToParentViewController(m_navigation);
+
+    auto *publishButton = new QPushButton(tr("Publish"));
+    connect(publishButton, &QPushButton::clicked, this, &ZafYouTubePublishingAgent::publishAction);
+    m_publishItem = new zaf::ui::BarButtonItem(publishButton, m_navigation);
+    m_navigation->setToolbarItems({
+        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::Cancel, this, "cancelAction", m_navigation),
+        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::FlexibleSpace, nullptr, {}, m_navigation),
+        m_publishItem,
+        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::Done, this, "doneAction", m_navigation),
+    });
+    m_navigation->setWillAppearHandler([this] {
+        if (m_delegate)
+            m_delegate->publishingAgentWillBeDisplayed(this);
+    });
+}
+
+ZafYouTubePublishingAgent::~ZafYouTubePublishingAgent()
+{
+    // The navigation view holds the form's view; let the form's controller go first so each view is
+    // deleted once.
+    if (m_upload)
+        m_upload->disconnect(this);
+    m_form->removeFromParentViewController();
+    delete m_form;
+    delete m_navigation;
+}
+
+zaf::ui::ViewController *ZafYouTubePublishingAgent::navigationController()
+{
+    return m_navigation;
+}
+
+void ZafYouTubePublishingAgent::cancelAction()
+{
+    if (m_upload && m_upload->isRunning())
+        m_upload->cancel();
+    if (m_delegate)
+        m_delegate->publishingAgentCancelButtonClicked(this);
+}
+
+void ZafYouTubePublishingAgent::doneAction()
+{
+    m_form->endEditing();
+    if (m_delegate)
+        m_delegate->publishingAgentDoneButtonClicked(this);
+}
+
+void ZafYouTubePublishingAgent::publishAction()
+{
+    if (m_publishing)
+        return;
+    m_publishing = true;
+    m_mediaURL.clear();
+    m_publishItem->setEnabled(false);
+    m_form->endEditing();
+    if (m_delegate)
+        m_delegate->publishingAgentDidBeginPublishing(this);
+
+    if (m_mediaPath.isEmpty()) {
+        finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), NoMediaError,
+                                    QStringLiteral("There is no movie to publish.")});
+        return;
+    }
+    const QString token = environment("ZAF_YOUTUBE_ACCESS_TOKEN");
+    if (!token.isEmpty())
+        startUpload(token);
+    else
+        authorizeAndUpload();
+}
+
+void ZafYouTubePublishingAgent::authorizeAndUpload()
+{
+    const QString clientId = environment("ZAF_YOUTUBE_CLIENT_ID");
+    if (clientId.isEmpty()) {
+        finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), NoClientIdError,
+                                    QStringLiteral("Publishing to YouTube needs an OAuth client id in "
+                                                   "ZAF_YOUTUBE_CLIENT_ID.")});
+        return;
+    }
+    if (m_oauth && !m_oauth->token().isEmpty()) {
+        startUpload(m_oauth->token());
+        return;
+    }
+    if (!m_oauth) {
+        m_oauth = new QOAuth2AuthorizationCodeFlow(clientId, QUrl(QString::fromLatin1(kAuthorizationUrl)),
+                                                   QUrl(QString::fromLatin1(kTokenUrl)), m_network, this);
+        m_oauth->setScope(QString::fromLatin1(kUploadScope));
+        const QString secret = environment("ZAF_YOUTUBE_CLIENT_SECRET");
+        if (!secret.isEmpty())
+            m_oauth->setClientIdentifierSharedKey(secret);
+        auto *replyHandler = new QOAuthHttpServerReplyHandler(QHostAddress(QHostAddress::LocalHost), 0, m_oauth);
+        m_oauth->setReplyHandler(replyHandler);
+        connect(m_oauth, &QOAuth2AuthorizationCodeFlow::authorizeWithBrowser, this, [](const QUrl &url) {
+            if (!QDesktopServices::openUrl(url))
+                zaf::log::error(lcPublishingAgent(), QStringLiteral("Could not open the browser for authorization"));
+        });
+        connect(m_oauth, &QOAuth2AuthorizationCodeFlow::granted, this, [this] {
+            if (m_publishing && !(m_upload && m_upload->isRunning()))
+                startUpload(m_oauth->token());
+        });
+        connect(m_oauth, &QOAuth2AuthorizationCodeFlow::error, this,
+                [this](const QString &error, const QString &description, const QUrl &) {
+                    if (!m_publishing || (m_upload && m_upload->isRunning()))
+                        return;
+                    finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), AuthorizationError,
+                                                QStringLiteral("Authorization failed: %1 %2").arg(error, description)});
+                });
+        if (!replyHandler->isListening()) {
+            finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), AuthorizationError,
+                                        QStringLiteral("Could not listen on 127.0.0.1 for the authorization reply.")});
+            return;
+        }
+    }
+    m_oauth->grant();
+}
+
+void ZafYouTubePublishingAgent::startUpload(const QString &accessToken)
+{
+    if (!m_upload) {
+        m_upload = new zaf::publishing::ResumableUpload(m_network, this);
+        connect(m_upload, &zaf::publishing::ResumableUpload::progress, this, &ZafPublishingAgent::uploadProgress);
+        connect(m_upload, &zaf::publishing::ResumableUpload::finished, this,
+                [this](const zaf::publishing::UploadResult &result) {
+                    if (result.ok())
+                        m_mediaURL = result.watchUrl.toString();
+                    finishPublishing(result.error);
+                });
+    }
+    const QString base = environment("ZAF_YOUTUBE_API_BASE");
+    zaf::publishing::VideoMetadata metadata;
+    metadata.title = m_form->title();
+    metadata.description = m_form->description();
+    metadata.categoryId = m_form->categoryId();
+    metadata.privacyStatus = m_form->privacyStatus();
+
+    m_upload->setBaseUrl(QUrl(base.isEmpty() ? QString::fromLatin1(kDefaultApiBase) : base));
+    m_upload->setAccessToken(accessToken);
+    m_upload->setFilePath(m_mediaPath);
+    m_upload->setMetadata(metadata);
+    m_upload->setChunkSize(m_chunkSize);
+    zaf::log::info(lcPublishingAgent(), QStringLiteral("Publishing %1 in category %2").arg(m_mediaPath, metadata.categoryId));
+    m_upload->start();
+}
+
+void ZafYouTubePublishingAgent::finishPublishing(const zaf::OptionalError &error)
+{
+    if (!m_publishing)
+        return;
+    m_publishing = false;
+    m_publishItem->setEnabled(true);
+    if (error)
+        zaf::log::error(lcPublishingAgent(), QStringLiteral("Publishing failed: %1").arg(error->description()));
+    if (m_delegate)
+        m_delegate->publishingAgentDidEndPublishingError(this, error);
+}

@@ -1,0 +1,35 @@
+#pragma once
+
+// Loading the publishing plug-in and finding its agent class.
+//
+// The plug-in is loaded once per path and kept loaded for the life of the process; an agent class
+// found by name is cached process-wide, so later look-ups cost a hash probe. A plug-in that does not
+// implement ZafPublishingPluginInterface or reports another API version than
+// kZafPublishingPluginApiVersion is refused, with the reason logged and returned.
+// Main thread only.
+
+#include "publishing/publishing_agent.h"
+
+#include <QString>
+
+namespace zaf::publishing {
+
+template <typename T>
+struct PluginLookup {
+    T *value = nullptr;
+    // Why the look-up failed; empty on success.
+    QString errorText;
+
+    bool ok() const { return value != nullptr; }
+};
+
+// The plug-in instance of the library at `path`.
+PluginLookup<ZafPublishingPluginInterface> loadPublishingPlugin(const QString &path);
+// The meta-object of the agent class `className` of the plug-in at `path` (make an agent with
+// newInstance()).
+PluginLookup<const QMetaObject> publishingAgentClass(const QString &path, const QString &className);
+// The plug-in's usual place: <directory of the executable>/publishing/plugin/<kZafPublishingPluginFileName>
+// unless $ZAF_PUBLISHING_PLUGIN names another file.
+QString defaultPublishingPluginPath();
+
+} // namespace zaf::publishing
