@@ -1,20 +1,30 @@
 #include "publishing/youtube_activity.h"
 
+#include "identity/framework_strings.h"
 #include "media/audio_mix_utility.h"
 #include "platform/capability/capability_service.h"
 #include "platform/log.h"
 #include "platform/media/export_session.h"
 #include "platform/media/media_asset.h"
+#include "platform/text/object_format.h"
+#include "platform/ui/view_controller.h"
+#include "publishing/plugin_loader.h"
 #include "platform/ui/screen.h"
 #include "tempstore/temp_directory.h"
 #include "tempstore/temp_store.h"
 
+#include <QAbstractButton>
+#include <QPushButton>
+#include <QCoreApplication>
 #include <QDateTime>
+#include <QDesktopServices>
+#include <QMessageBox>
 #include <QFile>
 #include <QMetaType>
 #include <QPainter>
 #include <QPixmap>
 #include <QSvgRenderer>
+#include <QVariantMap>
 #include <QtMath>
 
 #include <mutex>
@@ -61,6 +71,66 @@ QImage renderAtScreenScale(QSvgRenderer &renderer, const QSizeF &points)
     image.setDevicePixelRatio(scale);
     return image;
 }
+// The category the form pre-selects.
+const QString &defaultCategoryId()
+{
+    static const QString id = QStringLiteral("20");
+    return id;
+}
+
+// The key's text from the string tables, or the key itself when the tables are missing.
+QString localized(const char *key)
+{
+    const QString name = QLatin1String(key);
+    return ZafLocalizedFrameworkString(name).value_or(name);
+}
+
+// The process-wide slot of the agent class. The first use loads the plug-in and looks the class up;
+// the plug-in stays loaded and the class stays stored for the life of the process. Either failure
+// stops the process: without the plug-in there is nothing to publish with.
+struct AgentClassSlot {
+    ZafPublishingPluginInterface *plugin = nullptr;
+    const QMetaObject *agentClass = nullptr;
+};
+
+const AgentClassSlot &agentClassSlot()
+{
+    static AgentClassSlot slot;
+    if (slot.agentClass)
+        return slot;
+    const QString path = zaf::publishing::defaultPublishingPluginPath();
+    const auto plugin = zaf::publishing::loadPublishingPlugin(path);
+    if (!plugin.ok())
+        qFatal("%s", qPrintable(plugin.errorText));
+    const auto agentClass = zaf::publishing::publishingAgentClass(path, QLatin1String(kZafYouTubePublishingAgentClassName));
+    if (!agentClass.ok())
+        qFatal("Unable to find class %s", kZafYouTubePublishingAgentClassName);
+    slot.plugin = plugin.value;
+    slot.agentClass = agentClass.value;
+    return slot;
+}
+
+QObject *invokeForObject(QObject *target, const char *method)
+{
+    QObject *result = nullptr;
+    if (!target || !QMetaObject::invokeMethod(target, method, Q_RETURN_ARG(QObject *, result)))
+        return nullptr;
+    return result;
+}
+
+bool exportHasEnded(zaf::media::ExportStatus status)
+{
+    return status == zaf::media::ExportStatus::Completed || status == zaf::media::ExportStatus::Failed
+        || status == zaf::media::ExportStatus::Cancelled;
+}
+
+// What a failed or cancelled export reports, with a stand-in when the session gives no error.
+zaf::Error exportFailure(const zaf::media::ExportSession &session)
+{
+    if (const zaf::OptionalError error = session.error())
+        return *error;
+    return zaf::Error{QStringLiteral("zaf.media"), -5812, QStringLiteral("The movie could not be copied for publishing.")};
+}
 } // namespace
 
 // The images live in a static library, so the resource is registered by hand before the first
@@ -75,7 +145,13 @@ ZafYouTubeActivity::ZafYouTubeActivity(QObject *parent)
 {
 }
 
-ZafYouTubeActivity::~ZafYouTubeActivity() = default;
+ZafYouTubeActivity::~ZafYouTubeActivity()
+{
+    if (m_publishingAgent) {
+        m_publishingAgent->setDelegate(nullptr);
+        QObject::disconnect(m_progressConnection);
+    }
+}
 
 QString ZafYouTubeActivity::activityType() const
 {
@@ -208,8 +284,18 @@ void ZafYouTubeActivity::prepareWithActivityItems(const QVariantList &activityIt
         } else {
             // The session keeps itself alive until its completion has run; the completion must not
             // keep it alive beyond that, so it looks at the session through a weak reference.
+            // The end of the export also hops to the main thread, where a press of Publish may be
+            // waiting for the copy; the session's address tells a stale export from the current one.
             const std::weak_ptr<zaf::media::ExportSession> weakSession = m_exportSession;
-            m_exportSession->exportAsynchronously([weakSession] {
+            const zaf::media::ExportSession *sessionAddress = m_exportSession.get();
+            const QPointer<ZafYouTubeActivity> self(this);
+            m_exportSession->exportAsynchronously([weakSession, sessionAddress, self] {
+                if (QCoreApplication *app = QCoreApplication::instance()) {
+                    QMetaObject::invokeMethod(app, [self, sessionAddress] {
+                        if (self)
+                            self->exportDidEnd(sessionAddress);
+                    }, Qt::QueuedConnection);
+                }
                 const std::shared_ptr<zaf::media::ExportSession> session = weakSession.lock();
                 if (!session)
                     return;
@@ -223,4 +309,223 @@ void ZafYouTubeActivity::prepareWithActivityItems(const QVariantList &activityIt
     }
 
     m_descriptionText = descriptionForItems(activityItems);
+}
+
+zaf::ui::ViewController *ZafYouTubeActivity::activityViewController()
+{
+    const AgentClassSlot &slot = agentClassSlot();
+
+    if (m_publishingAgent) {
+        m_publishingAgent->setDelegate(nullptr);
+        QObject::disconnect(m_progressConnection);
+    }
+    QObject *instance = slot.agentClass->newInstance();
+    auto *agent = qobject_cast<ZafPublishingAgent *>(instance);
+    if (!agent) {
+        delete instance;
+        qFatal("Unable to find class %s", kZafYouTubePublishingAgentClassName);
+    }
+    m_publishingAgent.reset(agent);
+    agent->setDelegate(this);
+    agent->setMediaPath(m_movieURL.toLocalFile());
+    m_progressConnection = connect(agent, &ZafPublishingAgent::uploadProgress, this, [this](qint64 sent, qint64 total) {
+        if (m_progressOverlay)
+            m_progressOverlay->setProgress(total > 0 ? double(sent) / double(total) : -1.0);
+    });
+
+    zaf::ui::ViewController *navigation = agent->navigationController();
+    const QList<zaf::ui::ViewController *> children = navigation->childViewControllers();
+    zaf::ui::ViewController *form = children.isEmpty() ? nullptr : children.first();
+
+    // Every form of the process picks its category with our routine from now on. It is installed
+    // before the form's view loads, because the form runs the routine as its view loads.
+    slot.plugin->setFormDefaultCategoryRoutine(&ZafYouTubeActivity::selectDefaultCategoryOfForm);
+
+    if (form) {
+        form->view();
+        QObject *table = form->property("_table").value<QObject *>();
+        QObject *cell = nullptr;
+        if (table)
+            QMetaObject::invokeMethod(table, "cellForRowInSection", Q_RETURN_ARG(QObject *, cell), Q_ARG(int, 1), Q_ARG(int, 0));
+        if (cell) {
+            QMetaObject::invokeMethod(cell, "setValue", Q_ARG(QString, m_descriptionText));
+            QMetaObject::invokeMethod(cell, "setPlaceholderText", Q_ARG(QString, QString()));
+        }
+    }
+
+    // Route Publish through the activity: the one button of the navigation view whose click goes to
+    // the agent. Without it the agent publishes on its own and nothing waits for the copy.
+    m_publishButton.clear();
+    m_waitingForExport = false;
+    const QList<QAbstractButton *> buttons = navigation->view()->findChildren<QAbstractButton *>();
+    for (QAbstractButton *button : buttons) {
+        if (QObject::disconnect(button, &QAbstractButton::clicked, agent, nullptr)) {
+            m_publishButton = button;
+            connect(button, &QAbstractButton::clicked, this, &ZafYouTubeActivity::publishRequested);
+            break;
+        }
+    }
+    return navigation;
+}
+
+void ZafYouTubeActivity::selectDefaultCategoryOfForm(QObject *form)
+{
+    if (!form)
+        return;
+    const QVariantList categories = form->property("_categories").toList();
+    QObject *picker = form->property("_picker").value<QObject *>();
+    if (categories.isEmpty())
+        return;
+    for (int row = 0; row < categories.size(); ++row) {
+        const QVariantMap entry = categories.at(row).toMap();
+        const QString categoryId = entry.value(QLatin1String(kZafPublishingCategoryIdKey)).toString();
+        if (categoryId.toLower() != defaultCategoryId())
+            continue;
+        const QString label = entry.value(QLatin1String(kZafPublishingCategoryLabelKey)).toString();
+        if (QObject *cell = invokeForObject(form, "_categoryCell"))
+            QMetaObject::invokeMethod(cell, "setCategoryString", Q_ARG(QString, label));
+        form->setProperty("_defaultCategory", categoryId);
+        if (picker)
+            QMetaObject::invokeMethod(picker, "selectRowInComponentAnimated", Q_ARG(int, row), Q_ARG(int, 0), Q_ARG(bool, false));
+        return;
+    }
+}
+
+void ZafYouTubeActivity::publishingAgentWillBeDisplayed(ZafPublishingAgent *agent)
+{
+    Q_UNUSED(agent);
+}
+
+void ZafYouTubeActivity::publishingAgentDoneButtonClicked(ZafPublishingAgent *agent)
+{
+    // Ends editing: the keyboard focus leaves every field of the navigation view.
+    QWidget *view = agent ? agent->navigationController()->view() : nullptr;
+    if (!view)
+        return;
+    if (QWidget *focus = view->focusWidget())
+        focus->clearFocus();
+    view->clearFocus();
+}
+
+void ZafYouTubeActivity::publishingAgentCancelButtonClicked(ZafPublishingAgent *agent)
+{
+    Q_UNUSED(agent);
+    m_waitingForExport = false;
+    activityDidFinish(false);
+    removeMovieCopy();
+}
+
+void ZafYouTubeActivity::publishingAgentDidBeginPublishing(ZafPublishingAgent *agent)
+{
+    Q_UNUSED(agent);
+    showProgressOverlay();
+}
+
+void ZafYouTubeActivity::publishingAgentDidEndPublishingError(ZafPublishingAgent *agent, const std::optional<zaf::Error> &error)
+{
+    Q_UNUSED(agent);
+    showAlertWithError(error);
+    removeMovieCopy();
+}
+
+void ZafYouTubeActivity::showAlertWithError(const std::optional<zaf::Error> &error)
+{
+    if (m_progressOverlay)
+        m_progressOverlay->stopActivity();
+
+    QWidget *host = m_publishingAgent ? m_publishingAgent->navigationController()->view() : presentationWidget();
+    const bool completed = !error.has_value();
+    const QString title = localized(completed ? "PUBLISHED_VIDEO" : "FAILED_PUBLISH_VIDEO");
+
+    auto *alert = new QMessageBox(host);
+    alert->setAttribute(Qt::WA_DeleteOnClose);
+    alert->setWindowModality(Qt::NonModal);
+    alert->setWindowTitle(title);
+    alert->setText(title);
+
+    if (completed) {
+        const QString viewTitle = zaf::text::formatWithObjects(localized("VIEW_BUTTON_TITLE_FORMAT"), {activityTitle()});
+        QAbstractButton *viewButton = alert->addButton(viewTitle, QMessageBox::AcceptRole);
+        connect(viewButton, &QAbstractButton::clicked, this, [this] {
+            const QUrl url(m_publishingAgent ? m_publishingAgent->mediaURL() : QString());
+            activityDidFinish(true);
+            QDesktopServices::openUrl(url);
+        });
+    }
+    QAbstractButton *closeButton = alert->addButton(localized("CLOSE"), QMessageBox::RejectRole);
+    connect(closeButton, &QAbstractButton::clicked, this, [this, completed] { activityDidFinish(completed); });
+    alert->setEscapeButton(closeButton);
+
+    m_resultAlert = alert;
+    alert->show();
+}
+
+void ZafYouTubeActivity::publishRequested()
+{
+    if (m_waitingForExport || !m_publishingAgent)
+        return;
+    const std::shared_ptr<zaf::media::ExportSession> session = m_exportSession;
+    if (session) {
+        const zaf::media::ExportStatus status = session->status();
+        if (!exportHasEnded(status)) {
+            // The copy is still being written: cover the form and publish when the export ends.
+            m_waitingForExport = true;
+            if (m_publishButton)
+                m_publishButton->setEnabled(false);
+            showProgressOverlay();
+            return;
+        }
+        if (status != zaf::media::ExportStatus::Completed) {
+            showProgressOverlay();
+            showAlertWithError(exportFailure(*session));
+            removeMovieCopy();
+            return;
+        }
+    }
+    startPublishing();
+}
+
+void ZafYouTubeActivity::exportDidEnd(const zaf::media::ExportSession *session)
+{
+    if (!m_waitingForExport || !m_exportSession || m_exportSession.get() != session)
+        return;
+    m_waitingForExport = false;
+    if (m_publishButton)
+        m_publishButton->setEnabled(true);
+    if (m_exportSession->status() == zaf::media::ExportStatus::Completed) {
+        startPublishing();
+        return;
+    }
+    showAlertWithError(exportFailure(*m_exportSession));
+    removeMovieCopy();
+}
+
+void ZafYouTubeActivity::startPublishing()
+{
+    m_waitingForExport = false;
+    if (m_publishingAgent)
+        QMetaObject::invokeMethod(m_publishingAgent.get(), "publishAction");
+}
+
+void ZafYouTubeActivity::showProgressOverlay()
+{
+    if (!m_publishingAgent)
+        return;
+    QWidget *host = m_publishingAgent->navigationController()->view();
+    if (m_progressOverlay && m_progressOverlay->parentWidget() == host) {
+        m_progressOverlay->raise();
+        m_progressOverlay->setShowingAnimated(true, true);
+        return;
+    }
+    auto *overlay = new ZafYouTubeActivityProgressOverlay(host->rect(), host);
+    overlay->raise();
+    overlay->show();
+    m_progressOverlay = overlay;
+    overlay->setShowingAnimated(true, true);
+}
+
+void ZafYouTubeActivity::removeMovieCopy() const
+{
+    if (!m_movieURL.isEmpty())
+        ZafTempStore::defaultStore()._srRemoveFile(m_movieURL);
 }

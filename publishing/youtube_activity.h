@@ -16,9 +16,18 @@
 // Threads: main thread only. prepareWithActivityItems() returns at once; the export runs on its own
 // worker thread and its completion only logs. exportSession() gives the running export so that the
 // publishing flow can wait for the copy before uploading it.
+//
+// Publishing: activityViewController() answers with the publishing plug-in's navigation controller
+// holding the form (description filled, category "20" pre-selected). The activity is the agent's
+// delegate: Cancel ends the action as not completed; publishing covers the form with the progress
+// overlay and ends with a result alert; both remove the copy. The Publish button is routed through
+// the activity so that an upload never starts before the copy's export has finished: while the
+// export runs the overlay is shown, and a failed export ends with the failure alert.
 
+#include "platform/error.h"
 #include "platform/ui/share_activity.h"
 #include "publishing/progress_overlay.h"
+#include "publishing/publishing_agent.h"
 
 #include <QIcon>
 #include <QImage>
@@ -28,15 +37,17 @@
 #include <QVariantList>
 
 #include <memory>
+#include <optional>
+
+class QAbstractButton;
+class QMessageBox;
 
 namespace zaf::media {
 class ExportSession;
 }
 
-class ZafPublishingAgent;
 
-
-class ZafYouTubeActivity : public zaf::ui::ShareActivity {
+class ZafYouTubeActivity : public zaf::ui::ShareActivity, public ZafPublishingAgentDelegate {
     Q_OBJECT
 public:
     explicit ZafYouTubeActivity(QObject *parent = nullptr);
@@ -84,7 +95,37 @@ public:
     QPointer<ZafYouTubeActivityProgressOverlay> progressOverlay() const { return m_progressOverlay; }
     void setProgressOverlay(const QPointer<ZafYouTubeActivityProgressOverlay> &overlay) { m_progressOverlay = overlay; }
 
+    // The plug-in's navigation controller with the prepared form. Loads the plug-in on the first call
+    // of the process; a plug-in that cannot be loaded or lacks the agent class stops the process.
+    zaf::ui::ViewController *activityViewController() override;
+
+    // The form's default-category routine while the activity flow is installed: selects the category
+    // whose id, lower-cased, is "20"; leaves the form untouched when there is none.
+    static void selectDefaultCategoryOfForm(QObject *form);
+
+    // ZafPublishingAgentDelegate (main thread).
+    void publishingAgentWillBeDisplayed(ZafPublishingAgent *agent) override;
+    void publishingAgentDoneButtonClicked(ZafPublishingAgent *agent) override;
+    void publishingAgentCancelButtonClicked(ZafPublishingAgent *agent) override;
+    void publishingAgentDidBeginPublishing(ZafPublishingAgent *agent) override;
+    void publishingAgentDidEndPublishingError(ZafPublishingAgent *agent, const std::optional<zaf::Error> &error) override;
+
+    // Stops the overlay's indicator and shows the success alert (no error) or the failure alert.
+    void showAlertWithError(const std::optional<zaf::Error> &error);
+    // The result alert while it exists (non-modal, over the navigation view).
+    QPointer<QMessageBox> resultAlert() const { return m_resultAlert; }
+    // True while a press of Publish waits for the copy's export.
+    bool isWaitingForExport() const { return m_waitingForExport; }
+
 private:
+    // Publish pressed: upload now when the copy is ready, else wait for its export.
+    void publishRequested();
+    // Runs on the main thread once the copy's export has ended.
+    void exportDidEnd(const zaf::media::ExportSession *session);
+    void startPublishing();
+    void showProgressOverlay();
+    void removeMovieCopy() const;
+
     // The movie among the items (see the header comment), or an empty URL.
     static QUrl movieInItems(const QVariantList &activityItems);
     static QString descriptionForItems(const QVariantList &activityItems);
@@ -95,4 +136,8 @@ private:
     std::shared_ptr<zaf::media::ExportSession> m_exportSession;
     std::shared_ptr<ZafPublishingAgent> m_publishingAgent;
     QPointer<ZafYouTubeActivityProgressOverlay> m_progressOverlay;
+    QPointer<QMessageBox> m_resultAlert;
+    QPointer<QAbstractButton> m_publishButton;
+    QMetaObject::Connection m_progressConnection;
+    bool m_waitingForExport = false;
 };
