@@ -180,6 +180,30 @@ TEST(PublishingFlow, TheFormStartsWithTheDescriptionAndCategory20EveryTime)
     }
 }
 
+TEST(PublishingFlow, DefaultCategoryRoutinePicksTheRowOfCategory20)
+{
+    PreparedActivity prepared;
+    zaf::ui::ViewController *navigation = prepared.activity->activityViewController();
+    ASSERT_NE(navigation, nullptr);
+    QObject *form = formOf(navigation);
+    ASSERT_NE(form, nullptr);
+    // Three categories, only the second of which is Gaming.
+    const QVariantList categories{
+        QVariantMap{{QStringLiteral("id"), QStringLiteral("1")}, {QStringLiteral("label"), QStringLiteral("Film")}},
+        QVariantMap{{QStringLiteral("id"), QStringLiteral("20")}, {QStringLiteral("label"), QStringLiteral("Gaming")}},
+        QVariantMap{{QStringLiteral("id"), QStringLiteral("2")}, {QStringLiteral("label"), QStringLiteral("Autos")}}};
+    form->setProperty("_categories", categories);
+    ZafYouTubeActivity::selectDefaultCategoryOfForm(form);
+    QObject *picker = form->property("_picker").value<QObject *>();
+    ASSERT_NE(picker, nullptr);
+    int row = -1;
+    QMetaObject::invokeMethod(picker, "selectedRowInComponent", Q_RETURN_ARG(int, row), Q_ARG(int, 0));
+    EXPECT_EQ(row, 1);
+    EXPECT_EQ(form->property("_defaultCategory").toString(), QStringLiteral("20"));
+    EXPECT_TRUE(prepared.waitForExport());
+    QFile::remove(prepared.copyPath());
+}
+
 TEST(PublishingFlow, PublishingTheCopyEndsWithTheSuccessAlertAndRemovesTheCopy)
 {
     UploadTestServer server(200, std::chrono::seconds(90));
