@@ -14,6 +14,7 @@
 #include <QtPlugin>
 
 #include <functional>
+#include <functional>
 #include <optional>
 
 namespace zaf::ui {
@@ -30,7 +31,10 @@ public:
     virtual void publishingAgentCancelButtonClicked(ZafPublishingAgent *agent) = 0;
     virtual void publishingAgentDidBeginPublishing(ZafPublishingAgent *agent) = 0;
     virtual void publishingAgentDidEndPublishingError(ZafPublishingAgent *agent, const std::optional<zaf::Error> &error) = 0;
-    // Optional.
+    // Optional. Publish was pressed: the agent begins publishing when `proceed` is called (once, on
+    // the main thread). The delegate may hold it back, e.g. until the media file is complete; the
+    // default proceeds at once.
+    virtual void publishingAgentWillBeginPublishing(ZafPublishingAgent *, std::function<void()> proceed) { proceed(); }
     virtual void publishingAgentDidStartRemaking(ZafPublishingAgent *) {}
     virtual void publishingAgentDidEndRemakingDidSucceed(ZafPublishingAgent *, bool) {}
 };
@@ -73,6 +77,6 @@ inline constexpr const char *kZafPublishingCategoryLabelKey = "label";
 inline constexpr const char *kZafPublishingPluginFileName = "libzaf_publishing_plugin.so";
 inline constexpr const char *kZafYouTubePublishingAgentClassName = "ZafYouTubePublishingAgent";
 
-inline constexpr int kZafPublishingPluginApiVersion = 1;
-#define ZafPublishingPluginInterface_iid "com.zafrel.VideoPublisher/1"
+inline constexpr int kZafPublishingPluginApiVersion = 2;
+#define ZafPublishingPluginInterface_iid "com.zafrel.VideoPublisher/2"
 Q_DECLARE_INTERFACE(ZafPublishingPluginInterface, ZafPublishingPluginInterface_iid)

@@ -353,18 +353,7 @@ zaf::ui::ViewController *ZafYouTubeActivity::activityViewController()
         }
     }
 
-    // Route Publish through the activity: the one button of the navigation view whose click goes to
-    // the agent. Without it the agent publishes on its own and nothing waits for the copy.
-    m_publishButton.clear();
     m_waitingForExport = false;
-    const QList<QAbstractButton *> buttons = navigation->view()->findChildren<QAbstractButton *>();
-    for (QAbstractButton *button : buttons) {
-        if (QObject::disconnect(button, &QAbstractButton::clicked, agent, nullptr)) {
-            m_publishButton = button;
-            connect(button, &QAbstractButton::clicked, this, &ZafYouTubeActivity::publishRequested);
-            break;
-        }
-    }
     return navigation;
 }
 
@@ -460,8 +449,10 @@ void ZafYouTubeActivity::showAlertWithError(const std::optional<zaf::Error> &err
     alert->show();
 }
 
-void ZafYouTubeActivity::publishRequested()
+void ZafYouTubeActivity::publishingAgentWillBeginPublishing(ZafPublishingAgent *, std::function<void()> proceed)
 {
+    // Nothing is uploaded before the copy is complete.
+    m_proceedWithPublishing = std::move(proceed);
     if (m_waitingForExport || !m_publishingAgent)
         return;
     const std::shared_ptr<zaf::media::ExportSession> session = m_exportSession;
@@ -470,8 +461,6 @@ void ZafYouTubeActivity::publishRequested()
         if (!exportHasEnded(status)) {
             // The copy is still being written: cover the form and publish when the export ends.
             m_waitingForExport = true;
-            if (m_publishButton)
-                m_publishButton->setEnabled(false);
             showProgressOverlay();
             return;
         }
@@ -490,8 +479,6 @@ void ZafYouTubeActivity::exportDidEnd(const zaf::media::ExportSession *session)
     if (!m_waitingForExport || !m_exportSession || m_exportSession.get() != session)
         return;
     m_waitingForExport = false;
-    if (m_publishButton)
-        m_publishButton->setEnabled(true);
     if (m_exportSession->status() == zaf::media::ExportStatus::Completed) {
         startPublishing();
         return;
@@ -503,8 +490,8 @@ void ZafYouTubeActivity::exportDidEnd(const zaf::media::ExportSession *session)
 void ZafYouTubeActivity::startPublishing()
 {
     m_waitingForExport = false;
-    if (m_publishingAgent)
-        QMetaObject::invokeMethod(m_publishingAgent.get(), "publishAction");
+    if (std::function<void()> proceed = std::exchange(m_proceedWithPublishing, {}))
+        proceed();
 }
 
 void ZafYouTubeActivity::showProgressOverlay()

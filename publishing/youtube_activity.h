@@ -107,6 +107,8 @@ public:
     void publishingAgentWillBeDisplayed(ZafPublishingAgent *agent) override;
     void publishingAgentDoneButtonClicked(ZafPublishingAgent *agent) override;
     void publishingAgentCancelButtonClicked(ZafPublishingAgent *agent) override;
+    // Publish pressed: upload now when the copy is ready, else wait for its export.
+    void publishingAgentWillBeginPublishing(ZafPublishingAgent *agent, std::function<void()> proceed) override;
     void publishingAgentDidBeginPublishing(ZafPublishingAgent *agent) override;
     void publishingAgentDidEndPublishingError(ZafPublishingAgent *agent, const std::optional<zaf::Error> &error) override;
 
@@ -118,8 +120,6 @@ public:
     bool isWaitingForExport() const { return m_waitingForExport; }
 
 private:
-    // Publish pressed: upload now when the copy is ready, else wait for its export.
-    void publishRequested();
     // Runs on the main thread once the copy's export has ended.
     void exportDidEnd(const zaf::media::ExportSession *session);
     void startPublishing();
@@ -137,7 +137,8 @@ private:
     std::shared_ptr<ZafPublishingAgent> m_publishingAgent;
     QPointer<ZafYouTubeActivityProgressOverlay> m_progressOverlay;
     QPointer<QMessageBox> m_resultAlert;
-    QPointer<QAbstractButton> m_publishButton;
+    // Lets the agent begin publishing once the copy is complete.
+    std::function<void()> m_proceedWithPublishing;
     QMetaObject::Connection m_progressConnection;
     bool m_waitingForExport = false;
 };

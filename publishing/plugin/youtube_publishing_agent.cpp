@@ -121,6 +121,25 @@ void ZafYouTubePublishingAgent::doneAction()
 
 void ZafYouTubePublishingAgent::publishAction()
 {
+    if (m_publishing || m_awaitingDelegate)
+        return;
+    m_awaitingDelegate = true;
+    m_publishItem->setEnabled(false);
+    QPointer<ZafYouTubePublishingAgent> guard(this);
+    auto proceed = [guard] {
+        if (guard && guard->m_awaitingDelegate) {
+            guard->m_awaitingDelegate = false;
+            guard->beginPublishing();
+        }
+    };
+    if (m_delegate)
+        m_delegate->publishingAgentWillBeginPublishing(this, proceed);
+    else
+        proceed();
+}
+
+void ZafYouTubePublishingAgent::beginPublishing()
+{
     if (m_publishing)
         return;
     m_publishing = true;

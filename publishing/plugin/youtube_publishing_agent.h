@@ -85,5 +85,8 @@ private:
     zaf::publishing::ResumableUpload *m_upload = nullptr;
     QOAuth2AuthorizationCodeFlow *m_oauth = nullptr;
     qint64 m_chunkSize = zaf::publishing::ResumableUpload::kDefaultChunkSize;
+    void beginPublishing();
     bool m_publishing = false;
+    // Publish was pressed and the delegate has not let it begin yet.
+    bool m_awaitingDelegate = false;
 };
