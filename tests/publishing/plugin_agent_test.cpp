@@ -5,6 +5,7 @@
 #include "publishing/publishing_agent.h"
 #include "platform/ui/view_controller.h"
 #include "tests/publishing/upload_test_server.h"
+#include "tests/support/wait_until.h"
 #include "tests/publishing/upload_test_support.h"
 #include "tests/support/temp_dir.h"
 
@@ -84,23 +85,7 @@ public:
     }
 };
 
-bool waitUntil(const std::function<bool()> &condition, int milliseconds = 15000)
-{
-    QEventLoop loop;
-    QTimer poll;
-    QTimer timeout;
-    timeout.setSingleShot(true);
-    QObject::connect(&poll, &QTimer::timeout, &loop, [&] {
-        if (condition())
-            loop.quit();
-    });
-    QObject::connect(&timeout, &QTimer::timeout, &loop, &QEventLoop::quit);
-    poll.start(5);
-    timeout.start(milliseconds);
-    if (!condition())
-        loop.exec();
-    return condition();
-}
+using zaf::test::waitUntil;
 
 TEST(PublishingPluginTest, LoadsThePluginAndFindsTheAgentClassByName)
 {

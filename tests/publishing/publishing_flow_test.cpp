@@ -7,6 +7,7 @@
 #include "platform/ui/view_controller.h"
 #include "publishing/youtube_activity.h"
 #include "tests/publishing/upload_test_server.h"
+#include "tests/support/wait_until.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/process_temp_directory.h"
 #include "tests/support/temp_dir.h"
@@ -53,23 +54,7 @@ public:
     }
 };
 
-bool waitUntil(const std::function<bool()> &condition, int milliseconds = 60000)
-{
-    QEventLoop loop;
-    QTimer poll;
-    QTimer timeout;
-    timeout.setSingleShot(true);
-    QObject::connect(&poll, &QTimer::timeout, &loop, [&] {
-        if (condition())
-            loop.quit();
-    });
-    QObject::connect(&timeout, &QTimer::timeout, &loop, &QEventLoop::quit);
-    poll.start(5);
-    timeout.start(milliseconds);
-    if (!condition())
-        loop.exec();
-    return condition();
-}
+using zaf::test::waitUntil;
 
 QString tableText(const char *key)
 {
