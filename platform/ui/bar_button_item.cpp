@@ -91,6 +91,7 @@ struct BarButtonItem::Private {
     SystemItem kind = SystemItem::FlexibleSpace;
     QPointer<QWidget> customView;
     QAction *action = nullptr;
+    QPointer<QWidget> placedView;
     QString title;
     QString toolTip;
     QIcon icon;
@@ -240,6 +241,18 @@ void BarButtonItem::trigger()
 QAction *BarButtonItem::action() const
 {
     return d->action;
+}
+
+QWidget *BarButtonItem::view() const
+{
+    if (d->customView)
+        return d->customView;
+    return d->placedView;
+}
+
+void BarButtonItem::setView(QWidget *view)
+{
+    d->placedView = view;
 }
 
 } // namespace zaf::ui

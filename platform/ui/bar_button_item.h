@@ -60,6 +60,11 @@ public:
     // The QAction of a system item that is not a space (nullptr otherwise).
     QAction *action() const;
 
+    // The widget that shows the item on screen: the custom view, or the button a toolbar made for
+    // it most recently (toolbars call setView when they place the item). Null while not placed.
+    QWidget *view() const;
+    void setView(QWidget *view);
+
 Q_SIGNALS:
     // Main thread: width, insets, enabled state or tooltip changed; toolbars showing the item update.
     void changed();

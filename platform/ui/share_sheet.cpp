@@ -28,14 +28,14 @@ constexpr int kButtonWidth = 104;
 constexpr int kButtonHeight = 96;
 constexpr int kPopoverGap = 4;
 
-// The on-screen widget that shows a bar button item: its custom view, or the toolbar button of its
-// action.
+// The on-screen widget that shows a bar button item: the view a toolbar placed it in, else a
+// visible widget its action was added to.
 QWidget *widgetOfItem(BarButtonItem *item)
 {
     if (!item)
         return nullptr;
-    if (QWidget *custom = item->customView())
-        return custom;
+    if (QWidget *view = item->view(); view && view->isVisible())
+        return view;
     if (QAction *action = item->action()) {
         for (QObject *object : action->associatedObjects()) {
             auto *widget = qobject_cast<QWidget *>(object);

@@ -268,6 +268,7 @@ void Toolbar::setItems(const QList<BarButtonItem *> &items, bool animated)
             widget = item->customView() ? static_cast<QWidget *>(new CustomHost(item->customView())) : new QWidget;
         } else {
             widget = new ItemButton(item, d->tint);
+            item->setView(widget);
         }
         d->row->addWidget(widget);
         d->items.append(item);

@@ -115,10 +115,13 @@ TEST_F(EditorShareTest, PadLayoutInIntroModeLeavesPlayOutAndSheetWithoutPluginHa
     qputenv("ZAF_PUBLISHING_PLUGIN_PATH", QFile::encodeName(scratch.file(QStringLiteral("no-plugin.so"))));
     auto e = makeEditor(movie(1), QRectF(0, 0, 900, 500));
     ASSERT_TRUE(e->isPadMode());
+    e->view()->resize(900, 500);
+    e->view()->show();
     e->shareAction();
     ui::ShareSheet *sheet = presentedSheet(*e);
     ASSERT_NE(sheet, nullptr);
     EXPECT_EQ(itemNames(*e, e->topToolBar()), words("done flex title flex share fix save"));
+    EXPECT_TRUE(sheet->view()->window()->windowFlags().testFlag(Qt::Popup)) << "a popover at the share button";
     EXPECT_FALSE(sheet->visibleActivityTypes().contains(QStringLiteral("ZafPublishToYouTube")));
     EXPECT_FALSE(sheet->visibleActivityTypes().contains(QLatin1String(ui::kActivityTypeCopyToPasteboard)));
     sheet->cancelButton()->click();
