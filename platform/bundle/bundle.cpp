@@ -471,6 +471,9 @@ QStringList preferredLanguages()
     }
     QStringList languages;
     for (QString language : QLocale::system().uiLanguages()) {
+        // The C (POSIX) locale asks for the untranslated messages, and those are written in English.
+        if (language == QLatin1String("C") || language == QLatin1String("POSIX"))
+            language = QString::fromLatin1(kDevelopmentLocalization);
         language.replace(QLatin1Char('_'), QLatin1Char('-'));
         if (!languages.contains(language))
             languages << language;
@@ -519,6 +522,14 @@ QStringList preferredLocalizationsFromArray(const QStringList &localizations, co
                 break;
             const qsizetype index = indexOf.at(result.getSupportedIndex());
             ordered << remaining.takeAt(index);
+        }
+    }
+    // The texts are written in the development language: when no preference is served, it is the
+    // best remaining choice, ahead of the other localizations in their given order.
+    for (qsizetype i = 0; i < remaining.size(); ++i) {
+        if (remaining[i] == QLatin1String(kDevelopmentLocalization)) {
+            remaining.move(i, 0);
+            break;
         }
     }
     return ordered + remaining;

@@ -31,9 +31,13 @@ TEST(PreferredLocalizationsTest, OrdersLocalizationsByPreferenceThenKeepsTheRest
         {list({"pt_BR", "pt", "en"}), list({"pt-BR", "en"}), list({"pt_BR", "pt", "en"})},
         // Scripts matter: traditional Chinese in Taiwan is not served by simplified Chinese first.
         {list({"zh_CN", "zh_TW"}), list({"zh-Hant-TW"}), list({"zh_TW", "zh_CN"})},
-        // Preferences no localization serves leave the given order.
+        // Preferences no localization serves leave the development localization first, then the
+        // given order.
         {list({"en", "de"}), list({"ja-JP"}), list({"en", "de"})},
-        {list({"en", "de"}), QStringList(), list({"en", "de"})},
+        {list({"de", "en", "fr"}), list({"pl-PL"}), list({"en", "de", "fr"})},
+        {list({"de", "fr"}), list({"pl"}), list({"de", "fr"})},
+        {list({"de", "en"}), QStringList(), list({"en", "de"})},
+        {list({"de", "en", "ja"}), list({"ja", "pl"}), list({"ja", "en", "de"})},
         {QStringList(), list({"de"}), QStringList()},
         // Names that are not language tags never match but are kept.
         {list({"Base", "de", "en"}), list({"de", "en"}), list({"de", "en", "Base"})},
@@ -54,8 +58,12 @@ TEST(PreferredLocalizationsTest, GivenOrderBreaksTiesBetweenEquallyGoodLocalizat
 TEST(PreferredLanguagesTest, TestOverrideReplacesTheSystemLanguagesUntilCleared)
 {
     QStringList system;
-    for (QString language : QLocale::system().uiLanguages())
+    for (QString language : QLocale::system().uiLanguages()) {
+        // The C locale (as on build machines) is the untranslated, English one.
+        if (language == QLatin1String("C") || language == QLatin1String("POSIX"))
+            language = QStringLiteral("en");
         system << language.replace(QLatin1Char('_'), QLatin1Char('-'));
+    }
     system.removeDuplicates();
     EXPECT_EQ(preferredLanguages(), system);
     {
