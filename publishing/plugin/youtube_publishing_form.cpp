@@ -97,7 +97,10 @@ void ZafYouTubePublishingForm::loadView()
     m_privacy->addItem(tr("Unlisted"), QString::fromLatin1(kPrivacyStatuses[1]));
     m_privacy->addItem(tr("Public"), QString::fromLatin1(kPrivacyStatuses[2]));
     m_table->setCellWidget(ZafYouTubeFormTable::PrivacyRow, 0, m_privacy);
-    layout->addWidget(m_table, 2);
+    // The table is as tall as its rows; the picker below takes the rest of the form.
+    m_table->setVerticalScrollBarPolicy(Qt::ScrollBarAlwaysOff);
+    m_table->setFixedHeight(m_table->verticalHeader()->length() + 2 * m_table->frameWidth());
+    layout->addWidget(m_table);
 
     m_picker = new ZafYouTubeCategoryPicker(view);
     layout->addWidget(m_picker, 1);
