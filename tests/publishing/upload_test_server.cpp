@@ -323,6 +323,14 @@ void UploadTestServer::respond(QTcpSocket *socket, int status, const QList<QPair
     for (const auto &header : headers)
         answer += header.first + ": " + header.second + "\r\n";
     answer += "Content-Length: " + QByteArray::number(body.size()) + "\r\nConnection: close\r\n\r\n" + body;
+    if (m_responseDelay.count() > 0) {
+        // The socket is the timer's context: a connection gone in the meantime gets nothing.
+        QTimer::singleShot(m_responseDelay, socket, [socket, answer] {
+            socket->write(answer);
+            socket->disconnectFromHost();
+        });
+        return;
+    }
     socket->write(answer);
     socket->disconnectFromHost();
 }

@@ -68,6 +68,8 @@ public:
     void queueFault(const Fault &fault) { m_faults.append(fault); }
     // The bearer token every request must carry (401 otherwise).
     void setExpectedToken(const QByteArray &token) { m_token = token; }
+    // Every answer goes out this long after the request was read (a slow link, for screenshots).
+    void setResponseDelay(std::chrono::milliseconds delay) { m_responseDelay = delay; }
     // Initiations whose category is not in this set are refused with 400 (empty: any category).
     void setAcceptedCategories(const QSet<QString> &categories) { m_categories = categories; }
 
@@ -109,6 +111,7 @@ private:
     QTcpServer m_server;
     QTimer m_lifetime;
     int m_maxRequests;
+    std::chrono::milliseconds m_responseDelay{0};
     QHash<QTcpSocket *, Connection> m_connections;
     QList<Fault> m_faults;
     QByteArray m_token = "test-token";
