@@ -4,6 +4,7 @@
 #include "platform/ui/view_animation.h"
 
 #include <QLabel>
+#include <QPainter>
 #include <QPalette>
 #include <QProgressBar>
 
@@ -15,6 +16,22 @@ namespace {
 
 constexpr int kProgressSteps = 1000;
 constexpr int kLabelHeight = 20;
+
+// A dark rounded panel, so the progress reads clearly over whatever form field lies under it.
+class ProgressPanel : public QWidget {
+public:
+    using QWidget::QWidget;
+
+protected:
+    void paintEvent(QPaintEvent *) override
+    {
+        QPainter painter(this);
+        painter.setRenderHint(QPainter::Antialiasing);
+        painter.setPen(Qt::NoPen);
+        painter.setBrush(QColor(30, 30, 30, 220));
+        painter.drawRoundedRect(QRectF(rect()), 10, 10);
+    }
+};
 
 } // namespace
 
@@ -135,8 +152,19 @@ void ZafYouTubeActivityProgressOverlay::createActivityIndicator()
     m_progressLabel->setGeometry(int(std::lround(centre.x() - kProgressBarWidth / 2.0)),
                                  barTop + kProgressBarHeight + kProgressSpacing / 2, kProgressBarWidth,
                                  kLabelHeight);
+    if (!m_progressPanel) {
+        m_progressPanel = new ProgressPanel(this);
+        m_progressPanel->setObjectName(QStringLiteral("progressOverlayPanel"));
+    }
+    const int panelWidth = std::max(indicator->width(), kProgressBarWidth) + 2 * kProgressPanelPadding;
+    const int panelTop = indicator->geometry().top() - kProgressPanelPadding;
+    const int panelBottom = m_progressLabel->geometry().bottom() + 1 + kProgressPanelPadding / 2;
+    m_progressPanel->setGeometry(int(std::lround(centre.x() - panelWidth / 2.0)), panelTop, panelWidth,
+                                 panelBottom - panelTop);
+    zaf::ui::addSubview(this, m_progressPanel);
     zaf::ui::addSubview(this, m_progressBar);
     zaf::ui::addSubview(this, m_progressLabel);
+    m_progressPanel->stackUnder(indicator);
     applyProgress();
 
     // The fade-in was cut short by hiding: the indicator exists, but hiding asked for it to be gone.

@@ -62,6 +62,7 @@ public:
     static constexpr int kProgressSpacing = 12;
     static constexpr int kProgressBarWidth = 120;
     static constexpr int kProgressBarHeight = 4;
+    static constexpr int kProgressPanelPadding = 16;
 
 private:
     // Fades the overlay to `alpha` over kFadeSeconds, then runs `completion`. A fade started while
@@ -75,6 +76,7 @@ private:
     double m_progress = -1.0;
     QPointer<QWidget> m_dimmingView;
     QPointer<zaf::ui::ActivityIndicator> m_activityIndicator;
+    QPointer<QWidget> m_progressPanel;   // the rounded backing behind indicator, bar and text
     QPointer<QProgressBar> m_progressBar;
     QPointer<QLabel> m_progressLabel;
     QTimer m_fadeTimer;

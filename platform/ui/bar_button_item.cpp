@@ -1,21 +1,11 @@
 #include "platform/ui/bar_button_item.h"
 
+#include "platform/ui/bundled_icons.h"
+
 #include <QAction>
-#include <QApplication>
 #include <QCoreApplication>
 #include <QIcon>
-#include <QStyle>
-
-#include <mutex>
 #include <QWidget>
-
-// The icons are compiled into this static library: registering them explicitly keeps the linker
-// from dropping them. A global-namespace function, as the registration routine is a global symbol.
-static void registerIconResources()
-{
-    static std::once_flag once;
-    std::call_once(once, [] { Q_INIT_RESOURCE(ui_icons); });
-}
 
 namespace zaf::ui {
 
@@ -60,28 +50,27 @@ QStringList themeIconNames(SystemItem kind)
     }
 }
 
-// The project's own monochrome glyphs, for desktops whose icon theme lacks the kind.
-QString fallbackIconPath(SystemItem kind)
+// The project's own monochrome glyph of a kind, for desktops whose icon theme lacks it.
+const char *fallbackIconName(SystemItem kind)
 {
     switch (kind) {
-    case SystemItem::Action: return QStringLiteral(":/zaf/ui/icons/share.svg");
-    case SystemItem::Play: return QStringLiteral(":/zaf/ui/icons/play.svg");
-    case SystemItem::Pause: return QStringLiteral(":/zaf/ui/icons/pause.svg");
-    case SystemItem::Undo: return QStringLiteral(":/zaf/ui/icons/undo.svg");
-    default: return QString();
+    case SystemItem::Action: return "share";
+    case SystemItem::Play: return "play";
+    case SystemItem::Pause: return "pause";
+    case SystemItem::Undo: return "undo";
+    default: return "";
     }
 }
 
 QIcon systemIcon(SystemItem kind)
 {
-    registerIconResources();
     for (const QString &name : themeIconNames(kind)) {
         for (const QString &candidate : {name + QStringLiteral("-symbolic"), name}) {
             if (QIcon::hasThemeIcon(candidate))
                 return QIcon::fromTheme(candidate);
         }
     }
-    return QIcon(fallbackIconPath(kind));
+    return bundledIcon(fallbackIconName(kind));
 }
 
 } // namespace

@@ -4,15 +4,15 @@
 #include "platform/files/file_manager.h"
 #include "platform/log.h"
 #include "platform/photos/photo_library.h"
+#include "platform/ui/bundled_icons.h"
 
-#include <QApplication>
 #include <QClipboard>
 #include <QDir>
 #include <QFileDialog>
 #include <QFileInfo>
+#include <QGuiApplication>
 #include <QMimeData>
 #include <QProcess>
-#include <QStyle>
 
 #include <cerrno>
 #include <sys/stat.h>
@@ -25,12 +25,13 @@ Error shareError(int code, const QString &message)
     return Error{QString::fromLatin1(kShareErrorDomain), code, message};
 }
 
-QIcon themedIcon(const char *name, QStyle::StandardPixmap fallback)
+// The desktop theme's icon of that name, else the project's own glyph.
+QIcon themedIcon(const char *name, const char *bundledName)
 {
     const QIcon icon = QIcon::fromTheme(QString::fromLatin1(name));
     if (!icon.isNull())
         return icon;
-    return QApplication::style() ? QApplication::style()->standardIcon(fallback) : QIcon();
+    return bundledIcon(bundledName);
 }
 
 QString programFromEnvironment(const char *variable, const char *fallback)
@@ -161,7 +162,7 @@ MailShareActivity::MailShareActivity(QObject *parent) : ShareActivity(parent) {}
 
 QString MailShareActivity::activityType() const { return QString::fromLatin1(kActivityTypeMail); }
 QString MailShareActivity::activityTitle() const { return tr("Mail"); }
-QIcon MailShareActivity::activityImage() const { return themedIcon("mail-send", QStyle::SP_DialogOkButton); }
+QIcon MailShareActivity::activityImage() const { return themedIcon("mail-send", "mail"); }
 
 bool MailShareActivity::canPerformWithActivityItems(const QVariantList &activityItems)
 {
@@ -231,7 +232,7 @@ OpenWithShareActivity::OpenWithShareActivity(QObject *parent) : ShareActivity(pa
 
 QString OpenWithShareActivity::activityType() const { return QString::fromLatin1(kActivityTypeOpenWith); }
 QString OpenWithShareActivity::activityTitle() const { return tr("Open With"); }
-QIcon OpenWithShareActivity::activityImage() const { return themedIcon("document-open", QStyle::SP_DirOpenIcon); }
+QIcon OpenWithShareActivity::activityImage() const { return themedIcon("document-open", "open-with"); }
 
 bool OpenWithShareActivity::canPerformWithActivityItems(const QVariantList &activityItems)
 {
@@ -256,7 +257,7 @@ SaveToFolderShareActivity::SaveToFolderShareActivity(QObject *parent) : ShareAct
 
 QString SaveToFolderShareActivity::activityType() const { return QString::fromLatin1(kActivityTypeSaveToFolder); }
 QString SaveToFolderShareActivity::activityTitle() const { return tr("Save to Folder"); }
-QIcon SaveToFolderShareActivity::activityImage() const { return themedIcon("folder", QStyle::SP_DirIcon); }
+QIcon SaveToFolderShareActivity::activityImage() const { return themedIcon("folder", "folder"); }
 
 bool SaveToFolderShareActivity::canPerformWithActivityItems(const QVariantList &activityItems)
 {
@@ -324,7 +325,7 @@ SaveToVideoLibraryShareActivity::SaveToVideoLibraryShareActivity(QObject *parent
 
 QString SaveToVideoLibraryShareActivity::activityType() const { return QString::fromLatin1(kActivityTypeSaveToPhotoLibrary); }
 QString SaveToVideoLibraryShareActivity::activityTitle() const { return tr("Save Video"); }
-QIcon SaveToVideoLibraryShareActivity::activityImage() const { return themedIcon("video-x-generic", QStyle::SP_DialogSaveButton); }
+QIcon SaveToVideoLibraryShareActivity::activityImage() const { return themedIcon("video-x-generic", "video-library"); }
 
 bool SaveToVideoLibraryShareActivity::canPerformWithActivityItems(const QVariantList &activityItems)
 {
@@ -358,7 +359,7 @@ CopyShareActivity::CopyShareActivity(QObject *parent) : ShareActivity(parent) {}
 
 QString CopyShareActivity::activityType() const { return QString::fromLatin1(kActivityTypeCopyToPasteboard); }
 QString CopyShareActivity::activityTitle() const { return tr("Copy"); }
-QIcon CopyShareActivity::activityImage() const { return themedIcon("edit-copy", QStyle::SP_FileIcon); }
+QIcon CopyShareActivity::activityImage() const { return themedIcon("edit-copy", "copy"); }
 
 bool CopyShareActivity::canPerformWithActivityItems(const QVariantList &activityItems)
 {
