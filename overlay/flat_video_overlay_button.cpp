@@ -26,7 +26,7 @@ QImage renderSharedImage(double glyphAlpha)
 
 ZafFlatVideoOverlayButton::ZafFlatVideoOverlayButton(std::int64_t style, QWidget *parent)
     : zaf::overlay::OverlayImageButton(parent)
-    , m_style(style)
+    , ZafVideoOverlayButton(style)
 {
     setNormalImage(_normalButtonImage());
     setHighlightedImage(_highlightedButtonImage());
@@ -37,39 +37,9 @@ ZafFlatVideoOverlayButton::ZafFlatVideoOverlayButton(std::int64_t style, QWidget
 
 ZafFlatVideoOverlayButton::~ZafFlatVideoOverlayButton() = default;
 
-std::int64_t ZafFlatVideoOverlayButton::style() const
-{
-    return m_style;
-}
-
-void ZafFlatVideoOverlayButton::setTargetAction(QObject *target, const QByteArray &action)
-{
-    m_targetAction.set(target, action);
-}
-
-QObject *ZafFlatVideoOverlayButton::target() const
-{
-    return m_targetAction.target();
-}
-
-void ZafFlatVideoOverlayButton::setTarget(QObject *target)
-{
-    m_targetAction.set(target, m_targetAction.action());
-}
-
-QByteArray ZafFlatVideoOverlayButton::action() const
-{
-    return m_targetAction.action();
-}
-
-void ZafFlatVideoOverlayButton::setAction(const QByteArray &action)
-{
-    m_targetAction.set(m_targetAction.target(), action);
-}
-
 void ZafFlatVideoOverlayButton::_handleTap(QObject *)
 {
-    m_targetAction.send(this);
+    sendAction();
 }
 
 const QImage &ZafFlatVideoOverlayButton::_normalButtonImage()

@@ -11,7 +11,6 @@
 
 #include "overlay/overlay_image_button.h"
 #include "overlay/video_overlay_button.h"
-#include "platform/ui/target_action.h"
 
 #include <QImage>
 
@@ -22,14 +21,9 @@ public:
     explicit ZafFlatVideoOverlayButton(std::int64_t style, QWidget *parent = nullptr);
     ~ZafFlatVideoOverlayButton() override;
 
-    std::int64_t style() const override;
-    void setTargetAction(QObject *target, const QByteArray &action) override;
+    // The creation style (hides QWidget::style, the widget style, as the two share a name).
+    using ZafVideoOverlayButton::style;
     QWidget *widget() override { return this; }
-
-    QObject *target() const;
-    void setTarget(QObject *target);
-    QByteArray action() const;
-    void setAction(const QByteArray &action);
 
     // The shared normal and pressed images: rendered on the first call in the process (exactly once,
     // even when first calls race) and the very same object on every call after.
@@ -50,6 +44,4 @@ public Q_SLOTS:
     void _handleTap(QObject *sender);
 
 private:
-    const std::int64_t m_style;
-    zaf::ui::TargetAction m_targetAction;
 };

@@ -22,8 +22,8 @@ constexpr int kGlyphMaskFlags = 3;
 
 ZafHighFidelityVideoOverlayButton::ZafHighFidelityVideoOverlayButton(std::int64_t style, QWidget *parent)
     : QWidget(parent)
+    , ZafVideoOverlayButton(style)
     , _button(new zaf::overlay::OverlayImageButton(this))
-    , m_style(style)
 {
     // The glyph, and the inner button fitted to it at the origin; no image for the pressed state.
     const QImage glyph = zaf::overlay::imageNamed(QLatin1String(ZafVideoOverlayGlyphMaskImageName));
@@ -47,7 +47,7 @@ ZafHighFidelityVideoOverlayButton::ZafHighFidelityVideoOverlayButton(std::int64_
             &ZafHighFidelityVideoOverlayButton::_playButtonDeactivate);
     setAttribute(Qt::WA_NoMousePropagation);
 
-    if (m_style == 0) {
+    if (style == 0) {
         const QImage background = zaf::overlay::imageNamed(QLatin1String(ZafVideoOverlayBackgroundMaskImageName));
         m_maskImageView = new QLabel(this);
         m_maskImageView->setPixmap(QPixmap::fromImage(background));
@@ -79,36 +79,6 @@ ZafHighFidelityVideoOverlayButton::ZafHighFidelityVideoOverlayButton(std::int64_
 
 ZafHighFidelityVideoOverlayButton::~ZafHighFidelityVideoOverlayButton() = default;
 
-std::int64_t ZafHighFidelityVideoOverlayButton::style() const
-{
-    return m_style;
-}
-
-void ZafHighFidelityVideoOverlayButton::setTargetAction(QObject *target, const QByteArray &action)
-{
-    m_targetAction.set(target, action);
-}
-
-QObject *ZafHighFidelityVideoOverlayButton::target() const
-{
-    return m_targetAction.target();
-}
-
-void ZafHighFidelityVideoOverlayButton::setTarget(QObject *target)
-{
-    m_targetAction.set(target, m_targetAction.action());
-}
-
-QByteArray ZafHighFidelityVideoOverlayButton::action() const
-{
-    return m_targetAction.action();
-}
-
-void ZafHighFidelityVideoOverlayButton::setAction(const QByteArray &action)
-{
-    m_targetAction.set(m_targetAction.target(), action);
-}
-
 double ZafHighFidelityVideoOverlayButton::glyphAlpha() const
 {
     return _button->imageOpacity();
@@ -127,7 +97,7 @@ void ZafHighFidelityVideoOverlayButton::_playButtonDeactivate(QObject *)
 void ZafHighFidelityVideoOverlayButton::_playButtonTapped(QObject *)
 {
     _playButtonDeactivate(_button);
-    m_targetAction.send(this);
+    sendAction();
 }
 
 void ZafHighFidelityVideoOverlayButton::setGlyphAlpha(double alpha)

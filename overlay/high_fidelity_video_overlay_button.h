@@ -9,7 +9,6 @@
 // pressed. The widget keeps the glyph image's size. Main thread only.
 
 #include "overlay/video_overlay_button.h"
-#include "platform/ui/target_action.h"
 
 #include <QWidget>
 
@@ -29,14 +28,9 @@ public:
     explicit ZafHighFidelityVideoOverlayButton(std::int64_t style, QWidget *parent = nullptr);
     ~ZafHighFidelityVideoOverlayButton() override;
 
-    std::int64_t style() const override;
-    void setTargetAction(QObject *target, const QByteArray &action) override;
+    // The creation style (hides QWidget::style, the widget style, as the two share a name).
+    using ZafVideoOverlayButton::style;
     QWidget *widget() override { return this; }
-
-    QObject *target() const;
-    void setTarget(QObject *target);
-    QByteArray action() const;
-    void setAction(const QByteArray &action);
 
     // The invisible image view showing the background mask (style 0), or null.
     QLabel *maskImageView() const { return m_maskImageView; }
@@ -67,7 +61,5 @@ protected:
 private:
     void setGlyphAlpha(double alpha);
 
-    const std::int64_t m_style;
-    zaf::ui::TargetAction m_targetAction;
     QLabel *m_maskImageView = nullptr;
 };
