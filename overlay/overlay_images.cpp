@@ -4,9 +4,7 @@
 #include "platform/ui/screen.h"
 
 #include <QFile>
-#include <QPainter>
 #include <QSvgRenderer>
-#include <QtMath>
 
 #include <mutex>
 
@@ -38,17 +36,7 @@ QImage imageNamed(const QString &name)
         return {};
     }
 
-    const double scale = zaf::ui::Screen::mainScreenScale();
-    const QSize pixels(qCeil(points.width() * scale), qCeil(points.height() * scale));
-    QImage image(pixels, QImage::Format_ARGB32_Premultiplied);
-    image.fill(Qt::transparent);
-    {
-        QPainter painter(&image);
-        painter.setRenderHint(QPainter::Antialiasing);
-        renderer.render(&painter, QRectF(QPointF(0, 0), QSizeF(points) * scale));
-    }
-    image.setDevicePixelRatio(scale);
-    return image;
+    return zaf::ui::Screen::renderAtMainScreenScale(renderer, QSizeF(points));
 }
 
 QSizeF sizeInPoints(const QImage &image)

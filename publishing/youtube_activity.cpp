@@ -21,11 +21,9 @@
 #include <QMessageBox>
 #include <QFile>
 #include <QMetaType>
-#include <QPainter>
 #include <QPixmap>
 #include <QSvgRenderer>
 #include <QVariantMap>
-#include <QtMath>
 
 #include <mutex>
 
@@ -56,21 +54,6 @@ bool opensAsPlayableMovie(const QUrl &url)
     return asset && asset->load() && asset->isPlayable();
 }
 
-// Renders an SVG so that its `points` rectangle fills an image at the main screen's scale.
-QImage renderAtScreenScale(QSvgRenderer &renderer, const QSizeF &points)
-{
-    const double scale = zaf::ui::Screen::mainScreenScale();
-    const QSize pixels(qCeil(points.width() * scale), qCeil(points.height() * scale));
-    QImage image(pixels, QImage::Format_ARGB32_Premultiplied);
-    image.fill(Qt::transparent);
-    {
-        QPainter painter(&image);
-        painter.setRenderHint(QPainter::Antialiasing);
-        renderer.render(&painter, QRectF(QPointF(0, 0), points * scale));
-    }
-    image.setDevicePixelRatio(scale);
-    return image;
-}
 // The category the form pre-selects.
 const QString &defaultCategoryId()
 {
@@ -185,7 +168,7 @@ QImage ZafYouTubeActivity::_activitySettingsImage() const
     QSvgRenderer renderer(bundle + activityImageName() + QStringLiteral(".svg"));
     if (!renderer.isValid())
         return {};
-    return renderAtScreenScale(renderer, QSizeF(kSettingsIconPoints, kSettingsIconPoints));
+    return zaf::ui::Screen::renderAtMainScreenScale(renderer, QSizeF(kSettingsIconPoints, kSettingsIconPoints));
 }
 
 QString ZafYouTubeActivity::mediaShelfFrameworkBundle()
@@ -214,7 +197,7 @@ QImage ZafYouTubeActivity::mediaShelfImageNamed(const QString &name)
     const QSize points = renderer.defaultSize();
     if (!renderer.isValid() || points.isEmpty())
         return {};
-    return renderAtScreenScale(renderer, QSizeF(points));
+    return zaf::ui::Screen::renderAtMainScreenScale(renderer, QSizeF(points));
 }
 
 bool ZafYouTubeActivity::canPerformWithActivityItems(const QVariantList &activityItems)

@@ -1,6 +1,9 @@
 #include "platform/ui/screen.h"
 
 #include <QGuiApplication>
+#include <QPainter>
+#include <QSvgRenderer>
+#include <QtMath>
 #include <QScreen>
 
 namespace zaf::ui {
@@ -34,6 +37,21 @@ bool Device::canTellUserInterfaceIdiom()
 DeviceIdiom Device::userInterfaceIdiom()
 {
     return CapabilityService::shared().deviceIdiom();
+}
+
+QImage Screen::renderAtMainScreenScale(QSvgRenderer &renderer, const QSizeF &points)
+{
+    const double scale = mainScreenScale();
+    const QSize pixels(qCeil(points.width() * scale), qCeil(points.height() * scale));
+    QImage image(pixels, QImage::Format_ARGB32_Premultiplied);
+    image.fill(Qt::transparent);
+    {
+        QPainter painter(&image);
+        painter.setRenderHint(QPainter::Antialiasing);
+        renderer.render(&painter, QRectF(QPointF(0, 0), points * scale));
+    }
+    image.setDevicePixelRatio(scale);
+    return image;
 }
 
 } // namespace zaf::ui

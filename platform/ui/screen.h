@@ -5,7 +5,10 @@
 
 #include "platform/capability/capability_service.h"
 
+#include <QImage>
 #include <QRectF>
+
+class QSvgRenderer;
 
 namespace zaf::ui {
 
@@ -14,6 +17,9 @@ struct Screen {
     static QRectF mainScreenBounds();
     // The primary screen's device pixel ratio (1 without a screen).
     static double mainScreenScale();
+    // Renders an SVG so that its `points` rectangle fills a transparent image at the main screen's
+    // scale (the image's device pixel ratio is that scale).
+    static QImage renderAtMainScreenScale(QSvgRenderer &renderer, const QSizeF &points);
 };
 
 struct Device {
