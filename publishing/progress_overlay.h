@@ -2,12 +2,14 @@
 
 // ZafYouTubeActivityProgressOverlay: covers the publishing form while the upload runs. It dims
 // everything under it, shows a spinning activity indicator in its centre, and under the indicator
-// the upload's progress (a thin bar and a percentage). The overlay fades in and out over 0.2 s.
+// the upload's progress (a thin bar and a percentage) on a dark rounded panel. The overlay fades in
+// and out over 0.2 s.
 //
 // Showing sets up a dimming layer with the overlay's bounds and fades the overlay in; the indicator
 // and the progress display are created when that fade ends (also when another fade cut it short).
 // Hiding takes the indicator away, fades the overlay out and then removes the overlay from its
-// parent. Sizes and the centre are taken once, at set-up. Main thread only.
+// parent. The dimming layer takes the overlay's size at set-up; the indicator and the progress
+// display are centred on the overlay's bounds when they are created. Main thread only.
 
 #include "platform/ui/activity_indicator.h"
 
