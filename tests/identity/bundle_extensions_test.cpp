@@ -5,35 +5,47 @@
 namespace zaf::test {
 namespace {
 
+std::optional<QString> frameworkText(const char *key)
+{
+    return ZafBundleExtensions::_zafLocalizedStringFromFrameworkBundleWithKey(QString::fromLatin1(key));
+}
+
+// A framework bundle in a scratch directory. The process reads its place once, so every test (a
+// process of its own under ctest) sets it before the first lookup.
 class FrameworkBundleTest : public ::testing::Test {
 protected:
-    // A framework bundle in a scratch directory; the process reads its place once, so every test
-    // (a process of its own under ctest) sets it before the first lookup.
     void SetUp() override { qputenv("ZAF_FRAMEWORK_BUNDLE_PATH", QFile::encodeName(framework())); }
     QString framework() const { return scratch.file(QStringLiteral("Zafrel")); }
+    void writeText(const char *localization, const char *key, const char *text) const
+    {
+        writeTable(framework(), QString::fromLatin1(localization), QStringLiteral("Localizable"),
+                   {{QString::fromLatin1(key), QString::fromUtf8(text)}});
+    }
     ScratchDir scratch;
 };
 
+// A regional preference without its own folder is served by the bare language's folder.
 TEST_F(FrameworkBundleTest, RegionalLanguageFallsBackToTheBareLanguagesFolder)
 {
-    writeTable(framework(), QStringLiteral("en"), QStringLiteral("Localizable"), {{QStringLiteral("HELLO"), QStringLiteral("Hello")}});
-    writeTable(framework(), QStringLiteral("de"), QStringLiteral("Localizable"), {{QStringLiteral("HELLO"), QStringLiteral("Hallo")}});
+    writeText("en", "HELLO", "Hello");
+    writeText("de", "HELLO", "Hallo");
     bundle::setPreferredLanguagesForTesting({QStringLiteral("de-AT"), QStringLiteral("en")});
     ASSERT_TRUE(ZafBundleExtensions::fallbackBundle());
     EXPECT_TRUE(ZafBundleExtensions::fallbackBundle()->bundlePath().endsWith(QStringLiteral("de.lproj")));
-    EXPECT_EQ(ZafBundleExtensions::_zafLocalizedStringFromFrameworkBundleWithKey(QStringLiteral("HELLO")), QStringLiteral("Hallo"));
+    EXPECT_EQ(frameworkText("HELLO"), QStringLiteral("Hallo"));
     bundle::setPreferredLanguagesForTesting({QStringLiteral("en-GB")});
-    EXPECT_EQ(ZafBundleExtensions::_zafLocalizedStringFromFrameworkBundleWithKey(QStringLiteral("HELLO")), QStringLiteral("Hello"));
+    EXPECT_EQ(frameworkText("HELLO"), QStringLiteral("Hello"));
 }
 
+// The chosen localization answers alone: a key it lacks comes back as the key.
 TEST_F(FrameworkBundleTest, KeyMissingFromTheChosenLocalizationComesBackAsTheKey)
 {
-    writeTable(framework(), QStringLiteral("pt_BR"), QStringLiteral("Localizable"), {{QStringLiteral("OTHER"), QStringLiteral("Outro")}});
-    writeTable(framework(), QStringLiteral("pt"), QStringLiteral("Localizable"), {{QStringLiteral("HELLO"), QStringLiteral("Olá")}});
+    writeText("pt_BR", "OTHER", "Outro");
+    writeText("pt", "HELLO", "Olá");
     bundle::setPreferredLanguagesForTesting({QStringLiteral("pt-BR")});
     ASSERT_TRUE(ZafBundleExtensions::localizedBundle());
     EXPECT_TRUE(ZafBundleExtensions::localizedBundle()->bundlePath().endsWith(QStringLiteral("pt_BR.lproj")));
-    EXPECT_EQ(ZafBundleExtensions::_zafLocalizedStringFromFrameworkBundleWithKey(QStringLiteral("HELLO")), QStringLiteral("HELLO"));
+    EXPECT_EQ(frameworkText("HELLO"), QStringLiteral("HELLO"));
 }
 
 TEST_F(FrameworkBundleTest, WithoutLocalizationFoldersTheFrameworkBundleAnswers)
@@ -42,29 +54,30 @@ TEST_F(FrameworkBundleTest, WithoutLocalizationFoldersTheFrameworkBundleAnswers)
     bundle::setPreferredLanguagesForTesting({QStringLiteral("fr")});
     EXPECT_FALSE(ZafBundleExtensions::localizedBundle());
     EXPECT_FALSE(ZafBundleExtensions::fallbackBundle());
-    EXPECT_EQ(ZafBundleExtensions::_zafLocalizedStringFromFrameworkBundleWithKey(QStringLiteral("HELLO")), QStringLiteral("HELLO"));
+    EXPECT_EQ(frameworkText("HELLO"), QStringLiteral("HELLO"));
 }
 
 TEST_F(FrameworkBundleTest, MissingFrameworkBundleAnswersNothing)
 {
     EXPECT_FALSE(ZafBundleExtensions::_zafFrameworkBundle());
-    EXPECT_FALSE(ZafBundleExtensions::_zafLocalizedStringFromFrameworkBundleWithKey(QStringLiteral("HELLO")).has_value());
+    EXPECT_FALSE(frameworkText("HELLO").has_value());
 }
 
+// The shipped share text takes the name and the author in every shipped language.
 TEST(ShippedFrameworkBundle, ShareTextTakesTheNameAndTheAuthorInEveryLanguage)
 {
     qputenv("ZAF_FRAMEWORK_BUNDLE_PATH", ZAF_SHIPPED_FRAMEWORK_BUNDLE);
     for (const char *language : {"en", "de", "fr", "es", "ja"}) {
         bundle::setPreferredLanguagesForTesting({QString::fromLatin1(language)});
-        const std::optional<QString> format =
-            ZafBundleExtensions::_zafLocalizedStringFromFrameworkBundleWithKey(QStringLiteral("SHARE_TEXT_FORMAT"));
-        ASSERT_TRUE(format.has_value());
-        EXPECT_TRUE(format->contains(QStringLiteral("%1$@")) && format->contains(QStringLiteral("%2$@")))
-            << language << ": " << format->toStdString();
+        const QString format = frameworkText("SHARE_TEXT_FORMAT").value_or(QString());
+        EXPECT_TRUE(format.contains(QStringLiteral("%1$@")) && format.contains(QStringLiteral("%2$@")))
+            << language << ": " << format.toStdString();
     }
 }
 
-TEST(BundleNames, DisplayNamePrecedenceAndUnknownIdentifiers)
+// Display names: the localized name first, then the plain one; an unknown identifier has none and a
+// bundle without any name gives "". The base identifier drops the last component.
+TEST(BundleNames, DisplayNamePrecedenceUnknownIdentifiersAndBaseIdentifier)
 {
     ScratchDir scratch;
     const QString data = scratch.file(QStringLiteral("data"));
@@ -77,16 +90,11 @@ TEST(BundleNames, DisplayNamePrecedenceAndUnknownIdentifiers)
     EXPECT_EQ(ZafBundleExtensions::_zafLocalizedAppNameFromBundleID(QStringLiteral("org.example.Localized")), QStringLiteral("Aufnahme"));
     EXPECT_EQ(ZafBundleExtensions::_zafLocalizedAppNameFromBundleID(QStringLiteral("org.example.Plain")), QStringLiteral("Plain Recorder"));
     EXPECT_FALSE(ZafBundleExtensions::_zafLocalizedAppNameFromBundleID(QStringLiteral("org.example.Unknown")).has_value());
-
-    // A bundle without any name gives "", never none.
     QDir().mkpath(scratch.file(QStringLiteral("Nameless")));
     const auto nameless = bundle::Bundle::bundleWithPath(scratch.file(QStringLiteral("Nameless")));
     ASSERT_TRUE(nameless);
     EXPECT_EQ(ZafBundleExtensions::_zafLocalizedAppName(*nameless), QStringLiteral(""));
-}
 
-TEST(BundleNames, BaseIdentifierDropsTheLastComponent)
-{
     EXPECT_EQ(ZafBundleExtensions::baseIdentifier(QStringLiteral("com.example.app")), QStringLiteral("com.example"));
     EXPECT_EQ(ZafBundleExtensions::baseIdentifier(QStringLiteral("app")), QStringLiteral(""));
     EXPECT_EQ(ZafBundleExtensions::baseIdentifier(QStringLiteral("com.example.")), QStringLiteral("com.example"));

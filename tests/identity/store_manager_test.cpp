@@ -3,14 +3,12 @@
 #include "identity/store_manager.h"
 
 #include "platform/store/store_lookup.h"
+#include "tests/identity/identity_test_support.h"
 #include "tests/platform/store/catalogue_fixture.h"
 #include "tests/support/log_capture.h"
 
 #include <QCoreApplication>
 #include <QDeadlineTimer>
-#include <QDir>
-#include <QFile>
-#include <QTemporaryDir>
 #include <QThread>
 
 #include <gtest/gtest.h>
@@ -22,160 +20,101 @@ using zaf::test::CatalogueDirectory;
 
 namespace {
 
-struct Delivery {
-    int calls = 0;
-    bool onMainThread = false;
-    std::optional<ZafStoreInfo> info;
+// What a record must hold; categories absent when not given.
+struct Expected {
+    std::optional<QString> appName;
+    QString author;
+    QString itemURL;
+    std::optional<QStringList> categories = std::nullopt;
 };
 
-// Local applications: desktop entries in a data directory of the test's own, nothing else.
-class LocalApplications {
-public:
-    LocalApplications()
-    {
-        QDir(m_home.path()).mkpath(QStringLiteral("applications"));
-        qputenv("XDG_DATA_HOME", m_home.path().toUtf8());
-        qputenv("XDG_DATA_DIRS", m_empty.path().toUtf8());
-    }
-    void add(const QString &identifier, const QString &name) const
-    {
-        QFile entry(QDir(m_home.path()).filePath(QStringLiteral("applications/%1.desktop").arg(identifier)));
-        ASSERT_TRUE(entry.open(QIODevice::WriteOnly));
-        entry.write(QStringLiteral("[Desktop Entry]\nType=Application\nName=%1\nExec=%2\n")
-                        .arg(name, identifier.section(QLatin1Char('.'), -1).toLower())
-                        .toUtf8());
-    }
-
-private:
-    QTemporaryDir m_home;
-    QTemporaryDir m_empty;
-};
+template <typename Done>
+void runEventLoopUntil(Done done, int milliseconds = 20000)
+{
+    QDeadlineTimer deadline(milliseconds);
+    while (!done() && !deadline.hasExpired())
+        QCoreApplication::processEvents(QEventLoop::AllEvents | QEventLoop::WaitForMoreEvents, 20);
+}
 
 class StoreManagerTest : public ::testing::Test {
 protected:
+    // Three local applications in a data directory of the test's own, and the fixture catalogue.
     void SetUp() override
     {
+        qputenv("XDG_DATA_HOME", m_home.path().toUtf8());
+        qputenv("XDG_DATA_DIRS", m_empty.path().toUtf8());
+        for (const char *name : {"Nameless", "LocalOnly", "Recorder"})
+            zaf::test::writeDesktopEntry(m_home.path(), QStringLiteral("org.zafrel.") + QLatin1String(name),
+                                         QStringLiteral("Name=Local %1\nExec=true\n").arg(QLatin1String(name)));
         m_dir.write(QStringLiteral("fixture.xml"), zaf::test::kFixtureCollection);
-        m_local.add(QStringLiteral("org.zafrel.Nameless"), QStringLiteral("Local Nameless"));
-        m_local.add(QStringLiteral("org.zafrel.LocalOnly"), QStringLiteral("Local Only"));
-        m_local.add(QStringLiteral("org.zafrel.Recorder"), QStringLiteral("Local Recorder"));
     }
 
-    std::shared_ptr<Catalogue> fixtureCatalogue() const
-    {
-        return Catalogue::loadFromDirectory(m_dir.path(), QStringLiteral("en_US"));
-    }
+    std::shared_ptr<Catalogue> fixtureCatalogue() const { return Catalogue::loadFromDirectory(m_dir.path(), QStringLiteral("en_US")); }
 
-    // Starts the lookup, checks that nothing is delivered before the call returns, then runs the
-    // event loop until the completion has run and a little beyond (to see a second call).
-    static std::shared_ptr<Delivery> load(const ZafStoreManager &manager, const QString &identifier)
+    // Looks `identifier` up: nothing is delivered before the call returns, then exactly one record
+    // on the main thread (the loop runs a little beyond the first to see a second one).
+    static void expectRecord(const ZafStoreManager &manager, const QString &identifier, const Expected &expected)
     {
-        auto delivery = std::make_shared<Delivery>();
-        manager.loadItemDetailsForBundleIdentifier(identifier, [delivery](const ZafStoreInfo &info) {
-            ++delivery->calls;
-            delivery->onMainThread = QThread::currentThread() == QCoreApplication::instance()->thread();
-            delivery->info = info;
+        SCOPED_TRACE(identifier.toStdString());
+        int calls = 0;
+        bool onMainThread = false;
+        std::optional<ZafStoreInfo> info;
+        manager.loadItemDetailsForBundleIdentifier(identifier, [&](const ZafStoreInfo &delivered) {
+            ++calls;
+            onMainThread = QThread::currentThread() == QCoreApplication::instance()->thread();
+            info = delivered;
         });
-        EXPECT_EQ(delivery->calls, 0);
-        runEventLoopUntil([&] { return delivery->calls > 0; });
+        EXPECT_EQ(calls, 0);
+        runEventLoopUntil([&] { return calls > 0; });
         runEventLoopUntil([] { return false; }, 100);
-        return delivery;
+        ASSERT_EQ(calls, 1);
+        EXPECT_TRUE(onMainThread);
+        EXPECT_EQ(info->bundleID(), identifier);
+        EXPECT_EQ(info->appName(), expected.appName);
+        EXPECT_EQ(info->author(), expected.author);
+        EXPECT_EQ(info->itemURL(), expected.itemURL);
+        EXPECT_EQ(info->categories(), expected.categories);
     }
 
-    template <typename Done>
-    static void runEventLoopUntil(Done done, int milliseconds = 20000)
-    {
-        QDeadlineTimer deadline(milliseconds);
-        while (!done() && !deadline.hasExpired())
-            QCoreApplication::processEvents(QEventLoop::AllEvents | QEventLoop::WaitForMoreEvents, 20);
-    }
-
-    LocalApplications m_local;
+    QTemporaryDir m_home;
+    QTemporaryDir m_empty;
     CatalogueDirectory m_dir;
 };
 
 } // namespace
 
-TEST_F(StoreManagerTest, Load_KnownIdentifier_FillsEveryFieldFromTheStore)
+// Store fields come from the catalogue, the name from it or else from the local entry; what the
+// store does not know is an empty author and link, and no name without a local entry.
+TEST_F(StoreManagerTest, RecordsCombineTheStoreAndTheLocalEntries)
 {
-    const auto delivery = load(ZafStoreManager(fixtureCatalogue()), QStringLiteral("org.zafrel.Recorder"));
-    ASSERT_EQ(delivery->calls, 1);
-    EXPECT_TRUE(delivery->onMainThread);
-    const ZafStoreInfo &info = *delivery->info;
-    EXPECT_EQ(info.bundleID(), QStringLiteral("org.zafrel.Recorder"));
-    EXPECT_EQ(info.appName(), QStringLiteral("Zafrel Recorder"));
-    EXPECT_EQ(info.author(), QStringLiteral("Zafrel Labs"));
-    EXPECT_EQ(info.itemURL(), QStringLiteral("appstream://org.zafrel.Recorder"));
-    EXPECT_EQ(info.categories(), (QStringList{QStringLiteral("AudioVideo"), QStringLiteral("Recorder")}));
+    const ZafStoreManager manager(fixtureCatalogue());
+    expectRecord(manager, QStringLiteral("org.zafrel.Recorder"),
+                 {QStringLiteral("Zafrel Recorder"), QStringLiteral("Zafrel Labs"), QStringLiteral("appstream://org.zafrel.Recorder"),
+                  QStringList{QStringLiteral("AudioVideo"), QStringLiteral("Recorder")}});
+    expectRecord(manager, QStringLiteral("org.zafrel.Nameless"),
+                 {QStringLiteral("Local Nameless"), QStringLiteral("Nameless Works"), QStringLiteral("appstream://org.zafrel.Nameless")});
+    expectRecord(manager, QStringLiteral("org.zafrel.LocalOnly"), {QStringLiteral("Local LocalOnly"), QString(""), QString("")});
+    expectRecord(manager, QStringLiteral("org.zafrel.Nowhere"), {std::nullopt, QString(""), QString("")});
 }
 
-TEST_F(StoreManagerTest, Load_UnknownIdentifierWithLocalEntry_TakesTheLocalNameAndEmptyStoreFields)
-{
-    const auto delivery = load(ZafStoreManager(fixtureCatalogue()), QStringLiteral("org.zafrel.LocalOnly"));
-    ASSERT_EQ(delivery->calls, 1);
-    EXPECT_TRUE(delivery->onMainThread);
-    const ZafStoreInfo &info = *delivery->info;
-    EXPECT_EQ(info.bundleID(), QStringLiteral("org.zafrel.LocalOnly"));
-    EXPECT_EQ(info.appName(), QStringLiteral("Local Only"));
-    EXPECT_EQ(info.author(), QStringLiteral(""));
-    EXPECT_EQ(info.itemURL(), QStringLiteral(""));
-    EXPECT_FALSE(info.categories().has_value());
-}
-
-TEST_F(StoreManagerTest, Load_UnknownIdentifierWithoutLocalEntry_LeavesAppNameAbsent)
-{
-    const auto delivery = load(ZafStoreManager(fixtureCatalogue()), QStringLiteral("org.zafrel.Nowhere"));
-    ASSERT_EQ(delivery->calls, 1);
-    const ZafStoreInfo &info = *delivery->info;
-    EXPECT_EQ(info.bundleID(), QStringLiteral("org.zafrel.Nowhere"));
-    EXPECT_FALSE(info.appName().has_value());
-    const QVariantMap dictionary = info.dictionary();
-    EXPECT_EQ(dictionary.keys(), (QStringList{ZafStoreInfoAuthorKey, ZafStoreInfoBundleIDKey, ZafStoreInfoItemURLKey}));
-}
-
-TEST_F(StoreManagerTest, Load_ComponentWithoutName_TakesTheLocalNameAndTheStoreAuthor)
-{
-    const auto delivery = load(ZafStoreManager(fixtureCatalogue()), QStringLiteral("org.zafrel.Nameless"));
-    ASSERT_EQ(delivery->calls, 1);
-    const ZafStoreInfo &info = *delivery->info;
-    EXPECT_EQ(info.appName(), QStringLiteral("Local Nameless"));
-    EXPECT_EQ(info.author(), QStringLiteral("Nameless Works"));
-    EXPECT_EQ(info.itemURL(), QStringLiteral("appstream://org.zafrel.Nameless"));
-    EXPECT_FALSE(info.categories().has_value());
-}
-
-TEST_F(StoreManagerTest, Load_CorruptCatalogue_IsLoggedAndStillDeliversARecord)
+// A corrupt catalogue is logged once and a missing one answers at once; either way a record with
+// the local name is still delivered on the main thread.
+TEST_F(StoreManagerTest, UnreadableCataloguesStillDeliverARecord)
 {
     CatalogueDirectory corrupt(QStringLiteral("corrupt"));
     corrupt.write(QStringLiteral("corrupt.xml"), zaf::test::kCorruptCollection);
     zaf::test::LogCapture log;
-    const ZafStoreManager manager(Catalogue::loadFromDirectory(corrupt.path(), QStringLiteral("en_US")));
+    const ZafStoreManager corrupted(Catalogue::loadFromDirectory(corrupt.path(), QStringLiteral("en_US")));
     EXPECT_EQ(log.messages(QStringLiteral("zaf.store")).size(), 1);
+    expectRecord(corrupted, QStringLiteral("org.zafrel.Recorder"), {QStringLiteral("Local Recorder"), QString(""), QString("")});
 
-    const auto delivery = load(manager, QStringLiteral("org.zafrel.Recorder"));
-    ASSERT_EQ(delivery->calls, 1);
-    EXPECT_TRUE(delivery->onMainThread);
-    EXPECT_EQ(delivery->info->bundleID(), QStringLiteral("org.zafrel.Recorder"));
-    EXPECT_EQ(delivery->info->appName(), QStringLiteral("Local Recorder"));
-    EXPECT_EQ(delivery->info->author(), QStringLiteral(""));
-    EXPECT_EQ(delivery->info->itemURL(), QStringLiteral(""));
-    EXPECT_FALSE(delivery->info->categories().has_value());
-}
-
-TEST_F(StoreManagerTest, Load_LookupThatFailsAtOnce_StillCompletesOnTheMainThread)
-{
     const QString missing = QDir::temp().filePath(QStringLiteral("zaf-store-fixtures/missing-catalogue"));
     QDir(missing).removeRecursively();
-    const ZafStoreManager manager(Catalogue::loadFromDirectory(missing));
-
-    const auto delivery = load(manager, QStringLiteral("org.zafrel.Nameless"));
-    ASSERT_EQ(delivery->calls, 1);
-    EXPECT_TRUE(delivery->onMainThread);
-    EXPECT_EQ(delivery->info->appName(), QStringLiteral("Local Nameless"));
-    EXPECT_EQ(delivery->info->author(), QStringLiteral(""));
+    expectRecord(ZafStoreManager(Catalogue::loadFromDirectory(missing)), QStringLiteral("org.zafrel.Nameless"),
+                 {QStringLiteral("Local Nameless"), QString(""), QString("")});
 }
 
-TEST_F(StoreManagerTest, Load_WithoutCompletion_IsLoggedAndIgnored)
+TEST_F(StoreManagerTest, LoadWithoutCompletionIsLoggedAndIgnored)
 {
     zaf::test::LogCapture log;
     ZafStoreManager(fixtureCatalogue()).loadItemDetailsForBundleIdentifier(QStringLiteral("org.zafrel.Recorder"), {});
@@ -186,16 +125,10 @@ TEST_F(StoreManagerTest, Load_WithoutCompletion_IsLoggedAndIgnored)
 
 // The only test of this program that uses the shared manager, so the catalogue directory it names
 // is the one the process-wide catalogue is loaded from.
-TEST_F(StoreManagerTest, SharedManager_IsOneInstanceAnsweringFromTheProcessCatalogue)
+TEST_F(StoreManagerTest, SharedManagerIsOneInstanceAnsweringFromTheProcessCatalogue)
 {
     qputenv(zaf::store::kCatalogDirEnvironmentVariable, m_dir.path().toUtf8());
     ZafStoreManager &manager = ZafStoreManager::sharedManager();
     EXPECT_EQ(&manager, &ZafStoreManager::sharedManager());
-
-    const auto delivery = load(manager, QStringLiteral("org.zafrel.Plain"));
-    ASSERT_EQ(delivery->calls, 1);
-    EXPECT_TRUE(delivery->onMainThread);
-    EXPECT_EQ(delivery->info->appName(), QStringLiteral("Plain App"));
-    EXPECT_EQ(delivery->info->author(), QStringLiteral(""));
-    EXPECT_EQ(delivery->info->itemURL(), QStringLiteral("appstream://org.zafrel.Plain"));
+    expectRecord(manager, QStringLiteral("org.zafrel.Plain"), {QStringLiteral("Plain App"), QString(""), QStringLiteral("appstream://org.zafrel.Plain")});
 }

@@ -1,12 +1,13 @@
+// The progress overlay over the publishing form: its fades, the indicator made when the fade-in
+// ends, the progress display under it and the removal when it hides.
 #include "publishing/progress_overlay.h"
 
 #include "platform/ui/activity_indicator.h"
 #include "platform/ui/view_animation.h"
 
-#include <QElapsedTimer>
+#include <QEventLoop>
 #include <QLabel>
 #include <QProgressBar>
-#include <QEventLoop>
 #include <QTimer>
 #include <QWidget>
 #include <gtest/gtest.h>
@@ -14,11 +15,13 @@
 #include <memory>
 
 using zaf::ui::ActivityIndicator;
+using zaf::ui::superview;
 
 namespace {
 
-// Runs the event loop for `ms` milliseconds, so timers and animations advance.
-void waitMs(int ms)
+// Runs the event loop for `ms` milliseconds (by default past the 0.2 s fade, with room for a loaded
+// machine), so timers and animations advance.
+void waitMs(int ms = 300)
 {
     QEventLoop loop;
     QTimer::singleShot(ms, &loop, &QEventLoop::quit);
@@ -40,18 +43,10 @@ protected:
     {
         int count = 0;
         for (QWidget *child : m_overlay->findChildren<QWidget *>(Qt::FindDirectChildrenOnly))
-            if (child->objectName() == QLatin1String("progressOverlayDimming"))
-                ++count;
+            count += child->objectName() == QLatin1String("progressOverlayDimming") ? 1 : 0;
         return count;
     }
-
-    int indicators() const
-    {
-        return int(m_overlay->findChildren<ActivityIndicator *>(Qt::FindDirectChildrenOnly).size());
-    }
-
-    // Past the 0.2 s fade, with room for a loaded machine.
-    static void waitPastFade() { waitMs(300); }
+    int indicators() const { return int(m_overlay->findChildren<ActivityIndicator *>(Qt::FindDirectChildrenOnly).size()); }
 
     std::unique_ptr<QWidget> m_host;
     ZafYouTubeActivityProgressOverlay *m_overlay = nullptr;
@@ -59,206 +54,126 @@ protected:
 
 } // namespace
 
-TEST_F(ProgressOverlayTest, StartsHiddenWithoutIndicator)
-{
-    EXPECT_FALSE(m_overlay->isShowing());
-    EXPECT_EQ(m_overlay->activityIndicator(), nullptr);
-    EXPECT_EQ(m_overlay->dimmingView(), nullptr);
-    EXPECT_EQ(m_overlay->geometry(), m_host->rect());
-}
-
-TEST_F(ProgressOverlayTest, SetupDimsWithHalfBlackAndFadesIn)
-{
-    m_overlay->setShowingAnimated(true, true);
-    EXPECT_TRUE(m_overlay->isShowing());
-    QWidget *dimming = m_overlay->dimmingView();
-    ASSERT_NE(dimming, nullptr);
-    EXPECT_EQ(dimming->geometry(), QRect(0, 0, 320, 480));
-    EXPECT_TRUE(dimming->autoFillBackground());
-    const QColor colour = dimming->palette().color(QPalette::Window);
-    EXPECT_EQ(colour.red(), 0);
-    EXPECT_EQ(colour.green(), 0);
-    EXPECT_EQ(colour.blue(), 0);
-    EXPECT_NEAR(colour.alphaF(), 0.5, 0.01);
-    // The target alpha is 1; what is shown starts at 0.
-    EXPECT_DOUBLE_EQ(zaf::ui::alpha(m_overlay), 1.0);
-    EXPECT_LT(zaf::ui::presentationAlpha(m_overlay), 0.5);
-    waitPastFade();
-    EXPECT_DOUBLE_EQ(zaf::ui::presentationAlpha(m_overlay), 1.0);
-}
-
+// Showing twice sets up one half-black dimming layer over the frame and fades in from 0; when the
+// fade ends one spinning indicator sits centred above it, the progress bar under it.
 TEST_F(ProgressOverlayTest, ShowingTwiceMakesOneDimmingLayerAndOneIndicator)
 {
     m_overlay->setShowingAnimated(true, true);
     m_overlay->setShowingAnimated(true, true);
+    EXPECT_TRUE(m_overlay->isShowing());
+    ASSERT_NE(m_overlay->dimmingView(), nullptr);
     EXPECT_EQ(dimmingLayers(), 1);
-    waitPastFade();
+    EXPECT_EQ(m_overlay->dimmingView()->geometry(), QRect(0, 0, 320, 480));
+    EXPECT_EQ(m_overlay->dimmingView()->palette().color(QPalette::Window).rgb(), qRgb(0, 0, 0));
+    EXPECT_NEAR(m_overlay->dimmingView()->palette().color(QPalette::Window).alphaF(), 0.5, 0.01);
+    EXPECT_DOUBLE_EQ(zaf::ui::alpha(m_overlay), 1.0);
+    EXPECT_LT(zaf::ui::presentationAlpha(m_overlay), 0.5);
+    EXPECT_EQ(m_overlay->activityIndicator(), nullptr);
+
+    waitMs();
+    EXPECT_DOUBLE_EQ(zaf::ui::presentationAlpha(m_overlay), 1.0);
     m_overlay->setShowingAnimated(true, false);
-    waitPastFade();
+    waitMs();
     EXPECT_EQ(dimmingLayers(), 1);
     EXPECT_EQ(indicators(), 1);
-    ASSERT_NE(m_overlay->activityIndicator(), nullptr);
-}
-
-TEST_F(ProgressOverlayTest, IndicatorAppearsWhenFadeInEnds)
-{
-    m_overlay->setShowingAnimated(true, true);
-    EXPECT_EQ(m_overlay->activityIndicator(), nullptr);
-    waitPastFade();
     ActivityIndicator *indicator = m_overlay->activityIndicator();
     ASSERT_NE(indicator, nullptr);
-    EXPECT_EQ(indicator->style(), ActivityIndicator::LargeWhite);
     EXPECT_TRUE(indicator->isAnimating());
-    EXPECT_EQ(zaf::ui::superview(indicator), m_overlay);
     EXPECT_TRUE(indicator->isVisible());
-    // Above the dimming layer.
-    const QObjectList &children = m_overlay->children();
-    EXPECT_GT(children.indexOf(indicator), children.indexOf(m_overlay->dimmingView()));
+    EXPECT_GT(m_overlay->children().indexOf(indicator), m_overlay->children().indexOf(m_overlay->dimmingView()));
+    EXPECT_NEAR(indicator->center().x(), 160.0, 0.5);
+    EXPECT_NEAR(indicator->center().y(), 240.0, 0.5);
+    ASSERT_NE(m_overlay->progressBar(), nullptr);
+    EXPECT_GT(m_overlay->progressBar()->geometry().top(), indicator->geometry().bottom());
 }
 
-TEST_F(ProgressOverlayTest, NotAnimatedStillTakesTheWholeFade)
-{
-    QElapsedTimer clock;
-    clock.start();
-    m_overlay->setShowingAnimated(true, false);
-    EXPECT_EQ(m_overlay->activityIndicator(), nullptr);
-    waitMs(100);
-    if (clock.elapsed() < 180) {
-        EXPECT_EQ(m_overlay->activityIndicator(), nullptr);
-    }
-    waitMs(150);
-    EXPECT_NE(m_overlay->activityIndicator(), nullptr);
-}
-
+// Before the indicator exists stopActivity does nothing, so the fade-in still brings it on screen.
 TEST_F(ProgressOverlayTest, StopActivityDuringFadeInDoesNothing)
 {
     m_overlay->setShowingAnimated(true, true);
     m_overlay->stopActivity();
     EXPECT_EQ(m_overlay->activityIndicator(), nullptr);
-    waitPastFade();
+    waitMs();
     ASSERT_NE(m_overlay->activityIndicator(), nullptr);
-    EXPECT_EQ(zaf::ui::superview(m_overlay->activityIndicator()), m_overlay);
+    EXPECT_EQ(superview(m_overlay->activityIndicator()), m_overlay);
     EXPECT_TRUE(m_overlay->activityIndicator()->isVisible());
 }
 
+// Afterwards it takes only the indicator off the screen; dimming, progress and overlay stay.
 TEST_F(ProgressOverlayTest, StopActivityRemovesOnlyTheIndicator)
 {
     m_overlay->setShowingAnimated(true, true);
-    m_overlay->setProgress(0.3);
-    waitPastFade();
+    waitMs();
     ActivityIndicator *indicator = m_overlay->activityIndicator();
     ASSERT_NE(indicator, nullptr);
     m_overlay->stopActivity();
-    // The property keeps the indicator; it is just off the screen.
     EXPECT_EQ(m_overlay->activityIndicator(), indicator);
-    EXPECT_EQ(zaf::ui::superview(indicator), nullptr);
-    EXPECT_FALSE(indicator->isVisible());
+    EXPECT_EQ(superview(indicator), nullptr);
     EXPECT_FALSE(indicator->isRotationTimerActive());
-    // Dimming and progress stay, and so does the overlay.
     EXPECT_TRUE(m_overlay->dimmingView()->isVisible());
-    ASSERT_NE(m_overlay->progressLabel(), nullptr);
-    EXPECT_TRUE(m_overlay->progressLabel()->isVisible());
     EXPECT_TRUE(m_overlay->progressBar()->isVisible());
-    EXPECT_EQ(zaf::ui::superview(m_overlay), m_host.get());
     EXPECT_TRUE(m_overlay->isShowing());
 }
 
-TEST_F(ProgressOverlayTest, IndicatorIsCentred)
+// Not animated, the fade still runs: the indicator is placed by the bounds at its end and stays
+// there; the dimming keeps the bounds of the set-up.
+TEST_F(ProgressOverlayTest, IndicatorIsPlacedOnceWhenTheFadeInEnds)
 {
-    m_overlay->setShowingAnimated(true, true);
-    waitPastFade();
-    ActivityIndicator *indicator = m_overlay->activityIndicator();
-    ASSERT_NE(indicator, nullptr);
-    EXPECT_EQ(indicator->size(), QSize(37, 37));
-    EXPECT_NEAR(indicator->center().x(), 160.0, 0.5);
-    EXPECT_NEAR(indicator->center().y(), 240.0, 0.5);
-    // The progress display lies under it, on the same vertical line.
-    QProgressBar *bar = m_overlay->progressBar();
-    ASSERT_NE(bar, nullptr);
-    EXPECT_GT(bar->geometry().top(), indicator->geometry().bottom());
-    EXPECT_NEAR(bar->geometry().center().x(), 160.0, 1.0);
-    EXPECT_GT(m_overlay->progressLabel()->geometry().top(), bar->geometry().bottom());
-}
-
-TEST_F(ProgressOverlayTest, CentreIsTakenOnceAtSetUp)
-{
-    m_overlay->setShowingAnimated(true, true);
+    m_overlay->setShowingAnimated(true, false);
     m_overlay->resize(600, 600);
-    waitPastFade();
-    // The fade-in completion reads the bounds as they are when it runs.
+    EXPECT_EQ(m_overlay->activityIndicator(), nullptr);
+    waitMs();
     ASSERT_NE(m_overlay->activityIndicator(), nullptr);
     EXPECT_NEAR(m_overlay->activityIndicator()->center().x(), 300.0, 0.5);
-    // The dimming keeps the bounds of the set-up.
     EXPECT_EQ(m_overlay->dimmingView()->size(), QSize(320, 480));
     m_overlay->resize(100, 100);
     EXPECT_NEAR(m_overlay->activityIndicator()->center().x(), 300.0, 0.5);
 }
 
-TEST_F(ProgressOverlayTest, TearDownRemovesOverlayFromParentAfterFade)
+// Hiding takes the indicator away at once and removes the overlay from its parent after the fade;
+// hiding during the fade-in leaves the indicator it still makes off the screen.
+TEST_F(ProgressOverlayTest, HidingRemovesTheOverlayAfterItsFade)
 {
-    m_overlay->setShowingAnimated(true, true);
-    waitPastFade();
-    ActivityIndicator *indicator = m_overlay->activityIndicator();
-    ASSERT_NE(indicator, nullptr);
-
-    m_overlay->setShowingAnimated(false, false);
-    EXPECT_FALSE(m_overlay->isShowing());
-    // The indicator goes at once; the overlay stays until its fade-out ends.
-    EXPECT_EQ(zaf::ui::superview(indicator), nullptr);
-    EXPECT_EQ(m_overlay->activityIndicator(), indicator);
-    EXPECT_EQ(zaf::ui::superview(m_overlay), m_host.get());
-    EXPECT_DOUBLE_EQ(zaf::ui::alpha(m_overlay), 0.0);
-    waitPastFade();
-    EXPECT_EQ(zaf::ui::superview(m_overlay), nullptr);
-    EXPECT_FALSE(m_overlay->isVisible());
+    for (int shownMs : {300, 50}) {
+        SCOPED_TRACE(shownMs);
+        SetUp();
+        m_overlay->setShowingAnimated(true, true);
+        waitMs(shownMs);
+        m_overlay->setShowingAnimated(false, shownMs < 300);
+        EXPECT_FALSE(m_overlay->isShowing());
+        ASSERT_NE(m_overlay->activityIndicator(), nullptr);
+        EXPECT_EQ(superview(m_overlay->activityIndicator()), nullptr);
+        EXPECT_EQ(superview(m_overlay), m_host.get());
+        EXPECT_DOUBLE_EQ(zaf::ui::alpha(m_overlay), 0.0);
+        waitMs();
+        EXPECT_EQ(superview(m_overlay), nullptr);
+        EXPECT_FALSE(m_overlay->isVisible());
+        EXPECT_EQ(indicators(), 1);
+    }
 }
 
-TEST_F(ProgressOverlayTest, TearDownDuringFadeInLeavesNoIndicatorOnScreen)
+// Progress set before the display exists is kept; the text rounds down, clamps at 100 % and is
+// empty (with a busy bar) when the total is unknown.
+TEST_F(ProgressOverlayTest, ProgressDisplayFollowsSetProgress)
 {
-    m_overlay->setShowingAnimated(true, true);
-    waitMs(50);
-    m_overlay->setShowingAnimated(false, true);
-    // The cut-short fade-in still made its indicator, but hiding keeps it off the screen.
-    ASSERT_NE(m_overlay->activityIndicator(), nullptr);
-    EXPECT_EQ(zaf::ui::superview(m_overlay->activityIndicator()), nullptr);
-    EXPECT_EQ(zaf::ui::superview(m_overlay), m_host.get());
-    waitPastFade();
-    EXPECT_EQ(zaf::ui::superview(m_overlay), nullptr);
-    EXPECT_EQ(indicators(), 1);
-}
-
-TEST_F(ProgressOverlayTest, ProgressTextFollowsSetProgress)
-{
-    m_overlay->setProgress(0.25);   // before the display exists: kept
+    m_overlay->setProgress(0.25);
     EXPECT_EQ(m_overlay->progressLabel(), nullptr);
     m_overlay->setShowingAnimated(true, true);
-    waitPastFade();
+    waitMs();
     QLabel *label = m_overlay->progressLabel();
     QProgressBar *bar = m_overlay->progressBar();
     ASSERT_NE(label, nullptr);
-    ASSERT_NE(bar, nullptr);
     EXPECT_EQ(label->text(), QStringLiteral("25 %"));
-    EXPECT_EQ(bar->maximum(), 1000);
-    EXPECT_EQ(bar->value(), 250);
-
+    EXPECT_EQ(bar->value(), bar->maximum() / 4);
     m_overlay->setProgress(0.5);
     EXPECT_EQ(label->text(), QStringLiteral("50 %"));
-    EXPECT_EQ(bar->value(), 500);
-
+    EXPECT_EQ(bar->value(), bar->maximum() / 2);
     m_overlay->setProgress(1.7);
     EXPECT_EQ(label->text(), QStringLiteral("100 %"));
     EXPECT_DOUBLE_EQ(m_overlay->progress(), 1.0);
-
     m_overlay->setProgress(-1.0);
     EXPECT_TRUE(label->text().isEmpty());
-    EXPECT_EQ(bar->maximum(), 0);   // busy bar for an unknown total
-}
-
-TEST(ProgressOverlayTextTest, PercentagesRoundDown)
-{
-    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.0), QStringLiteral("0 %"));
-    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.999), QStringLiteral("99 %"));
+    EXPECT_EQ(bar->maximum(), 0);
     EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.29), QStringLiteral("29 %"));
-    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(1.0), QStringLiteral("100 %"));
-    EXPECT_TRUE(ZafYouTubeActivityProgressOverlay::progressText(-0.5).isEmpty());
+    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.999), QStringLiteral("99 %"));
 }

@@ -6,23 +6,18 @@
 #include "platform/text/object_format.h"
 #include "platform/ui/view_controller.h"
 #include "publishing/youtube_activity.h"
-#include "tests/publishing/upload_test_server.h"
-#include "tests/support/wait_until.h"
+#include "tests/publishing/upload_test_support.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/process_temp_directory.h"
-#include "tests/support/temp_dir.h"
 
 #include <gtest/gtest.h>
 
 #include <QAbstractButton>
-#include <QEventLoop>
-#include <QFile>
 #include <QFileInfo>
 #include <QMessageBox>
 #include <QPushButton>
-#include <QTimer>
 
-#include <functional>
+#include <algorithm>
 #include <memory>
 
 namespace zaf::test {
@@ -39,35 +34,11 @@ public:
 };
 const auto *const g_environment = ::testing::AddGlobalTestEnvironment(new FlowEnvironment);
 
-// Sets the upload environment for one test and restores it afterwards.
-class ScopedUploadEnvironment {
-public:
-    explicit ScopedUploadEnvironment(const QUrl &base)
-    {
-        qputenv("ZAF_YOUTUBE_API_BASE", base.toString().toUtf8());
-        qputenv("ZAF_YOUTUBE_ACCESS_TOKEN", "test-token");
-    }
-    ~ScopedUploadEnvironment()
-    {
-        qunsetenv("ZAF_YOUTUBE_API_BASE");
-        qunsetenv("ZAF_YOUTUBE_ACCESS_TOKEN");
-    }
-};
-
-using zaf::test::waitUntil;
-
 QString tableText(const char *key)
 {
-    const std::optional<QString> text = ZafLocalizedFrameworkString(QLatin1String(key));
-    EXPECT_TRUE(text.has_value()) << key;
-    EXPECT_NE(text.value_or(QString()), QLatin1String(key)) << "no table has " << key;
-    return text.value_or(QString());
-}
-
-QObject *formOf(zaf::ui::ViewController *navigation)
-{
-    const QList<zaf::ui::ViewController *> children = navigation->childViewControllers();
-    return children.isEmpty() ? nullptr : children.first();
+    const QString text = ZafLocalizedFrameworkString(QLatin1String(key)).value_or(QString());
+    EXPECT_FALSE(text.isEmpty() || text == QLatin1String(key)) << "no table has " << key;
+    return text;
 }
 
 QString invokeForString(QObject *target, const char *method)
@@ -77,37 +48,22 @@ QString invokeForString(QObject *target, const char *method)
     return result;
 }
 
-QAbstractButton *publishButton(zaf::ui::ViewController *navigation)
+template <typename Buttons>
+QAbstractButton *buttonWithText(const Buttons &buttons, const QString &text)
 {
-    for (QPushButton *button : navigation->view()->findChildren<QPushButton *>()) {
-        if (button->text() == QLatin1String("Publish"))
-            return button;
-    }
-    return nullptr;
+    const auto it = std::find_if(buttons.begin(), buttons.end(), [&](QAbstractButton *b) { return b->text() == text; });
+    return it == buttons.end() ? nullptr : *it;
 }
 
-QStringList buttonTexts(QMessageBox *alert)
-{
-    QStringList texts;
-    for (QAbstractButton *button : alert->buttons())
-        texts << button->text();
-    return texts;
-}
 
-QAbstractButton *buttonWithText(QMessageBox *alert, const QString &text)
-{
-    for (QAbstractButton *button : alert->buttons()) {
-        if (button->text() == text)
-            return button;
-    }
-    return nullptr;
-}
-
-// An activity prepared with the editor's usual items for a fresh fixture movie.
+// An activity prepared with the editor's usual items for a fresh fixture movie, its form presented.
+// At the end it waits for the copy's export and removes the copy: copies of one second share a name.
 struct PreparedActivity {
     ScratchDir scratch;
     std::unique_ptr<ZafYouTubeActivity> activity = std::make_unique<ZafYouTubeActivity>();
     QList<bool> finishes;
+    ui::ViewController *navigation = nullptr;
+    QObject *form = nullptr;
 
     PreparedActivity()
     {
@@ -116,10 +72,18 @@ struct PreparedActivity {
         spec.audioTracks = 2;
         const QString movie = makeFixtureMovie(scratch.path(), spec);
         EXPECT_FALSE(movie.isEmpty());
-        QObject::connect(activity.get(), &zaf::ui::ShareActivity::activityFinished,
+        QObject::connect(activity.get(), &ui::ShareActivity::activityFinished,
                          [this](bool completed) { finishes << completed; });
         activity->prepareWithActivityItems({QStringLiteral("Watch my run"), QStringLiteral("https://store.example/app"),
                                             QUrl::fromLocalFile(movie)});
+        navigation = activity->activityViewController();
+        const QList<ui::ViewController *> children = navigation ? navigation->childViewControllers() : QList<ui::ViewController *>();
+        form = children.isEmpty() ? nullptr : children.first();
+    }
+    ~PreparedActivity()
+    {
+        waitForExport();
+        QFile::remove(copyPath());
     }
 
     bool waitForExport() const
@@ -132,63 +96,54 @@ struct PreparedActivity {
                });
     }
     QString copyPath() const { return activity->movieURL().toLocalFile(); }
+    QAbstractButton *publishButton() const
+    {
+        return buttonWithText(navigation->view()->findChildren<QPushButton *>(), QStringLiteral("Publish"));
+    }
 };
 
+// Every presentation of the form starts with the composed description and category "20" selected
+// (a second presentation too), shown by its label in the category cell.
 TEST(PublishingFlow, TheFormStartsWithTheDescriptionAndCategory20EveryTime)
 {
     for (int round = 0; round < 2; ++round) {
+        SCOPED_TRACE(round);
         PreparedActivity prepared;
-        zaf::ui::ViewController *navigation = prepared.activity->activityViewController();
-        ASSERT_NE(navigation, nullptr);
+        ASSERT_NE(prepared.form, nullptr);
         ASSERT_NE(prepared.activity->publishingAgent(), nullptr);
-        EXPECT_EQ(prepared.activity->publishingAgent()->navigationController(), navigation);
-        QObject *form = formOf(navigation);
-        ASSERT_NE(form, nullptr);
+        EXPECT_EQ(prepared.activity->publishingAgent()->navigationController(), prepared.navigation);
 
-        EXPECT_EQ(form->property("_defaultCategory").toString(), QStringLiteral("20")) << round;
-        EXPECT_EQ(invokeForString(form, "categoryId"), QStringLiteral("20")) << round;
+        EXPECT_EQ(prepared.form->property("_defaultCategory").toString(), QStringLiteral("20"));
+        EXPECT_EQ(invokeForString(prepared.form, "categoryId"), QStringLiteral("20"));
         QObject *categoryCell = nullptr;
-        QMetaObject::invokeMethod(form, "_categoryCell", Q_RETURN_ARG(QObject *, categoryCell));
+        QMetaObject::invokeMethod(prepared.form, "_categoryCell", Q_RETURN_ARG(QObject *, categoryCell));
         ASSERT_NE(categoryCell, nullptr);
-        QString label;
-        for (const QVariant &entry : form->property("_categories").toList()) {
-            if (entry.toMap().value(QStringLiteral("id")).toString() == QLatin1String("20"))
-                label = entry.toMap().value(QStringLiteral("label")).toString();
-        }
-        EXPECT_FALSE(label.isEmpty());
-        EXPECT_EQ(invokeForString(categoryCell, "categoryString"), label);
-        EXPECT_EQ(invokeForString(form, "description"),
-                  QStringLiteral("Watch my run https://store.example/app"));
-        // The copies of one second share a name: leave none behind for the next activity.
-        EXPECT_TRUE(prepared.waitForExport());
-        QFile::remove(prepared.copyPath());
+        EXPECT_EQ(invokeForString(categoryCell, "categoryString"), QStringLiteral("Gaming"));
+        EXPECT_EQ(invokeForString(prepared.form, "description"), QStringLiteral("Watch my run https://store.example/app"));
     }
 }
 
+// With three categories where only the second is "20", the routine selects row 1.
 TEST(PublishingFlow, DefaultCategoryRoutinePicksTheRowOfCategory20)
 {
     PreparedActivity prepared;
-    zaf::ui::ViewController *navigation = prepared.activity->activityViewController();
-    ASSERT_NE(navigation, nullptr);
-    QObject *form = formOf(navigation);
-    ASSERT_NE(form, nullptr);
-    // Three categories, only the second of which is Gaming.
-    const QVariantList categories{
-        QVariantMap{{QStringLiteral("id"), QStringLiteral("1")}, {QStringLiteral("label"), QStringLiteral("Film")}},
-        QVariantMap{{QStringLiteral("id"), QStringLiteral("20")}, {QStringLiteral("label"), QStringLiteral("Gaming")}},
-        QVariantMap{{QStringLiteral("id"), QStringLiteral("2")}, {QStringLiteral("label"), QStringLiteral("Autos")}}};
-    form->setProperty("_categories", categories);
-    ZafYouTubeActivity::selectDefaultCategoryOfForm(form);
-    QObject *picker = form->property("_picker").value<QObject *>();
+    ASSERT_NE(prepared.form, nullptr);
+    const auto category = [](const char *id, const char *label) {
+        return QVariantMap{{QStringLiteral("id"), QString::fromLatin1(id)}, {QStringLiteral("label"), QString::fromLatin1(label)}};
+    };
+    prepared.form->setProperty("_categories", QVariantList{category("1", "Film"), category("20", "Gaming"), category("2", "Autos")});
+    ZafYouTubeActivity::selectDefaultCategoryOfForm(prepared.form);
+    QObject *picker = prepared.form->property("_picker").value<QObject *>();
     ASSERT_NE(picker, nullptr);
     int row = -1;
     QMetaObject::invokeMethod(picker, "selectedRowInComponent", Q_RETURN_ARG(int, row), Q_ARG(int, 0));
     EXPECT_EQ(row, 1);
-    EXPECT_EQ(form->property("_defaultCategory").toString(), QStringLiteral("20"));
-    EXPECT_TRUE(prepared.waitForExport());
-    QFile::remove(prepared.copyPath());
+    EXPECT_EQ(prepared.form->property("_defaultCategory").toString(), QStringLiteral("20"));
 }
 
+// Publish waits for the copy under the overlay, uploads it with category "20" and the form's
+// normalised fields, reports progress to the total, shows the success alert with its View and Close
+// buttons, removes the copy, and Close ends the action as completed.
 TEST(PublishingFlow, PublishingTheCopyEndsWithTheSuccessAlertAndRemovesTheCopy)
 {
     UploadTestServer server(200, std::chrono::seconds(90));
@@ -196,26 +151,25 @@ TEST(PublishingFlow, PublishingTheCopyEndsWithTheSuccessAlertAndRemovesTheCopy)
     ScopedUploadEnvironment environment(server.baseUrl());
 
     PreparedActivity prepared;
-    zaf::ui::ViewController *navigation = prepared.activity->activityViewController();
     ZafPublishingAgent *agent = prepared.activity->publishingAgent().get();
     ASSERT_NE(agent, nullptr);
-    QByteArray uploadedCopy;
-    QObject::connect(agent, &ZafPublishingAgent::uploadProgress, [&](qint64, qint64) {
-        if (uploadedCopy.isEmpty()) {
-            QFile copy(prepared.copyPath());
-            if (copy.open(QIODevice::ReadOnly))
-                uploadedCopy = copy.readAll();
-        }
+    QMetaObject::invokeMethod(prepared.form, "setTitle", Q_ARG(QString, QStringLiteral("Speedrun <final>")));
+    QMetaObject::invokeMethod(prepared.form, "setPrivacyStatus", Q_ARG(QString, QStringLiteral("Unlisted")));
+    QByteArray uploadedCopy; // read while the upload runs: the copy is removed at its end
+    std::pair<qint64, qint64> lastProgress{-1, -1};
+    QObject::connect(agent, &ZafPublishingAgent::uploadProgress, [&](qint64 sent, qint64 total) {
+        lastProgress = {sent, total};
+        QFile copy(prepared.copyPath());
+        if (uploadedCopy.isEmpty() && copy.open(QIODevice::ReadOnly))
+            uploadedCopy = copy.readAll();
     });
-
-    QAbstractButton *publish = publishButton(navigation);
+    QAbstractButton *publish = prepared.publishButton();
     ASSERT_NE(publish, nullptr);
     const auto session = prepared.activity->exportSession();
     ASSERT_NE(session, nullptr);
     const media::ExportStatus statusAtPress = session->status();
     publish->click();
     if (statusAtPress == media::ExportStatus::Waiting || statusAtPress == media::ExportStatus::Exporting) {
-        // Nothing is uploaded before the copy exists; the overlay covers the form meanwhile.
         EXPECT_TRUE(prepared.activity->isWaitingForExport() || session->status() == media::ExportStatus::Completed);
         ASSERT_NE(prepared.activity->progressOverlay(), nullptr);
     }
@@ -223,32 +177,35 @@ TEST(PublishingFlow, PublishingTheCopyEndsWithTheSuccessAlertAndRemovesTheCopy)
     ASSERT_TRUE(waitUntil([&] { return prepared.activity->resultAlert() != nullptr; }));
     EXPECT_EQ(session->status(), media::ExportStatus::Completed);
     ASSERT_NE(prepared.activity->progressOverlay(), nullptr);
-    EXPECT_EQ(prepared.activity->progressOverlay()->parentWidget(), navigation->view());
+    EXPECT_EQ(prepared.activity->progressOverlay()->parentWidget(), prepared.navigation->view());
 
     QMessageBox *alert = prepared.activity->resultAlert();
     EXPECT_EQ(alert->text(), tableText("PUBLISHED_VIDEO"));
     const QString viewTitle = text::formatWithObjects(tableText("VIEW_BUTTON_TITLE_FORMAT"), {QStringLiteral("YouTube")});
     EXPECT_TRUE(viewTitle.contains(QLatin1String("YouTube")));
-    const QStringList texts = buttonTexts(alert);
-    EXPECT_EQ(texts.size(), 2);
-    EXPECT_TRUE(texts.contains(viewTitle)) << texts.join(QLatin1Char('|')).toStdString();
-    EXPECT_TRUE(texts.contains(tableText("CLOSE")));
+    EXPECT_EQ(alert->buttons().size(), 2);
+    EXPECT_NE(buttonWithText(alert->buttons(), viewTitle), nullptr);
 
     const QString watchPrefix = QStringLiteral("https://www.youtube.com/watch?v=");
     ASSERT_TRUE(agent->mediaURL().startsWith(watchPrefix));
     ASSERT_FALSE(uploadedCopy.isEmpty());
     EXPECT_EQ(server.videoBytes(agent->mediaURL().mid(watchPrefix.size())), uploadedCopy);
+    EXPECT_EQ(lastProgress, std::make_pair(qint64(uploadedCopy.size()), qint64(uploadedCopy.size())));
     ASSERT_EQ(server.initiationBodies().size(), 1);
-    EXPECT_TRUE(server.initiationBodies().first().contains("\"categoryId\":\"20\""));
+    const QByteArray body = server.initiationBodies().first();
+    for (const char *field : {"\"categoryId\":\"20\"", "\"privacyStatus\":\"unlisted\"", "\"title\":\"Speedrun final\""})
+        EXPECT_TRUE(body.contains(field)) << body.toStdString();
 
     EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
     EXPECT_TRUE(prepared.finishes.isEmpty());
-    QAbstractButton *close = buttonWithText(alert, tableText("CLOSE"));
+    QAbstractButton *close = buttonWithText(alert->buttons(), tableText("CLOSE"));
     ASSERT_NE(close, nullptr);
     close->click();
     EXPECT_EQ(prepared.finishes, QList<bool>{true});
 }
 
+// A 400 from the service ends with the failure alert (Close only), removes the copy, and the action
+// ends as not completed.
 TEST(PublishingFlow, ARefusedUploadEndsWithTheFailureAlertAndNotCompleted)
 {
     UploadTestServer server(50, std::chrono::seconds(90));
@@ -257,31 +214,29 @@ TEST(PublishingFlow, ARefusedUploadEndsWithTheFailureAlertAndNotCompleted)
     ScopedUploadEnvironment environment(server.baseUrl());
 
     PreparedActivity prepared;
-    zaf::ui::ViewController *navigation = prepared.activity->activityViewController();
     ASSERT_TRUE(prepared.waitForExport());
     ASSERT_TRUE(QFileInfo::exists(prepared.copyPath()));
-    QAbstractButton *publish = publishButton(navigation);
+    QAbstractButton *publish = prepared.publishButton();
     ASSERT_NE(publish, nullptr);
     publish->click();
 
     ASSERT_TRUE(waitUntil([&] { return prepared.activity->resultAlert() != nullptr; }));
     QMessageBox *alert = prepared.activity->resultAlert();
     EXPECT_EQ(alert->text(), tableText("FAILED_PUBLISH_VIDEO"));
-    EXPECT_EQ(buttonTexts(alert), QStringList{tableText("CLOSE")});
+    ASSERT_EQ(alert->buttons().size(), 1);
+    EXPECT_EQ(alert->buttons().first()->text(), tableText("CLOSE"));
     EXPECT_EQ(server.count(QStringLiteral("PUT")), 0);
     EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
-
     alert->buttons().first()->click();
     EXPECT_EQ(prepared.finishes, QList<bool>{false});
 }
 
+// Cancel in the form ends the action as not completed, without an alert, and removes the copy.
 TEST(PublishingFlow, CancelEndsNotCompletedAndRemovesTheCopy)
 {
     PreparedActivity prepared;
-    prepared.activity->activityViewController();
     ASSERT_TRUE(prepared.waitForExport());
     ASSERT_TRUE(QFileInfo::exists(prepared.copyPath()));
-
     ASSERT_TRUE(QMetaObject::invokeMethod(prepared.activity->publishingAgent().get(), "cancelAction"));
     EXPECT_EQ(prepared.finishes, QList<bool>{false});
     EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));

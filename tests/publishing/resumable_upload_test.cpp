@@ -1,55 +1,72 @@
+// The resumable upload against the loopback server: a clean run, recovery from each fault the
+// service produces, and the errors that end an upload for good.
 #include "tests/publishing/upload_test_support.h"
+#include "tests/support/log_capture.h"
 
-#include <QJsonDocument>
-#include <QJsonObject>
 #include <gtest/gtest.h>
 
 using namespace std::chrono_literals;
+using namespace zaf::publishing;
 using zaf::test::UploadHarness;
+using zaf::test::UploadTestServer;
+using Fault = UploadTestServer::Fault;
+using FaultKind = UploadTestServer::FaultKind;
+using Delays = std::vector<std::chrono::milliseconds>;
 
-TEST(ResumableUpload, startUploadsTheFileInChunksAndFinishesWithTheWatchUrl)
+namespace {
+
+constexpr qint64 kChunk = UploadHarness::kChunk;
+
+// The Content-Range starts of the data PUTs, in order.
+QList<qint64> dataStarts(const UploadTestServer &server)
 {
-    UploadHarness h(5 * UploadHarness::kChunk + 1234);
+    QList<qint64> starts;
+    for (const auto &request : server.requests()) {
+        if (request.method == QLatin1String("PUT") && !request.contentRange.startsWith("bytes */"))
+            starts.append(request.contentRange.mid(6, request.contentRange.indexOf('-') - 6).toLongLong());
+    }
+    return starts;
+}
+
+std::string describe(const std::optional<UploadResult> &result)
+{
+    return !result ? "timeout" : result->ok() ? "completed" : result->error->description().toStdString();
+}
+
+// Runs an upload that must end with an error and returns the error's code.
+int failureCode(UploadHarness &h)
+{
+    const auto result = h.run();
+    if (!result || result->ok()) {
+        ADD_FAILURE() << "expected an error, got " << describe(result);
+        return 0;
+    }
+    EXPECT_EQ(h.results.size(), 1u);
+    EXPECT_FALSE(h.upload.isRunning());
+    return result->error->code;
+}
+
+} // namespace
+
+// A clean upload sends the file in chunks with rising progress and reports completion once, with
+// the watch URL and a byte-identical file on the server. (Metadata: see the flow tests.)
+TEST(ResumableUpload, cleanUploadFinishesWithTheWatchUrlAndTheWholeFile)
+{
+    UploadHarness h(5 * kChunk + 1234);
     ASSERT_TRUE(h.listening);
     const auto result = h.run();
-    ASSERT_TRUE(result.has_value());
-    ASSERT_TRUE(result->ok()) << result->error->description().toStdString();
+    ASSERT_TRUE(result && result->ok()) << describe(result);
     EXPECT_EQ(result->watchUrl, QUrl(QStringLiteral("https://www.youtube.com/watch?v=") + result->videoId));
     EXPECT_EQ(h.server.videoBytes(result->videoId), h.movie);
+    EXPECT_EQ(h.results.size(), 1u);
+    EXPECT_FALSE(h.upload.isRunning());
+    EXPECT_TRUE(h.delays.empty());
 
+    // The server refuses ranges that do not continue what it holds; the chunk size is kept.
     EXPECT_EQ(h.server.initiations(), 1);
     EXPECT_EQ(h.server.count(QStringLiteral("PUT")), 6);
     EXPECT_EQ(h.server.count(QStringLiteral("PUT"), true), 0);
-    EXPECT_EQ(h.server.requests().at(1).contentRange, QByteArray("bytes 0-65535/328914"));
-    EXPECT_EQ(h.server.requests().last().contentRange, QByteArray("bytes 327680-328913/328914"));
-    EXPECT_TRUE(h.delays.empty());
-    EXPECT_EQ(h.results.size(), 1u);
-    EXPECT_FALSE(h.upload.isRunning());
-}
 
-TEST(ResumableUpload, startSendsTheNormalisedMetadata)
-{
-    UploadHarness h(1000);
-    zaf::publishing::VideoMetadata metadata;
-    metadata.title = QStringLiteral("  <Best> run  ");
-    metadata.categoryId = QStringLiteral("24");
-    metadata.privacyStatus = QStringLiteral("Unlisted");
-    h.upload.setMetadata(metadata);
-    const auto result = h.run();
-    ASSERT_TRUE(result && result->ok());
-    ASSERT_EQ(h.server.initiationBodies().size(), 1);
-    const QJsonObject body = QJsonDocument::fromJson(h.server.initiationBodies().first()).object();
-    EXPECT_EQ(body.value("snippet").toObject().value("title").toString(), QStringLiteral("Best run"));
-    EXPECT_EQ(body.value("snippet").toObject().value("categoryId").toString(), QStringLiteral("24"));
-    EXPECT_EQ(body.value("status").toObject().value("privacyStatus").toString(), QStringLiteral("unlisted"));
-}
-
-TEST(ResumableUpload, progressRisesToTheTotal)
-{
-    UploadHarness h(3 * UploadHarness::kChunk);
-    const auto result = h.run();
-    ASSERT_TRUE(result && result->ok());
-    ASSERT_FALSE(h.progress.empty());
     qint64 last = 0;
     for (const auto &[sent, total] : h.progress) {
         EXPECT_EQ(total, h.movie.size());
@@ -59,29 +76,117 @@ TEST(ResumableUpload, progressRisesToTheTotal)
     EXPECT_EQ(last, h.movie.size());
 }
 
-TEST(ResumableUpload, startFailsWithoutNetworkWhenTheFileIsMissing)
+// Every recoverable fault ends with the whole file on the server, after the expected waits, the
+// expected number of sessions and data PUTs that resume where the server says it stands.
+TEST(ResumableUpload, recoversFromEachServiceFault)
 {
-    UploadHarness h(1000);
-    h.upload.setFilePath(h.scratch.file(QStringLiteral("absent.mp4")));
-    const auto result = h.run();
-    ASSERT_TRUE(result.has_value());
-    ASSERT_FALSE(result->ok());
-    EXPECT_EQ(result->error->code, zaf::publishing::UploadFileError);
-    EXPECT_TRUE(h.server.requests().isEmpty());
+    const struct {
+        const char *name;
+        qint64 size;
+        QList<Fault> faults;
+        Delays delays;
+        QList<qint64> firstStarts; // the first data PUTs' Content-Range starts
+        int statusQueries;
+        int initiations;
+        std::chrono::milliseconds backoffCap = 0ms; // 0: the upload's own
+    } cases[] = {
+        // Each break is followed by a status query and the next chunk starts where the server's Range
+        // ends; the server kept bytes each time, so neither break extends a run of failures.
+        {"interrupted twice", 4 * kChunk + 77, {{FaultKind::DropBody, 1000}, {FaultKind::DropBody, 5000}},
+         {1000ms, 1000ms}, {0, 1000, 6000}, 2, 1},
+        {"503 with Retry-After", 2 * kChunk, {{FaultKind::Unavailable, 0, 7}}, {7000ms}, {0, 0}, 1, 1},
+        // Backoff doubles from 1 s up to the cap.
+        {"503 without Retry-After", kChunk, QList<Fault>(4, Fault{FaultKind::Unavailable}),
+         {1000ms, 2000ms, 3000ms, 3000ms}, {0, 0}, 4, 1, 3000ms},
+        {"308 without Range restarts from zero", 3 * kChunk, {{FaultKind::DropBody, 2000}, {FaultKind::ForgetBytes}},
+         {1000ms}, {0, 0}, 1, 1},
+        {"404 starts a new session", 3 * kChunk, {{FaultKind::SessionGone}}, {}, {0, 0}, 0, 2},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.name);
+        UploadHarness h(c.size);
+        if (c.backoffCap > 0ms)
+            h.upload.setBackoff(1000ms, c.backoffCap, 8);
+        for (const Fault &fault : c.faults)
+            h.server.queueFault(fault);
+        const auto result = h.run();
+        ASSERT_TRUE(result && result->ok()) << describe(result);
+        EXPECT_EQ(h.server.videoBytes(result->videoId), h.movie);
+        EXPECT_EQ(h.delays, c.delays);
+        EXPECT_EQ(dataStarts(h.server).mid(0, c.firstStarts.size()), c.firstStarts);
+        EXPECT_EQ(h.server.count(QStringLiteral("PUT"), true), c.statusQueries);
+        EXPECT_EQ(h.server.initiations(), c.initiations);
+    }
 }
 
-TEST(ResumableUpload, cancelEndsTheUploadWithACancelledError)
+// A 400 is final: no retry, no wait, the error carries the service's reason and is logged.
+TEST(ResumableUpload, badRequestEndsAtOnceWithTheServicesReason)
 {
-    UploadHarness h(4 * UploadHarness::kChunk);
-    QObject::connect(&h.upload, &zaf::publishing::ResumableUpload::progress, &h.upload,
-                     [&h](qint64 sent, qint64) {
-                         if (sent >= UploadHarness::kChunk)
-                             h.upload.cancel();
-                     });
-    const auto result = h.run();
-    ASSERT_TRUE(result.has_value());
-    ASSERT_FALSE(result->ok());
-    EXPECT_EQ(result->error->code, zaf::publishing::UploadCancelledError);
-    EXPECT_EQ(h.results.size(), 1u);
-    EXPECT_FALSE(h.upload.isRunning());
+    zaf::test::LogCapture log;
+    UploadHarness h(kChunk);
+    h.server.setAcceptedCategories({QStringLiteral("20")});
+    VideoMetadata metadata;
+    metadata.categoryId = QStringLiteral("22");
+    h.upload.setMetadata(metadata);
+    EXPECT_EQ(failureCode(h), 400);
+    EXPECT_TRUE(h.results.front().error->message.contains(QStringLiteral("invalid video category")));
+    EXPECT_EQ(h.server.requests().size(), 1);
+    EXPECT_TRUE(h.delays.empty());
+    EXPECT_TRUE(log.messages(QStringLiteral("zaf.publishing")).join(QLatin1Char('\n')).contains(QStringLiteral("HTTP 400")));
+}
+
+// The limits that end an upload which makes no progress, a missing file and a cancel.
+TEST(ResumableUpload, endsWithAnErrorAtEachLimit)
+{
+    {
+        SCOPED_TRACE("404 beyond the restart limit");
+        UploadHarness h(kChunk);
+        h.upload.setMaxRestarts(2);
+        for (int i = 0; i < 3; ++i)
+            h.server.queueFault(Fault{FaultKind::SessionGone});
+        EXPECT_EQ(failureCode(h), UploadTooManyRestartsError);
+        EXPECT_EQ(h.server.initiations(), 3);
+    }
+    {
+        SCOPED_TRACE("lost connections beyond the retry limit");
+        UploadHarness h(2 * kChunk);
+        h.upload.setBackoff(1000ms, 4000ms, 2);
+        for (int i = 0; i < 5; ++i)
+            h.server.queueFault(Fault{FaultKind::DropBody, 0});
+        EXPECT_EQ(failureCode(h), UploadTooManyRetriesError);
+        EXPECT_EQ(h.delays.size(), 2u);
+    }
+    {
+        SCOPED_TRACE("server that stops answering mid-upload");
+        zaf::test::LogCapture log;
+        UploadHarness h(4 * kChunk, /*maxRequests=*/3);
+        h.upload.setBackoff(1000ms, 4000ms, 3);
+        EXPECT_EQ(failureCode(h), 403);
+        EXPECT_FALSE(log.messages(QStringLiteral("zaf.publishing")).isEmpty());
+    }
+    {
+        SCOPED_TRACE("missing file");
+        UploadHarness h(1000);
+        h.upload.setFilePath(h.scratch.file(QStringLiteral("absent.mp4")));
+        EXPECT_EQ(failureCode(h), UploadFileError);
+        EXPECT_TRUE(h.server.requests().isEmpty());
+    }
+    {
+        SCOPED_TRACE("cancel");
+        UploadHarness h(4 * kChunk);
+        QObject::connect(&h.upload, &ResumableUpload::progress, &h.upload, [&h](qint64 sent, qint64) {
+            if (sent >= kChunk)
+                h.upload.cancel();
+        });
+        EXPECT_EQ(failureCode(h), UploadCancelledError);
+    }
+}
+
+// The server closes itself after its lifetime, so a test that goes wrong cannot keep it busy.
+TEST(UploadTestServer, stopsByItselfAfterItsLifetime)
+{
+    UploadTestServer server(10, 100ms);
+    ASSERT_TRUE(server.listen());
+    EXPECT_EQ(server.baseUrl().host(), QStringLiteral("127.0.0.1"));
+    EXPECT_TRUE(zaf::test::waitUntil([&] { return server.stopped(); }, 5000));
 }

@@ -1,20 +1,17 @@
 #pragma once
 
-// A loopback HTTP/1.1 server that speaks enough of the video service's resumable upload protocol for
-// the upload tests: it initiates sessions, stores the bytes of each one, answers 308 with the Range it
-// holds and 201 with a video resource once a session has every byte.
-//
-// One request per connection ("Connection: close"). It listens on 127.0.0.1 only, answers at most
-// maxRequests requests (then 403) and shuts itself down after `lifetime`, so a test that goes wrong
-// cannot keep it busy. Faults are queued and each one is spent on the first request it applies to.
-// Lives and runs on the thread that creates it (the test's main thread).
+// A loopback HTTP/1.1 server speaking enough of the video service's resumable upload protocol for the
+// upload tests: it checks the requests as the service does, keeps each session's bytes, answers 308
+// with the Range it holds and 201 with a video resource once a session is complete. One request per
+// connection, 127.0.0.1 only, at most maxRequests answers (then 403) and closed after `lifetime`, so
+// a test that goes wrong cannot keep it busy. Queued faults are each spent on the first request they
+// apply to. Lives on the thread that creates it.
 
 #include <QByteArray>
 #include <QHash>
 #include <QList>
 #include <QMap>
 #include <QObject>
-#include <QPointer>
 #include <QSet>
 #include <QString>
 #include <QTcpServer>
@@ -22,6 +19,7 @@
 #include <QUrl>
 
 #include <chrono>
+#include <optional>
 
 class QTcpSocket;
 
@@ -32,21 +30,16 @@ class UploadTestServer : public QObject {
 
 public:
     enum class FaultKind {
-        // A data PUT: keep the first `bytes` of its body, then drop the connection without answering.
-        DropBody,
-        // Any PUT on a session: 503 with "Retry-After: retryAfterSeconds" (none when negative).
-        Unavailable,
-        // A status query: the server forgets what it holds and answers 308 without Range.
-        ForgetBytes,
-        // Any PUT on a session: the session is discarded and the answer is 404.
-        SessionGone,
+        DropBody,    // a data PUT: keep the first `bytes` of its body, then drop the connection unanswered
+        Unavailable, // any PUT on a session: 503 with "Retry-After: retryAfterSeconds" (none when negative)
+        ForgetBytes, // a status query: the server forgets what it holds and answers 308 without Range
+        SessionGone, // any PUT on a session: the session is discarded and the answer is 404
     };
     struct Fault {
         FaultKind kind;
         qint64 bytes = 0;
         int retryAfterSeconds = -1;
     };
-
     // What the server saw, one entry per request, in order.
     struct Request {
         QString method;
@@ -60,10 +53,8 @@ public:
                               QObject *parent = nullptr);
     ~UploadTestServer() override;
 
-    // Listens on 127.0.0.1 on a free port; false when it cannot.
-    bool listen();
-    // http://127.0.0.1:PORT
-    QUrl baseUrl() const;
+    bool listen();        // on 127.0.0.1, a free port; false when it cannot
+    QUrl baseUrl() const; // http://127.0.0.1:PORT
 
     void queueFault(const Fault &fault) { m_faults.append(fault); }
     // The bearer token every request must carry (401 otherwise).
@@ -74,38 +65,36 @@ public:
     void setAcceptedCategories(const QSet<QString> &categories) { m_categories = categories; }
 
     const QList<Request> &requests() const { return m_requests; }
+    // Requests with this method; PUTs are data PUTs or, with `statusQueries`, status queries.
     int count(const QString &method, bool statusQueries = false) const;
-    int initiations() const;
+    int initiations() const { return count(QStringLiteral("POST")); }
     QList<QByteArray> initiationBodies() const { return m_initiationBodies; }
     // The bytes of the session that completed a video, by video id.
     QByteArray videoBytes(const QString &videoId) const { return m_videos.value(videoId); }
     bool stopped() const { return !m_server.isListening(); }
 
 private:
+    using Headers = QList<QPair<QByteArray, QByteArray>>;
     struct Connection {
         QByteArray buffer;
         bool headersDone = false;
         QString method;
-        QString target;
+        QUrl target;
         QHash<QByteArray, QByteArray> headers; // lower-case names
         qint64 contentLength = 0;
         qint64 dropAfter = -1; // the DropBody fault taken by this request
     };
     struct Session {
         qint64 total = 0;
-        QByteArray bytes;
+        QByteArray bytes; // received so far
     };
 
-    void accept();
     void readFrom(QTcpSocket *socket);
-    void handle(QTcpSocket *socket, Connection &connection, const QByteArray &body);
     void handleInitiation(QTcpSocket *socket, const Connection &connection, const QByteArray &body);
     void handlePut(QTcpSocket *socket, const Connection &connection, const QByteArray &body);
-    void respond(QTcpSocket *socket, int status, const QList<QPair<QByteArray, QByteArray>> &headers,
-                 const QByteArray &body = {});
-    void respondError(QTcpSocket *socket, int status, const QString &message,
-                      const QList<QPair<QByteArray, QByteArray>> &headers = {});
-    bool takeFault(FaultKind kind, Fault *fault);
+    void respond(QTcpSocket *socket, int status, const Headers &headers, const QByteArray &body = {});
+    void respondError(QTcpSocket *socket, int status, const QString &message, const Headers &headers = {});
+    std::optional<Fault> takeFault(FaultKind kind);
     void shutDown();
 
     QTcpServer m_server;

@@ -1,14 +1,12 @@
 // zaf-upload-test-server: the loopback upload server on its own, for screenshots and trying the
-// publishing flow by hand without the real service. Prints its base URL on the first line of stdout,
-// then serves until its lifetime ends.
+// publishing flow by hand. Prints its base URL on the first line of stdout, then serves until its
+// lifetime ends.
 //
 //   zaf-upload-test-server [--delay-ms N] [--lifetime-s S] [--token TOKEN]
 #include "tests/publishing/upload_test_server.h"
 
 #include <QCoreApplication>
-#include <QTimer>
 
-#include <chrono>
 #include <cstdio>
 
 int main(int argc, char **argv)
@@ -19,7 +17,7 @@ int main(int argc, char **argv)
     QByteArray token = "test-token";
     for (int i = 0; i < args.size(); i += 2) {
         bool ok = i + 1 < args.size();
-        const QString value = ok ? args[i + 1] : QString();
+        const QString value = args.value(i + 1);
         if (args[i] == QLatin1String("--delay-ms"))
             delayMs = value.toInt(&ok);
         else if (args[i] == QLatin1String("--lifetime-s"))
@@ -33,7 +31,6 @@ int main(int argc, char **argv)
             return 2;
         }
     }
-
     zaf::test::UploadTestServer server(1000, std::chrono::seconds(lifetimeS));
     server.setExpectedToken(token);
     server.setResponseDelay(std::chrono::milliseconds(delayMs));

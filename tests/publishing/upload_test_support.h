@@ -1,14 +1,15 @@
 #pragma once
 
-// Helpers shared by the upload tests: a movie-sized file of varied bytes, an upload wired to the
-// loopback server with recorded backoff delays, and a bounded wait for its result.
+// Helpers shared by the publishing tests: the plug-in's upload environment, and an upload of a file
+// of varied bytes to the loopback server that records its backoff waits.
 
 #include "publishing/plugin/upload/resumable_upload.h"
 #include "tests/publishing/upload_test_server.h"
 #include "tests/support/temp_dir.h"
+#include "tests/support/wait_until.h"
 
-#include <QEventLoop>
 #include <QFile>
+#include <gtest/gtest.h>
 #include <QNetworkAccessManager>
 #include <QTimer>
 
@@ -32,23 +33,34 @@ inline QByteArray variedBytes(qint64 size)
     return bytes;
 }
 
+// Points the plug-in at the loopback server for one test and restores the environment afterwards.
+struct ScopedUploadEnvironment {
+    explicit ScopedUploadEnvironment(const QUrl &base)
+    {
+        qputenv("ZAF_YOUTUBE_API_BASE", base.toString().toUtf8());
+        qputenv("ZAF_YOUTUBE_ACCESS_TOKEN", "test-token");
+    }
+    ~ScopedUploadEnvironment()
+    {
+        qunsetenv("ZAF_YOUTUBE_API_BASE");
+        qunsetenv("ZAF_YOUTUBE_ACCESS_TOKEN");
+    }
+};
+
 class UploadHarness {
 public:
     static constexpr qint64 kChunk = 64 * 1024;
 
     explicit UploadHarness(qint64 fileSize, int maxRequests = 60)
-        : server(maxRequests, std::chrono::seconds(20)), upload(&network)
+        : movie(variedBytes(fileSize)), path(scratch.file(QStringLiteral("movie.mp4"))),
+          server(maxRequests, std::chrono::seconds(20)), upload(&network)
     {
-        movie = variedBytes(fileSize);
-        path = scratch.file(QStringLiteral("movie.mp4"));
         QFile file(path);
-        if (file.open(QIODevice::WriteOnly))
-            file.write(movie);
+        EXPECT_TRUE(file.open(QIODevice::WriteOnly) && file.write(movie) == movie.size());
+        file.close();
         listening = server.listen();
-
         publishing::VideoMetadata metadata;
-        metadata.title = QStringLiteral("Speedrun, part one");
-        metadata.description = QStringLiteral("Recorded with the video editor.");
+        metadata.title = QStringLiteral("Speedrun");
         upload.setBaseUrl(server.baseUrl());
         upload.setAccessToken(QStringLiteral("test-token"));
         upload.setFilePath(path);
@@ -58,9 +70,8 @@ public:
             delays.push_back(delay);
             QTimer::singleShot(0, std::move(resume));
         });
-        QObject::connect(&upload, &publishing::ResumableUpload::progress, [this](qint64 sent, qint64 total) {
-            progress.push_back({sent, total});
-        });
+        QObject::connect(&upload, &publishing::ResumableUpload::progress,
+                         [this](qint64 sent, qint64 total) { progress.push_back({sent, total}); });
         QObject::connect(&upload, &publishing::ResumableUpload::finished,
                          [this](const publishing::UploadResult &r) { results.push_back(r); });
     }
@@ -68,16 +79,8 @@ public:
     // Starts the upload and runs the event loop until it finishes or 15 s pass.
     std::optional<publishing::UploadResult> run()
     {
-        QEventLoop loop;
-        QTimer timeout;
-        timeout.setSingleShot(true);
-        QObject::connect(&timeout, &QTimer::timeout, &loop, &QEventLoop::quit);
-        QObject::connect(&upload, &publishing::ResumableUpload::finished, &loop, &QEventLoop::quit);
-        timeout.start(15000);
         upload.start();
-        if (results.empty())
-            loop.exec();
-        if (results.empty())
+        if (!waitUntil([this] { return !results.empty(); }, 15000))
             return std::nullopt;
         return results.front();
     }

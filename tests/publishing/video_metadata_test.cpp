@@ -1,78 +1,58 @@
+// The metadata rules of the video service: what normalising repairs and what it refuses.
 #include "publishing/plugin/upload/video_metadata.h"
 
 #include <QJsonDocument>
 #include <QJsonObject>
 #include <gtest/gtest.h>
 
-using zaf::publishing::VideoMetadata;
+using namespace zaf::publishing;
 
-TEST(VideoMetadata, normaliseTitleTrimsAndRemovesAngleBrackets)
+// Titles are trimmed, lose angle brackets, fall back to "Untitled" and are cut at 100 characters,
+// never inside a surrogate pair.
+TEST(VideoMetadata, normaliseTitleRepairsWhatThePersonTyped)
 {
-    EXPECT_EQ(VideoMetadata::normaliseTitle(QStringLiteral("  <b>Boss fight</b>  ")), QStringLiteral("bBoss fight/b"));
-}
-
-TEST(VideoMetadata, normaliseTitleFallsBackToUntitledWhenEmpty)
-{
-    EXPECT_EQ(VideoMetadata::normaliseTitle(QString()), QStringLiteral("Untitled"));
-    EXPECT_EQ(VideoMetadata::normaliseTitle(QStringLiteral(" <> ")), QStringLiteral("Untitled"));
-}
-
-TEST(VideoMetadata, normaliseTitleCutsAtOneHundredCharactersWithoutSplittingSurrogates)
-{
-    const QString longTitle = QString(150, QLatin1Char('a'));
-    EXPECT_EQ(VideoMetadata::normaliseTitle(longTitle).size(), 100);
-
-    // 99 letters and then emoji (two UTF-16 units each): the 100th character is one whole emoji.
     const QString emoji = QString::fromUtf8("\xF0\x9F\x8E\xAE");
-    const QString mixed = QString(99, QLatin1Char('b')) + emoji + emoji;
-    const QString cut = VideoMetadata::normaliseTitle(mixed);
-    EXPECT_EQ(cut, QString(99, QLatin1Char('b')) + emoji);
-    EXPECT_EQ(cut.toUcs4().size(), 100);
+    const struct {
+        QString in;
+        QString out;
+    } cases[] = {
+        {QStringLiteral("  <b>Boss fight</b>  "), QStringLiteral("bBoss fight/b")},
+        {QString(), QStringLiteral("Untitled")},
+        {QStringLiteral(" <> "), QStringLiteral("Untitled")},
+        {QString(150, QLatin1Char('a')), QString(100, QLatin1Char('a'))},
+        // The 100th character is one whole emoji (two UTF-16 units).
+        {QString(99, QLatin1Char('b')) + emoji + emoji, QString(99, QLatin1Char('b')) + emoji},
+    };
+    for (const auto &c : cases)
+        EXPECT_EQ(VideoMetadata::normaliseTitle(c.in), c.out) << c.in.toStdString();
 }
 
-TEST(VideoMetadata, normaliseDescriptionCutsAtFiveThousandBytesOnACharacterBoundary)
+// Descriptions lose angle brackets and are cut at 5000 UTF-8 bytes on a character boundary.
+TEST(VideoMetadata, normaliseDescriptionCutsOnACharacterBoundary)
 {
-    // 4999 ASCII bytes and then a three-byte character: it does not fit and must not be split.
-    const QString description = QString(4999, QLatin1Char('x')) + QString::fromUtf8("\xE2\x82\xAC") + QStringLiteral("tail");
-    const QString cut = VideoMetadata::normaliseDescription(description);
-    EXPECT_EQ(cut, QString(4999, QLatin1Char('x')));
-    EXPECT_LE(cut.toUtf8().size(), 5000);
-
-    const QString fits = QString(4997, QLatin1Char('x')) + QString::fromUtf8("\xE2\x82\xAC");
+    const QString euro = QString::fromUtf8("\xE2\x82\xAC");
+    EXPECT_EQ(VideoMetadata::normaliseDescription(QStringLiteral("a <script> b")), QStringLiteral("a script b"));
+    // 4999 bytes and then a three-byte character: it does not fit and must not be split.
+    EXPECT_EQ(VideoMetadata::normaliseDescription(QString(4999, QLatin1Char('x')) + euro + QStringLiteral("tail")),
+              QString(4999, QLatin1Char('x')));
+    const QString fits = QString(4997, QLatin1Char('x')) + euro;
     EXPECT_EQ(VideoMetadata::normaliseDescription(fits), fits);
 }
 
-TEST(VideoMetadata, normaliseDescriptionRemovesAngleBrackets)
-{
-    EXPECT_EQ(VideoMetadata::normaliseDescription(QStringLiteral("a <script> b")), QStringLiteral("a script b"));
-}
-
-TEST(VideoMetadata, normalisedRejectsUnknownCategoryAndPrivacy)
+// A category that cannot be assigned and an unknown privacy status are errors; the privacy status
+// is read in any case and with spaces; the JSON carries the normalised fields.
+TEST(VideoMetadata, normalisedRefusesWhatCannotBeRepairedAndWritesTheRest)
 {
     VideoMetadata metadata;
     metadata.categoryId = QStringLiteral("18"); // exists, but cannot be assigned
-    auto result = metadata.normalised();
-    ASSERT_FALSE(result.ok());
-    EXPECT_EQ(result.error->code, zaf::publishing::InvalidCategoryError);
-
+    EXPECT_EQ(metadata.normalised().error.value_or(zaf::Error{}).code, InvalidCategoryError);
     metadata.categoryId = QStringLiteral("20");
     metadata.privacyStatus = QStringLiteral("friends");
-    result = metadata.normalised();
-    ASSERT_FALSE(result.ok());
-    EXPECT_EQ(result.error->code, zaf::publishing::InvalidPrivacyStatusError);
+    EXPECT_EQ(metadata.normalised().error.value_or(zaf::Error{}).code, InvalidPrivacyStatusError);
 
-    metadata.privacyStatus = QStringLiteral(" Unlisted ");
-    result = metadata.normalised();
-    ASSERT_TRUE(result.ok());
-    EXPECT_EQ(result.value->privacyStatus, QStringLiteral("unlisted"));
-}
-
-TEST(VideoMetadata, toJsonWritesSnippetAndStatus)
-{
-    VideoMetadata metadata;
     metadata.title = QStringLiteral("<Run>");
     metadata.description = QStringLiteral("d");
-    metadata.privacyStatus = QStringLiteral("public");
+    metadata.privacyStatus = QStringLiteral(" Unlisted ");
     const auto normalised = metadata.normalised();
     ASSERT_TRUE(normalised.ok());
     const QJsonObject body = QJsonDocument::fromJson(normalised.value->toJson()).object();
@@ -81,18 +61,19 @@ TEST(VideoMetadata, toJsonWritesSnippetAndStatus)
     EXPECT_EQ(snippet.value(QStringLiteral("description")).toString(), QStringLiteral("d"));
     EXPECT_EQ(snippet.value(QStringLiteral("categoryId")).toString(), QStringLiteral("20"));
     EXPECT_EQ(body.value(QStringLiteral("status")).toObject().value(QStringLiteral("privacyStatus")).toString(),
-              QStringLiteral("public"));
+              QStringLiteral("unlisted"));
 }
 
+// The assignable categories are the US list in the service's order, each with a label.
 TEST(VideoCategories, listTheAssignableUsCategoriesWithLabels)
 {
-    const QStringList expected = {"1", "2", "10", "15", "17", "19", "20", "22", "23", "24", "25", "26", "27", "28", "29"};
     QStringList ids;
-    for (const auto &category : zaf::publishing::assignableCategories()) {
+    for (const auto &category : assignableCategories()) {
         ids.append(category.id);
+        EXPECT_EQ(categoryLabel(category.id), category.label);
         EXPECT_FALSE(category.label.isEmpty());
     }
-    EXPECT_EQ(ids, expected);
-    EXPECT_EQ(zaf::publishing::categoryLabel(QStringLiteral("20")), QStringLiteral("Gaming"));
-    EXPECT_FALSE(zaf::publishing::isAssignableCategory(QStringLiteral("18")));
+    EXPECT_EQ(ids, QStringList({"1", "2", "10", "15", "17", "19", "20", "22", "23", "24", "25", "26", "27", "28", "29"}));
+    EXPECT_EQ(categoryLabel(QStringLiteral("20")), QStringLiteral("Gaming"));
+    EXPECT_FALSE(isAssignableCategory(QStringLiteral("18")));
 }

@@ -1,5 +1,5 @@
-// The YouTube share activity: its identity, its capability gate, its preparation (the mixed copy in
-// the temporary directory and the description text) and the item lists of the override message.
+// The YouTube share activity: its identity, its capability gate, and its preparation (the copy with
+// mixed audio and the description text) for every shape of item list.
 #include "platform/capability/capability_service.h"
 #include "platform/media/export_session.h"
 #include "publishing/youtube_activity.h"
@@ -9,10 +9,8 @@
 #include "tests/support/process_temp_directory.h"
 #include "tests/support/temp_dir.h"
 
-#include <QCoreApplication>
 #include <QFile>
 #include <QFileInfo>
-#include <QJsonArray>
 #include <QLocale>
 #include <QThread>
 #include <gtest/gtest.h>
@@ -30,12 +28,6 @@ const auto *const g_environment = ::testing::AddGlobalTestEnvironment(new TempDi
 
 const QString kCompleteMessage = QStringLiteral("ZafYouTubeActivity: Export Mixed YouTube Video Complete.");
 
-bool isFinal(media::ExportStatus status)
-{
-    return status == media::ExportStatus::Completed || status == media::ExportStatus::Failed
-        || status == media::ExportStatus::Cancelled;
-}
-
 // Waits until the copy's export has ended and, when it completed, until its completion has logged.
 media::ExportStatus waitForExport(const ZafYouTubeActivity &activity, const LogCapture &logs)
 {
@@ -45,16 +37,17 @@ media::ExportStatus waitForExport(const ZafYouTubeActivity &activity, const LogC
         return media::ExportStatus::Unknown;
     }
     const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(120);
-    while (!isFinal(session->status()) && std::chrono::steady_clock::now() < deadline)
+    const auto ended = [&] {
+        const media::ExportStatus status = session->status();
+        return status == media::ExportStatus::Failed || status == media::ExportStatus::Cancelled
+            || (status == media::ExportStatus::Completed && logs.count(kCompleteMessage) > 0);
+    };
+    while (!ended() && std::chrono::steady_clock::now() < deadline)
         QThread::msleep(20);
-    if (session->status() == media::ExportStatus::Completed) {
-        while (logs.count(kCompleteMessage) == 0 && std::chrono::steady_clock::now() < deadline)
-            QThread::msleep(20);
-    }
     return session->status();
 }
 
-int audioStreamCount(const QString &path)
+int audioStreams(const QString &path)
 {
     return int(probeStreams(ffprobe(path), QStringLiteral("audio")).size());
 }
@@ -90,6 +83,7 @@ private:
     ScratchDir m_scratch;
 };
 
+// Type and title do not change with the language; the image is drawn from the activity's own bundle.
 TEST(YouTubeActivity, IdentityIsTheSameInEveryLanguage)
 {
     const QLocale previous;
@@ -101,175 +95,87 @@ TEST(YouTubeActivity, IdentityIsTheSameInEveryLanguage)
     }
     QLocale::setDefault(previous);
     EXPECT_EQ(ZafYouTubeActivity::activityCategory(), 1);
-}
-
-TEST(YouTubeActivity, ImagesComeFromTheOwnBundle)
-{
-    EXPECT_EQ(ZafYouTubeActivity::mediaShelfFrameworkBundle(), QStringLiteral(":/zaf/publishing/"));
-    EXPECT_TRUE(ZafYouTubeActivity::mediaShelfImageNamed(QStringLiteral("NoSuchImage")).isNull());
 
     const QImage image = ZafYouTubeActivity::mediaShelfImageNamed(QStringLiteral("ZafPublishVideo"));
-    ASSERT_FALSE(image.isNull());
-    // Something is drawn: not every pixel transparent.
-    bool drawn = false;
-    for (int y = 0; y < image.height() && !drawn; ++y)
-        for (int x = 0; x < image.width() && !drawn; ++x)
-            drawn = qAlpha(image.pixel(x, y)) > 0;
-    EXPECT_TRUE(drawn);
-
-    ZafYouTubeActivity activity;
-    EXPECT_FALSE(activity.activityImage().isNull());
-    const QImage settings = activity._activitySettingsImage();
-    ASSERT_FALSE(settings.isNull());
-    EXPECT_NEAR(settings.deviceIndependentSize().width(), 29.0, 0.5);
-    EXPECT_NEAR(settings.deviceIndependentSize().height(), 29.0, 0.5);
+    QImage blank(image.size(), image.format());
+    blank.fill(Qt::transparent);
+    EXPECT_FALSE(image.isNull() || image == blank) << "nothing drawn";
+    EXPECT_TRUE(ZafYouTubeActivity::mediaShelfImageNamed(QStringLiteral("NoSuchImage")).isNull());
+    EXPECT_FALSE(ZafYouTubeActivity().activityImage().isNull());
 }
 
+// Only the capability decides; the items are not looked at.
 TEST(YouTubeActivity, CanPerformFollowsTheCapabilityWhateverTheItems)
 {
     const QVariantList full{QStringLiteral("text"), QStringLiteral("https://example.invalid/app"),
                             QUrl::fromLocalFile(QStringLiteral("/nowhere/movie.mp4"))};
     ZafYouTubeActivity activity;
-    {
-        CapabilityOverride allowed(true);
-        EXPECT_TRUE(activity.canPerformWithActivityItems({}));
-        EXPECT_TRUE(activity.canPerformWithActivityItems(full));
-    }
-    {
-        CapabilityOverride forbidden(false);
-        EXPECT_FALSE(activity.canPerformWithActivityItems({}));
-        EXPECT_FALSE(activity.canPerformWithActivityItems(full));
+    for (bool allowed : {true, false}) {
+        CapabilityOverride capability(allowed);
+        EXPECT_EQ(activity.canPerformWithActivityItems({}), allowed);
+        EXPECT_EQ(activity.canPerformWithActivityItems(full), allowed);
     }
 }
 
-TEST(YouTubeActivity, PrepareComposesTheDescriptionAndCopiesTheMovieWithMixedAudio)
+// Preparation for every shape of item list: the description takes the leading texts; the movie is
+// found wherever it is (a host message list still exports it) and copied into the temporary
+// directory with its audio tracks mixed into one and the video unchanged; no position past the end
+// of a short list is read.
+TEST(YouTubeActivity, PrepareHandlesEveryShapeOfItemList)
 {
     ScratchDir scratch;
-    const QString source = movieWithAudioTracks(scratch, 2);
-    ASSERT_FALSE(source.isEmpty());
-
-    LogCapture logs;
-    ZafYouTubeActivity activity;
-    const QUrl before = ZafYouTubeActivity::tempFileURL();
-    activity.prepareWithActivityItems({QStringLiteral("Look at this"), QStringLiteral("https://example.invalid/app"),
-                                       QUrl::fromLocalFile(source)});
-
-    EXPECT_EQ(activity.descriptionText(), QStringLiteral("Look at this https://example.invalid/app"));
-    EXPECT_EQ(activity.sourceMovieURL(), QUrl::fromLocalFile(source));
-    const QString copy = activity.movieURL().toLocalFile();
-    EXPECT_TRUE(activity.movieURL() == before || QFileInfo(copy).fileName().startsWith(QStringLiteral("ZafReplay_YouTube")));
-    EXPECT_TRUE(copy.startsWith(ZafTempStore::defaultStore()._srTempPath()));
-
-    ASSERT_EQ(waitForExport(activity, logs), media::ExportStatus::Completed);
-    EXPECT_EQ(logs.count(kCompleteMessage), 1);
-    ASSERT_TRUE(QFileInfo::exists(copy));
-    EXPECT_EQ(audioStreamCount(copy), 1);
-    EXPECT_GT(toneLevel(copy, 0, fixture::toneFrequency(0)), 0.3);
-    EXPECT_GT(toneLevel(copy, 0, fixture::toneFrequency(1)), 0.3);
-    EXPECT_EQ(streamMD5(copy, QStringLiteral("0:v")), streamMD5(source, QStringLiteral("0:v")));
-    QFile::remove(copy);
-}
-
-TEST(YouTubeActivity, EmptyStoreLinkLeavesOneTrailingSpace)
-{
-    ScratchDir scratch;
-    const QString source = movieWithAudioTracks(scratch, 1);
-    ASSERT_FALSE(source.isEmpty());
-    LogCapture logs;
-    ZafYouTubeActivity activity;
-    activity.prepareWithActivityItems({QStringLiteral("Share text"), QString(), QUrl::fromLocalFile(source)});
-    EXPECT_EQ(activity.descriptionText(), QStringLiteral("Share text "));
-    EXPECT_EQ(waitForExport(activity, logs), media::ExportStatus::Completed);
-    QFile::remove(activity.movieURL().toLocalFile());
-}
-
-TEST(YouTubeActivity, MovieWithoutAudioIsCopiedWithoutAudio)
-{
-    ScratchDir scratch;
-    const QString source = movieWithAudioTracks(scratch, 0);
-    ASSERT_FALSE(source.isEmpty());
-    LogCapture logs;
-    ZafYouTubeActivity activity;
-    activity.prepareWithActivityItems({QStringLiteral("T"), QStringLiteral("L"), QUrl::fromLocalFile(source)});
-    ASSERT_TRUE(activity.exportSession());
-    const std::optional<media::AudioMix> mix = activity.exportSession()->audioMix();
-    ASSERT_TRUE(mix.has_value());
-    EXPECT_TRUE(mix->inputParameters.isEmpty());
-
-    ASSERT_EQ(waitForExport(activity, logs), media::ExportStatus::Completed);
-    const QString copy = activity.movieURL().toLocalFile();
-    EXPECT_EQ(audioStreamCount(copy), 0);
-    EXPECT_EQ(probeStreams(ffprobe(copy), QStringLiteral("video")).size(), 1);
-    QFile::remove(copy);
-}
-
-TEST(YouTubeActivity, OverrideMessageListStillExportsTheMovie)
-{
-    ScratchDir scratch;
-    const QString source = movieWithAudioTracks(scratch, 2);
-    ASSERT_FALSE(source.isEmpty());
-    // An attachment that is a file but no movie sits where the movie usually is.
-    const QString attachment = scratch.write(QStringLiteral("notes.txt"), 300);
-
-    LogCapture logs;
-    ZafYouTubeActivity activity;
-    activity.prepareWithActivityItems({QStringLiteral("Host message"), QUrl::fromLocalFile(source),
-                                       QUrl::fromLocalFile(attachment)});
-    EXPECT_EQ(activity.descriptionText(), QStringLiteral("Host message"));
-    EXPECT_EQ(activity.sourceMovieURL(), QUrl::fromLocalFile(source));
-    ASSERT_EQ(waitForExport(activity, logs), media::ExportStatus::Completed);
-    const QString copy = activity.movieURL().toLocalFile();
-    EXPECT_EQ(audioStreamCount(copy), 1);
-    EXPECT_GT(toneLevel(copy, 0, fixture::toneFrequency(1)), 0.3);
-    QFile::remove(copy);
-}
-
-TEST(YouTubeActivity, ShortListsAreNeverReadPastTheEnd)
-{
-    ScratchDir scratch;
-    const QString source = movieWithAudioTracks(scratch, 1);
-    ASSERT_FALSE(source.isEmpty());
-    {
-        // Two items: the message and the movie.
+    const QUrl movie = QUrl::fromLocalFile(movieWithAudioTracks(scratch, 2));
+    const QUrl silent = QUrl::fromLocalFile(movieWithAudioTracks(scratch, 0));
+    ASSERT_FALSE(movie.isEmpty() || silent.isEmpty());
+    const QUrl attachment = QUrl::fromLocalFile(scratch.write(QStringLiteral("notes.txt"), 300));
+    const QUrl garbage = QUrl::fromLocalFile(scratch.write(QStringLiteral("garbage.mp4"), 4000));
+    const struct {
+        const char *name;
+        QVariantList items;
+        QString description;
+        QUrl source; // empty: nothing to export
+        int audioStreams;
+    } cases[] = {
+        {"usual list", {QStringLiteral("Look at this"), QStringLiteral("https://example.invalid/app"), movie},
+         QStringLiteral("Look at this https://example.invalid/app"), movie, 1},
+        {"empty store link", {QStringLiteral("Share text"), QString(), movie}, QStringLiteral("Share text "), movie, 1},
+        {"host message and attachment", {QStringLiteral("Host message"), movie, attachment}, QStringLiteral("Host message"), movie, 1},
+        {"host message only", {QStringLiteral("Host message"), movie}, QStringLiteral("Host message"), movie, 1},
+        {"movie without audio", {QStringLiteral("T"), QStringLiteral("L"), silent}, QStringLiteral("T L"), silent, 0},
+        {"no movie", {QStringLiteral("a"), QStringLiteral("b"), garbage}, QStringLiteral("a b"), QUrl(), 0},
+        {"no items", {}, QString(), QUrl(), 0},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.name);
         LogCapture logs;
         ZafYouTubeActivity activity;
-        activity.prepareWithActivityItems({QStringLiteral("Host message"), QUrl::fromLocalFile(source)});
-        EXPECT_EQ(activity.descriptionText(), QStringLiteral("Host message"));
-        EXPECT_EQ(waitForExport(activity, logs), media::ExportStatus::Completed);
-        QFile::remove(activity.movieURL().toLocalFile());
-    }
-    {
-        // No items: a fresh name, no export, no description.
-        LogCapture logs;
-        ZafYouTubeActivity activity;
-        activity.prepareWithActivityItems({});
-        EXPECT_TRUE(activity.descriptionText().isEmpty());
-        EXPECT_FALSE(activity.exportSession());
-        EXPECT_TRUE(activity.sourceMovieURL().isEmpty());
-        EXPECT_TRUE(QFileInfo(activity.movieURL().toLocalFile()).fileName().startsWith(QStringLiteral("ZafReplay_YouTube")));
-        EXPECT_FALSE(QFileInfo::exists(activity.movieURL().toLocalFile()));
-        EXPECT_EQ(logs.count(QStringLiteral("ZafYouTubeActivity: no movie among the activity items")), 1);
-    }
-    {
-        // Texts only, and a file that is no movie: nothing to export.
-        ScratchDir other;
-        const QString garbage = other.write(QStringLiteral("garbage.mp4"), 4000);
-        ZafYouTubeActivity activity;
-        activity.prepareWithActivityItems({QStringLiteral("a"), QStringLiteral("b"), QUrl::fromLocalFile(garbage)});
-        EXPECT_EQ(activity.descriptionText(), QStringLiteral("a b"));
-        EXPECT_FALSE(activity.exportSession());
+        activity.prepareWithActivityItems(c.items);
+        EXPECT_EQ(activity.descriptionText(), c.description);
+        const QString copy = activity.movieURL().toLocalFile();
+        EXPECT_TRUE(copy.startsWith(ZafTempStore::defaultStore()._srTempPath() + QStringLiteral("/ZafReplay_YouTube")));
+        EXPECT_EQ(activity.sourceMovieURL(), c.source);
+        if (c.source.isEmpty()) {
+            EXPECT_FALSE(activity.exportSession());
+            EXPECT_FALSE(QFileInfo::exists(copy));
+            EXPECT_EQ(logs.count(QStringLiteral("ZafYouTubeActivity: no movie among the activity items")), 1);
+            continue;
+        }
+        ASSERT_EQ(waitForExport(activity, logs), media::ExportStatus::Completed);
+        EXPECT_EQ(logs.count(kCompleteMessage), 1);
+        EXPECT_EQ(audioStreams(copy), c.audioStreams);
+        EXPECT_EQ(streamMD5(copy, QStringLiteral("0:v")), streamMD5(c.source.toLocalFile(), QStringLiteral("0:v")));
+        for (int track = 0; track < 2 * c.audioStreams; ++track) // both source tracks in the mixed one
+            EXPECT_GT(toneLevel(copy, 0, fixture::toneFrequency(track)), 0.3) << "track " << track;
+        QFile::remove(copy); // the copies of one second share a name
     }
 }
 
+// The copy's name is the temporary directory, the stem and the whole seconds.
 TEST(YouTubeActivity, TempFileURLIsTheDirectoryStemAndWholeSeconds)
 {
-    const QString dir = ZafTempStore::defaultStore()._srTempPath();
     EXPECT_EQ(ZafYouTubeActivity::tempFileURLForTime(1000000000.9).toLocalFile(),
-              dir + QStringLiteral("/ZafReplay_YouTube1000000000.mp4"));
-    EXPECT_TRUE(ZafYouTubeActivity::tempFileURLForTime(42).toLocalFile().contains(QStringLiteral("//ZafReplay_YouTube42.mp4")));
-    EXPECT_EQ(ZafYouTubeActivity::tempFileURLForTime(7.0), ZafYouTubeActivity::tempFileURLForTime(7.99));
-    EXPECT_NE(ZafYouTubeActivity::tempFileURLForTime(7.0), ZafYouTubeActivity::tempFileURLForTime(8.0));
-    EXPECT_TRUE(ZafYouTubeActivity::tempFileURL().isLocalFile());
+              ZafTempStore::defaultStore()._srTempPath() + QStringLiteral("/ZafReplay_YouTube1000000000.mp4"));
+    EXPECT_NE(ZafYouTubeActivity::tempFileURLForTime(7.99), ZafYouTubeActivity::tempFileURLForTime(8.0));
 }
 
 } // namespace

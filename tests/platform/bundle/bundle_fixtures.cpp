@@ -1,7 +1,5 @@
 #include "tests/platform/bundle/bundle_fixtures.h"
 
-#include "platform/bundle/bundle.h"
-
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
@@ -11,46 +9,33 @@
 
 namespace zaf::bundle::test {
 
-QByteArray compilePo(const QString &poSource, ByteOrder order)
-{
-    return compilePoBytes(poSource.toUtf8(), order);
-}
-
-QByteArray compilePoBytes(const QByteArray &poSource, ByteOrder order)
+QByteArray compilePo(const QByteArray &poSource, ByteOrder order)
 {
     QTemporaryDir dir;
     const QString po = dir.filePath(QStringLiteral("messages.po"));
     const QString mo = dir.filePath(QStringLiteral("messages.mo"));
     writeFile(po, poSource);
     QProcess msgfmt;
-    QStringList arguments{QStringLiteral("--endianness=") + (order == ByteOrder::Big ? QStringLiteral("big") : QStringLiteral("little")),
-                          QStringLiteral("-o"), mo, po};
-    msgfmt.start(QStringLiteral(ZAF_MSGFMT), arguments);
-    if (!msgfmt.waitForFinished(30000) || msgfmt.exitStatus() != QProcess::NormalExit || msgfmt.exitCode() != 0) {
-        ADD_FAILURE() << "msgfmt failed: " << msgfmt.readAllStandardError().toStdString();
-        return QByteArray();
-    }
+    msgfmt.start(QStringLiteral(ZAF_MSGFMT), {order == ByteOrder::Big ? QStringLiteral("--endianness=big") : QStringLiteral("--endianness=little"),
+                                              QStringLiteral("-o"), mo, po});
     QFile file(mo);
-    if (!file.open(QIODevice::ReadOnly)) {
-        ADD_FAILURE() << "msgfmt wrote no catalogue";
+    if (!msgfmt.waitForFinished(30000) || msgfmt.exitStatus() != QProcess::NormalExit || msgfmt.exitCode() != 0
+        || !file.open(QIODevice::ReadOnly)) {
+        ADD_FAILURE() << "msgfmt failed: " << msgfmt.readAllStandardError().toStdString();
         return QByteArray();
     }
     return file.readAll();
 }
 
-static QString quoted(const QString &s)
+QByteArray poSource(const QList<std::pair<QString, QString>> &messages)
 {
-    QString escaped = s;
-    escaped.replace(QLatin1Char('\\'), QStringLiteral("\\\\")).replace(QLatin1Char('"'), QStringLiteral("\\\""));
-    return QLatin1Char('"') + escaped + QLatin1Char('"');
-}
-
-QString poSource(const QList<std::pair<QString, QString>> &messages)
-{
+    const auto quoted = [](QString s) {
+        return QLatin1Char('"') + s.replace(QLatin1Char('\\'), QStringLiteral("\\\\")).replace(QLatin1Char('"'), QStringLiteral("\\\"")) + QLatin1Char('"');
+    };
     QString source = QStringLiteral("msgid \"\"\nmsgstr \"\"\n\"Content-Type: text/plain; charset=UTF-8\\n\"\n\n");
     for (const auto &[id, str] : messages)
         source += QStringLiteral("msgid %1\nmsgstr %2\n\n").arg(quoted(id), quoted(str));
-    return source;
+    return source.toUtf8();
 }
 
 void writeFile(const QString &path, const QByteArray &contents)
@@ -65,30 +50,6 @@ void writeExecutable(const QString &path)
 {
     writeFile(path, "#!/bin/sh\nexit 0\n");
     QFile::setPermissions(path, QFile::permissions(path) | QFile::ExeOwner | QFile::ReadOwner);
-}
-
-ScopedEnvironment::ScopedEnvironment(const char *name, const QByteArray &value)
-    : m_name(name), m_wasSet(qEnvironmentVariableIsSet(name)), m_previous(qgetenv(name))
-{
-    qputenv(name, value);
-}
-
-ScopedEnvironment::~ScopedEnvironment()
-{
-    if (m_wasSet)
-        qputenv(m_name, m_previous);
-    else
-        qunsetenv(m_name);
-}
-
-ScopedPreferredLanguages::ScopedPreferredLanguages(const QStringList &languages)
-{
-    setPreferredLanguagesForTesting(languages);
-}
-
-ScopedPreferredLanguages::~ScopedPreferredLanguages()
-{
-    setPreferredLanguagesForTesting({});
 }
 
 } // namespace zaf::bundle::test

@@ -1,23 +1,25 @@
 #pragma once
 
-// Fixtures for the bundle tests: gettext catalogues compiled with msgfmt at test time, desktop
-// entries and bundle directories in a scratch directory, and the XDG environment pointed at it.
+// Fixtures for the bundle tests: gettext catalogues compiled with msgfmt at test time, scratch files,
+// and environment settings undone at the end of a scope.
+
+#include "platform/bundle/bundle.h"
 
 #include <QByteArray>
 #include <QString>
 #include <QStringList>
 
+#include <utility>
+
 namespace zaf::bundle::test {
 
 enum class ByteOrder { Little, Big };
 
-// Compiles .po source with msgfmt; fails the current test (and returns "") when msgfmt fails.
-QByteArray compilePo(const QString &poSource, ByteOrder order = ByteOrder::Little);
-// The same for .po bytes in the charset their header declares.
-QByteArray compilePoBytes(const QByteArray &poSource, ByteOrder order = ByteOrder::Little);
+// Compiles .po source (in the charset its header declares) with msgfmt; fails the current test and
+// returns "" when msgfmt fails.
+QByteArray compilePo(const QByteArray &poSource, ByteOrder order = ByteOrder::Little);
 // A .po source with a UTF-8 header and the given msgid/msgstr pairs.
-QString poSource(const QList<std::pair<QString, QString>> &messages);
-
+QByteArray poSource(const QList<std::pair<QString, QString>> &messages);
 // Writes a file, creating its folders.
 void writeFile(const QString &path, const QByteArray &contents);
 // Writes an executable shell script that does nothing.
@@ -26,8 +28,12 @@ void writeExecutable(const QString &path);
 // Sets an environment variable for the lifetime of the object, then restores it.
 class ScopedEnvironment {
 public:
-    ScopedEnvironment(const char *name, const QByteArray &value);
-    ~ScopedEnvironment();
+    ScopedEnvironment(const char *name, const QByteArray &value)
+        : m_name(name), m_wasSet(qEnvironmentVariableIsSet(name)), m_previous(qgetenv(name))
+    {
+        qputenv(name, value);
+    }
+    ~ScopedEnvironment() { m_wasSet ? qputenv(m_name, m_previous) : qunsetenv(m_name); }
     ScopedEnvironment(const ScopedEnvironment &) = delete;
     ScopedEnvironment &operator=(const ScopedEnvironment &) = delete;
 
@@ -38,10 +44,9 @@ private:
 };
 
 // Sets the preferred languages for the lifetime of the object.
-class ScopedPreferredLanguages {
-public:
-    explicit ScopedPreferredLanguages(const QStringList &languages);
-    ~ScopedPreferredLanguages();
+struct ScopedPreferredLanguages {
+    explicit ScopedPreferredLanguages(const QStringList &languages) { setPreferredLanguagesForTesting(languages); }
+    ~ScopedPreferredLanguages() { setPreferredLanguagesForTesting({}); }
 };
 
 } // namespace zaf::bundle::test

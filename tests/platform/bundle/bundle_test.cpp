@@ -23,6 +23,16 @@ QString infoString(const QVariantMap &info, const char *key)
     return info.value(QString::fromLatin1(key)).toString();
 }
 
+const QString kEditorEntry = QStringLiteral("[Desktop Entry]\nType=Application\nName=Editor\nName[de]=Bearbeiter\n"
+                                            "Name[de_CH]=Bearbeiter (Schweiz)\nName[sr@latin]=Urednik\n"
+                                            "Exec=zaf-editor --new %F\nHidden=true\nNoDisplay=true\n");
+
+// An application entry that runs /bin/true.
+QString appEntry(const char *name)
+{
+    return QStringLiteral("[Desktop Entry]\nType=Application\nName=%1\nExec=/bin/true\n").arg(QLatin1String(name));
+}
+
 // Scratch XDG data directories: `home` is XDG_DATA_HOME, `system` the only XDG_DATA_DIRS entry, and
 // `bin` the only PATH entry.
 class DesktopEntryTest : public ::testing::Test {
@@ -42,13 +52,6 @@ protected:
         test::writeFile(base + QStringLiteral("/applications/") + relativePath, contents.toUtf8());
     }
 
-    QString editorEntry() const
-    {
-        return QStringLiteral("[Desktop Entry]\nType=Application\nName=Editor\nName[de]=Bearbeiter\n"
-                              "Name[de_CH]=Bearbeiter (Schweiz)\nName[sr@latin]=Urednik\n"
-                              "Exec=zaf-editor --new %F\nHidden=true\nNoDisplay=true\n");
-    }
-
     QTemporaryDir m_root;
     QString m_home;
     QString m_system;
@@ -58,11 +61,13 @@ protected:
     ScopedEnvironment m_path;
 };
 
-TEST_F(DesktopEntryTest, BundleWithIdentifierReadsTheEntryAndResolvesTheProgramThroughPath)
+// An entry gives a bundle (hidden ones too) found by id, file URL or the program it starts, with
+// its (localized) names and the program resolved through PATH; XDG_DATA_HOME wins over
+// XDG_DATA_DIRS, and an entry in a sub-folder has the folder in its id.
+TEST_F(DesktopEntryTest, BundlesComeFromEntriesByXdgRules)
 {
     test::writeExecutable(m_bin + QStringLiteral("/zaf-editor"));
-    writeEntry(m_home, QStringLiteral("org.example.Editor.desktop"), editorEntry());
-
+    writeEntry(m_home, QStringLiteral("org.example.Editor.desktop"), kEditorEntry);
     const auto bundle = Bundle::bundleWithIdentifier(QStringLiteral("org.example.Editor"));
     ASSERT_TRUE(bundle) << "Hidden and NoDisplay do not hide a bundle";
     EXPECT_EQ(bundle->bundleIdentifier(), QStringLiteral("org.example.Editor"));
@@ -72,33 +77,58 @@ TEST_F(DesktopEntryTest, BundleWithIdentifierReadsTheEntryAndResolvesTheProgramT
     EXPECT_EQ(infoString(info, kBundleNameKey), QStringLiteral("zaf-editor"));
     EXPECT_EQ(infoString(info, kExecutableKey), m_bin + QStringLiteral("/zaf-editor"));
     EXPECT_EQ(infoString(info, kIdentifierKey), QStringLiteral("org.example.Editor"));
-    EXPECT_TRUE(bundle->localizations().isEmpty());
     EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("KEY"), QString(), QString()), QStringLiteral("KEY"));
-
-    // The same bundle through its path and its file URL.
     const auto byUrl = Bundle::bundleWithURL(QUrl::fromLocalFile(bundle->bundlePath()));
-    ASSERT_TRUE(byUrl);
-    EXPECT_EQ(byUrl->bundleIdentifier(), QStringLiteral("org.example.Editor"));
+    EXPECT_EQ(byUrl ? byUrl->bundleIdentifier() : QString(), QStringLiteral("org.example.Editor"));
     EXPECT_FALSE(Bundle::bundleWithURL(QUrl(QStringLiteral("https://example.org/org.example.Editor.desktop"))));
-}
 
-TEST_F(DesktopEntryTest, BundleWithIdentifierFollowsXdgPrecedenceAndSubFolderIds)
-{
-    writeEntry(m_home, QStringLiteral("org.example.Both.desktop"), QStringLiteral("[Desktop Entry]\nType=Application\nName=From home\nExec=/bin/true\n"));
-    writeEntry(m_system, QStringLiteral("org.example.Both.desktop"), QStringLiteral("[Desktop Entry]\nType=Application\nName=From system\nExec=/bin/true\n"));
-    writeEntry(m_system, QStringLiteral("vendor/tool.desktop"), QStringLiteral("[Desktop Entry]\nType=Application\nName=Vendor tool\nExec=/bin/true\n"));
+    // Name[...] keys follow the desktop-entry locale rules for each preferred language in turn.
+    const struct {
+        QStringList languages;
+        QString expected; // "" when no translation serves the languages
+    } cases[] = {
+        {{QStringLiteral("de-CH")}, QStringLiteral("Bearbeiter (Schweiz)")},
+        {{QStringLiteral("de-AT")}, QStringLiteral("Bearbeiter")},
+        {{QStringLiteral("de")}, QStringLiteral("Bearbeiter")},
+        {{QStringLiteral("sr-Latn-RS")}, QStringLiteral("Urednik")},
+        {{QStringLiteral("fr-FR")}, QString()},
+        {{QStringLiteral("fr-FR"), QStringLiteral("de-CH")}, QStringLiteral("Bearbeiter (Schweiz)")},
+        {{QStringLiteral("de-DE"), QStringLiteral("de-CH")}, QStringLiteral("Bearbeiter")},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.languages.join(QLatin1Char(',')).toStdString());
+        ScopedPreferredLanguages languages(c.languages);
+        const QVariantMap localized = bundle->localizedInfoDictionary();
+        EXPECT_EQ(infoString(localized, kDisplayNameKey), c.expected);
+        EXPECT_EQ(localized.contains(QString::fromLatin1(kDisplayNameKey)), !c.expected.isEmpty());
+    }
+    EXPECT_EQ(infoString(bundle->infoDictionary(), kDisplayNameKey), QStringLiteral("Editor"));
 
+    writeEntry(m_home, QStringLiteral("org.example.Both.desktop"), appEntry("From home"));
+    writeEntry(m_system, QStringLiteral("org.example.Both.desktop"), appEntry("From system"));
+    writeEntry(m_system, QStringLiteral("vendor/tool.desktop"), appEntry("Vendor tool"));
     const auto both = Bundle::bundleWithIdentifier(QStringLiteral("org.example.Both"));
-    ASSERT_TRUE(both);
-    EXPECT_EQ(infoString(both->infoDictionary(), kDisplayNameKey), QStringLiteral("From home"));
-
+    EXPECT_EQ(both ? infoString(both->infoDictionary(), kDisplayNameKey) : QString(), QStringLiteral("From home"));
     const auto tool = Bundle::bundleWithIdentifier(QStringLiteral("vendor-tool"));
     ASSERT_TRUE(tool);
     EXPECT_EQ(tool->bundleIdentifier(), QStringLiteral("vendor-tool"));
     EXPECT_EQ(infoString(tool->infoDictionary(), kDisplayNameKey), QStringLiteral("Vendor tool"));
     EXPECT_EQ(infoString(tool->infoDictionary(), kBundleNameKey), QStringLiteral("true"));
+
+    // What /proc/PID/exe shows is the resolved program; TryExec may name it through a link in PATH.
+    test::writeExecutable(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")));
+    QFile::link(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")), m_bin + QStringLiteral("/zaf-viewer"));
+    writeEntry(m_system, QStringLiteral("org.example.Viewer.desktop"),
+               QStringLiteral("[Desktop Entry]\nType=Application\nName=Viewer\nTryExec=zaf-viewer\nExec=sh -c zaf-viewer\n"));
+    const auto editor = Bundle::bundleForExecutablePath(m_bin + QStringLiteral("/zaf-editor"));
+    EXPECT_EQ(editor ? editor->bundleIdentifier() : QString(), QStringLiteral("org.example.Editor"));
+    const auto viewer = Bundle::bundleForExecutablePath(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")));
+    EXPECT_EQ(viewer ? viewer->bundleIdentifier() : QString(), QStringLiteral("org.example.Viewer"));
+    EXPECT_FALSE(Bundle::bundleForExecutablePath(m_root.filePath(QStringLiteral("opt/other"))));
+    EXPECT_FALSE(Bundle::bundleForExecutablePath(QString()));
 }
 
+// Unknown ids give none quietly; entries that are no application, or broken, give none and a log.
 TEST_F(DesktopEntryTest, BundleWithIdentifierGivesNoneForUnknownOrInvalidEntries)
 {
     writeEntry(m_home, QStringLiteral("org.example.Link.desktop"), QStringLiteral("[Desktop Entry]\nType=Link\nName=Link\nURL=https://example.org\n"));
@@ -123,56 +153,6 @@ TEST_F(DesktopEntryTest, BundleWithIdentifierGivesNoneForUnknownOrInvalidEntries
     }
 }
 
-TEST_F(DesktopEntryTest, LocalizedNameFollowsDesktopEntryLocaleRulesForEachPreferredLanguage)
-{
-    writeEntry(m_home, QStringLiteral("org.example.Editor.desktop"), editorEntry());
-    const auto bundle = Bundle::bundleWithIdentifier(QStringLiteral("org.example.Editor"));
-    ASSERT_TRUE(bundle);
-
-    const struct {
-        QStringList languages;
-        QString expected; // "" when no translation serves the languages
-    } cases[] = {
-        {{QStringLiteral("de-CH")}, QStringLiteral("Bearbeiter (Schweiz)")},
-        {{QStringLiteral("de-AT")}, QStringLiteral("Bearbeiter")},
-        {{QStringLiteral("de")}, QStringLiteral("Bearbeiter")},
-        {{QStringLiteral("sr-Latn-RS")}, QStringLiteral("Urednik")},
-        {{QStringLiteral("fr-FR")}, QString()},
-        {{QStringLiteral("fr-FR"), QStringLiteral("de-CH")}, QStringLiteral("Bearbeiter (Schweiz)")},
-        {{QStringLiteral("de-DE"), QStringLiteral("de-CH")}, QStringLiteral("Bearbeiter")},
-    };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.languages.join(QLatin1Char(',')).toStdString());
-        ScopedPreferredLanguages languages(c.languages);
-        const QVariantMap localized = bundle->localizedInfoDictionary();
-        EXPECT_EQ(infoString(localized, kDisplayNameKey), c.expected);
-        EXPECT_EQ(localized.contains(QString::fromLatin1(kDisplayNameKey)), !c.expected.isEmpty());
-        EXPECT_EQ(infoString(bundle->infoDictionary(), kDisplayNameKey), QStringLiteral("Editor"));
-    }
-}
-
-TEST_F(DesktopEntryTest, BundleForExecutablePathFindsTheEntryThatStartsTheProgram)
-{
-    test::writeExecutable(m_bin + QStringLiteral("/zaf-editor"));
-    test::writeExecutable(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")));
-    QFile::link(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")), m_bin + QStringLiteral("/zaf-viewer"));
-    writeEntry(m_system, QStringLiteral("org.example.Editor.desktop"), editorEntry());
-    writeEntry(m_system, QStringLiteral("org.example.Viewer.desktop"),
-               QStringLiteral("[Desktop Entry]\nType=Application\nName=Viewer\nTryExec=zaf-viewer\nExec=sh -c zaf-viewer\n"));
-
-    const auto editor = Bundle::bundleForExecutablePath(m_bin + QStringLiteral("/zaf-editor"));
-    ASSERT_TRUE(editor);
-    EXPECT_EQ(editor->bundleIdentifier(), QStringLiteral("org.example.Editor"));
-
-    // What /proc/PID/exe shows is the resolved program; TryExec names it through a link in PATH.
-    const auto viewer = Bundle::bundleForExecutablePath(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")));
-    ASSERT_TRUE(viewer);
-    EXPECT_EQ(viewer->bundleIdentifier(), QStringLiteral("org.example.Viewer"));
-
-    EXPECT_FALSE(Bundle::bundleForExecutablePath(m_root.filePath(QStringLiteral("opt/other"))));
-    EXPECT_FALSE(Bundle::bundleForExecutablePath(QString()));
-}
-
 // A directory bundle with an information dictionary, a resource directory and three localizations.
 class DirectoryBundleTest : public ::testing::Test {
 protected:
@@ -182,13 +162,11 @@ protected:
         const QString resources = m_path + QStringLiteral("/Resources");
         test::writeFile(m_path + QStringLiteral("/Info.desktop"),
                         "[Desktop Entry]\nType=Service\nName=Zafrel\nName[de]=Zafrel DE\nX-Zaf-Identifier=org.example.Zafrel\n");
+        const auto table = [](const QList<std::pair<QString, QString>> &pairs) { return test::compilePo(test::poSource(pairs)); };
         test::writeFile(resources + QStringLiteral("/de.lproj/Localizable.mo"),
-                        test::compilePo(test::poSource({{QStringLiteral("HELLO"), QStringLiteral("Hallo")},
-                                                        {QStringLiteral("ONLY_DE"), QStringLiteral("Nur Deutsch")}})));
-        test::writeFile(resources + QStringLiteral("/de.lproj/Other.mo"),
-                        test::compilePo(test::poSource({{QStringLiteral("HELLO"), QStringLiteral("Servus")}})));
-        test::writeFile(resources + QStringLiteral("/en.lproj/Localizable.mo"),
-                        test::compilePo(test::poSource({{QStringLiteral("HELLO"), QStringLiteral("Hello")}})));
+                        table({{QStringLiteral("HELLO"), QStringLiteral("Hallo")}, {QStringLiteral("ONLY_DE"), QStringLiteral("Nur Deutsch")}}));
+        test::writeFile(resources + QStringLiteral("/de.lproj/Other.mo"), table({{QStringLiteral("HELLO"), QStringLiteral("Servus")}}));
+        test::writeFile(resources + QStringLiteral("/en.lproj/Localizable.mo"), table({{QStringLiteral("HELLO"), QStringLiteral("Hello")}}));
         test::writeFile(resources + QStringLiteral("/pt_BR.lproj/Localizable.mo"), "corrupt catalogue bytes, long enough for a header");
         ASSERT_TRUE(QDir().mkpath(resources + QStringLiteral("/not-a-localization")));
     }
@@ -197,6 +175,8 @@ protected:
     QString m_path;
 };
 
+// A directory bundle has its information, resources and localizations; a bare localization folder
+// is a bundle too, a malformed information file leaves none, and missing paths give no bundle.
 TEST_F(DirectoryBundleTest, OpensWithItsInformationDictionaryResourcesAndLocalizations)
 {
     const auto bundle = Bundle::bundleWithPath(m_path);
@@ -220,70 +200,61 @@ TEST_F(DirectoryBundleTest, OpensWithItsInformationDictionaryResourcesAndLocaliz
     EXPECT_FALSE(Bundle::bundleWithPath(m_root.filePath(QStringLiteral("missing"))));
     EXPECT_FALSE(Bundle::bundleWithPath(m_path + QStringLiteral("/Info.desktop"))) << "not an application entry";
     EXPECT_FALSE(Bundle::bundleWithPath(QString()));
-}
 
-TEST_F(DirectoryBundleTest, DirectoryWithoutInformationOrResourcesIsItsOwnResourceDirectory)
-{
-    const auto bundle = Bundle::bundleWithPath(m_path + QStringLiteral("/Resources/de.lproj"));
-    ASSERT_TRUE(bundle);
-    EXPECT_TRUE(bundle->infoDictionary().isEmpty());
-    EXPECT_TRUE(bundle->bundleIdentifier().isEmpty());
-    EXPECT_EQ(bundle->resourcePath(), m_path + QStringLiteral("/Resources/de.lproj"));
-    EXPECT_TRUE(bundle->localizations().isEmpty());
+    // A bare localization folder is a bundle of its own whose table answers whatever the languages.
+    const auto bare = Bundle::bundleWithPath(m_path + QStringLiteral("/Resources/de.lproj"));
+    ASSERT_TRUE(bare);
+    EXPECT_TRUE(bare->infoDictionary().isEmpty());
+    EXPECT_EQ(bare->resourcePath(), m_path + QStringLiteral("/Resources/de.lproj"));
+    EXPECT_TRUE(bare->localizations().isEmpty());
     ScopedPreferredLanguages languages({QStringLiteral("en")});
-    EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("HELLO"), QString(), QString()), QStringLiteral("Hallo"));
-    EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("MISSING"), QString(), QString()), QStringLiteral("MISSING"));
+    EXPECT_EQ(bare->localizedStringForKey(QStringLiteral("HELLO"), QString(), QString()), QStringLiteral("Hallo"));
+    EXPECT_EQ(bare->localizedStringForKey(QStringLiteral("MISSING"), QString(), QString()), QStringLiteral("MISSING"));
+
+    // A malformed information dictionary is logged and leaves the bundle without one, but usable.
+    test::writeFile(m_path + QStringLiteral("/Info.desktop"), "[Desktop Entry\nName=broken\n");
+    zaf::test::LogCapture log;
+    const auto malformed = Bundle::bundleWithPath(m_path);
+    ASSERT_TRUE(malformed);
+    EXPECT_TRUE(malformed->infoDictionary().isEmpty());
+    EXPECT_TRUE(malformed->localizedInfoDictionary().isEmpty());
+    EXPECT_EQ(log.messages(QStringLiteral("zaf.bundle")).size(), 1);
+    EXPECT_EQ(malformed->localizations().size(), 3);
 }
 
+// Lookups use the best localization's table alone, then the value, then the key; a corrupt table is logged once.
 TEST_F(DirectoryBundleTest, LookupUsesTheBestLocalizationAndFallsBackToValueThenKey)
 {
     const auto bundle = Bundle::bundleWithPath(m_path);
     ASSERT_TRUE(bundle);
-    {
-        ScopedPreferredLanguages languages({QStringLiteral("de-CH"), QStringLiteral("en")});
-        EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("HELLO"), QString(), QString()), QStringLiteral("Hallo"));
-        EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("HELLO"), QString(), QStringLiteral("Localizable")), QStringLiteral("Hallo"));
-        EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("HELLO"), QString(), QStringLiteral("Other")), QStringLiteral("Servus"));
-        EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("MISSING"), QStringLiteral("Default"), QString()), QStringLiteral("Default"));
-        EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("MISSING"), QString(), QString()), QStringLiteral("MISSING"));
-        EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("HELLO"), QString(), QStringLiteral("NoSuchTable")), QStringLiteral("HELLO"));
-    }
-    {
-        // A change of languages takes effect on the next lookup; the key missing from the chosen
-        // table is not looked up in another localization.
-        ScopedPreferredLanguages languages({QStringLiteral("en-GB")});
-        EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("HELLO"), QString(), QString()), QStringLiteral("Hello"));
-        EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("ONLY_DE"), QString(), QString()), QStringLiteral("ONLY_DE"));
-    }
-}
-
-TEST_F(DirectoryBundleTest, CorruptTableIsEmptyAndLoggedOnce)
-{
-    const auto bundle = Bundle::bundleWithPath(m_path);
-    ASSERT_TRUE(bundle);
-    ScopedPreferredLanguages languages({QStringLiteral("pt-BR")});
     zaf::test::LogCapture log;
-    EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("HELLO"), QString(), QString()), QStringLiteral("HELLO"));
-    EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("HELLO"), QStringLiteral("Olá"), QString()), QStringLiteral("Olá"));
-    const QStringList messages = log.messages(QStringLiteral("zaf.bundle"));
+    const struct {
+        const char *languages, *key, *value, *table, *expected;
+    } cases[] = {
+        {"de-CH,en", "HELLO", "", "", "Hallo"},
+        {"de-CH,en", "HELLO", "", "Localizable", "Hallo"},
+        {"de-CH,en", "HELLO", "", "Other", "Servus"},
+        {"de-CH,en", "MISSING", "Default", "", "Default"},
+        {"de-CH,en", "MISSING", "", "", "MISSING"},
+        {"de-CH,en", "HELLO", "", "NoSuchTable", "HELLO"},
+        {"en-GB", "HELLO", "", "", "Hello"},
+        {"en-GB", "ONLY_DE", "", "", "ONLY_DE"},
+        {"pt-BR", "HELLO", "", "", "HELLO"},
+        {"pt-BR", "HELLO", "Olá", "", "Olá"},
+    };
+    const auto text = [](const char *s) { return *s ? QString::fromUtf8(s) : QString(); };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(std::string(c.languages) + " " + c.key + " " + c.table);
+        ScopedPreferredLanguages languages(text(c.languages).split(QLatin1Char(',')));
+        EXPECT_EQ(bundle->localizedStringForKey(text(c.key), text(c.value), text(c.table)), text(c.expected));
+    }
+    const QStringList messages = log.messages(QStringLiteral("zaf.bundle")).filter(QStringLiteral("pt_BR.lproj/Localizable.mo"));
     ASSERT_EQ(messages.size(), 1);
-    EXPECT_TRUE(messages.first().contains(QStringLiteral("pt_BR.lproj/Localizable.mo"))) << messages.first().toStdString();
     EXPECT_TRUE(messages.first().contains(QStringLiteral("magic"))) << messages.first().toStdString();
 }
 
-TEST_F(DirectoryBundleTest, MalformedInformationDictionaryLeavesTheBundleWithoutOne)
-{
-    test::writeFile(m_path + QStringLiteral("/Info.desktop"), "[Desktop Entry\nName=broken\n");
-    zaf::test::LogCapture log;
-    const auto bundle = Bundle::bundleWithPath(m_path);
-    ASSERT_TRUE(bundle);
-    EXPECT_TRUE(bundle->infoDictionary().isEmpty());
-    EXPECT_TRUE(bundle->localizedInfoDictionary().isEmpty());
-    EXPECT_EQ(log.messages(QStringLiteral("zaf.bundle")).size(), 1);
-    EXPECT_EQ(bundle->localizations().size(), 3);
-}
-
-TEST(ExecutablePathOfProcessTest, ReadsTheRunningTestProgram)
+// The running test program is read through /proc; unreadable processes give 0 and an empty path.
+TEST(ExecutablePathOfProcessTest, ReadsTheRunningProgramAndGivesZeroForOthers)
 {
     QString path;
     const int length = executablePathOfProcess(getpid(), &path);
@@ -291,16 +262,10 @@ TEST(ExecutablePathOfProcessTest, ReadsTheRunningTestProgram)
     EXPECT_EQ(path, expected);
     EXPECT_EQ(length, expected.toUtf8().size());
     EXPECT_EQ(executablePathOfProcess(getpid(), nullptr), length);
-}
-
-TEST(ExecutablePathOfProcessTest, GivesZeroForProcessesThatCannotBeRead)
-{
-    QString path = QStringLiteral("stale");
-    EXPECT_EQ(executablePathOfProcess(0, &path), 0);
-    EXPECT_TRUE(path.isEmpty());
-    EXPECT_EQ(executablePathOfProcess(-1, &path), 0);
-    EXPECT_EQ(executablePathOfProcess(0x3ffffff0, &path), 0); // above the kernel's largest PID
-    EXPECT_TRUE(path.isEmpty());
+    for (const pid_t pid : {0, -1, 0x3ffffff0}) { // the last above the kernel's largest PID
+        EXPECT_EQ(executablePathOfProcess(pid, &path), 0) << pid;
+        EXPECT_TRUE(path.isEmpty()) << pid;
+    }
 }
 
 } // namespace

@@ -8,14 +8,7 @@
 namespace zaf::bundle {
 namespace {
 
-QStringList list(std::initializer_list<const char *> items)
-{
-    QStringList result;
-    for (const char *item : items)
-        result << QString::fromLatin1(item);
-    return result;
-}
-
+// Localizations are ordered by the best match for each preference, then the rest as given.
 TEST(PreferredLocalizationsTest, OrdersLocalizationsByPreferenceThenKeepsTheRestInOrder)
 {
     const struct {
@@ -24,24 +17,26 @@ TEST(PreferredLocalizationsTest, OrdersLocalizationsByPreferenceThenKeepsTheRest
         QStringList expected;
     } cases[] = {
         // A regional preference is served by its language; the second preference comes next.
-        {list({"en", "de", "fr"}), list({"de-CH", "en"}), list({"de", "en", "fr"})},
-        {list({"en", "de", "fr"}), list({"fr"}), list({"fr", "en", "de"})},
+        {{"en", "de", "fr"}, {"de-CH", "en"}, {"de", "en", "fr"}},
+        {{"en", "de", "fr"}, {"fr"}, {"fr", "en", "de"}},
         // Folder names use "_"; the exact region wins over the bare language.
-        {list({"pt", "pt_BR"}), list({"pt-BR"}), list({"pt_BR", "pt"})},
-        {list({"pt_BR", "pt", "en"}), list({"pt-BR", "en"}), list({"pt_BR", "pt", "en"})},
+        {{"pt", "pt_BR"}, {"pt-BR"}, {"pt_BR", "pt"}},
+        {{"pt_BR", "pt", "en"}, {"pt-BR", "en"}, {"pt_BR", "pt", "en"}},
         // Scripts matter: traditional Chinese in Taiwan is not served by simplified Chinese first.
-        {list({"zh_CN", "zh_TW"}), list({"zh-Hant-TW"}), list({"zh_TW", "zh_CN"})},
-        // Preferences no localization serves leave the development localization first, then the
-        // given order.
-        {list({"en", "de"}), list({"ja-JP"}), list({"en", "de"})},
-        {list({"de", "en", "fr"}), list({"pl-PL"}), list({"en", "de", "fr"})},
-        {list({"de", "fr"}), list({"pl"}), list({"de", "fr"})},
-        {list({"de", "en"}), QStringList(), list({"en", "de"})},
-        {list({"de", "en", "ja"}), list({"ja", "pl"}), list({"ja", "en", "de"})},
-        {QStringList(), list({"de"}), QStringList()},
+        {{"zh_CN", "zh_TW"}, {"zh-Hant-TW"}, {"zh_TW", "zh_CN"}},
+        // Preferences no localization serves leave the development localization first, then the rest.
+        {{"en", "de"}, {"ja-JP"}, {"en", "de"}},
+        {{"de", "en", "fr"}, {"pl-PL"}, {"en", "de", "fr"}},
+        {{"de", "fr"}, {"pl"}, {"de", "fr"}},
+        {{"de", "en"}, {}, {"en", "de"}},
+        {{"de", "en", "ja"}, {"ja", "pl"}, {"ja", "en", "de"}},
+        {{}, {"de"}, {}},
         // Names that are not language tags never match but are kept.
-        {list({"Base", "de", "en"}), list({"de", "en"}), list({"de", "en", "Base"})},
-        {list({"en", "de"}), list({"not a tag!", "de"}), list({"de", "en"})},
+        {{"Base", "de", "en"}, {"de", "en"}, {"de", "en", "Base"}},
+        {{"en", "de"}, {"not a tag!", "de"}, {"de", "en"}},
+        // The given order breaks ties between equally good localizations.
+        {{"de_AT", "de_CH"}, {"de"}, {"de_AT", "de_CH"}},
+        {{"de_CH", "de_AT"}, {"de"}, {"de_CH", "de_AT"}},
     };
     for (const auto &c : cases) {
         SCOPED_TRACE((c.localizations.join(QLatin1Char(',')) + QStringLiteral(" for ") + c.preferences.join(QLatin1Char(','))).toStdString());
@@ -49,17 +44,11 @@ TEST(PreferredLocalizationsTest, OrdersLocalizationsByPreferenceThenKeepsTheRest
     }
 }
 
-TEST(PreferredLocalizationsTest, GivenOrderBreaksTiesBetweenEquallyGoodLocalizations)
-{
-    EXPECT_EQ(preferredLocalizationsFromArray(list({"de_AT", "de_CH"}), list({"de"})).first(), QStringLiteral("de_AT"));
-    EXPECT_EQ(preferredLocalizationsFromArray(list({"de_CH", "de_AT"}), list({"de"})).first(), QStringLiteral("de_CH"));
-}
-
+// The system languages as tags (C and POSIX meaning English), replaced while a test override is set.
 TEST(PreferredLanguagesTest, TestOverrideReplacesTheSystemLanguagesUntilCleared)
 {
     QStringList system;
     for (QString language : QLocale::system().uiLanguages()) {
-        // The C locale (as on build machines) is the untranslated, English one.
         if (language == QLatin1String("C") || language == QLatin1String("POSIX"))
             language = QStringLiteral("en");
         system << language.replace(QLatin1Char('_'), QLatin1Char('-'));
@@ -67,15 +56,16 @@ TEST(PreferredLanguagesTest, TestOverrideReplacesTheSystemLanguagesUntilCleared)
     system.removeDuplicates();
     EXPECT_EQ(preferredLanguages(), system);
     {
-        test::ScopedPreferredLanguages languages(list({"de-CH", "en"}));
-        EXPECT_EQ(preferredLanguages(), list({"de-CH", "en"}));
+        test::ScopedPreferredLanguages languages(QStringList{"de-CH", "en"});
+        EXPECT_EQ(preferredLanguages(), (QStringList{"de-CH", "en"}));
     }
     EXPECT_EQ(preferredLanguages(), system);
 }
 
+// The system languages follow LANGUAGE, as tags with "-".
 TEST(PreferredLanguagesTest, SystemLanguagesHonourTheLanguageVariable)
 {
-    // Qt reads LANGUAGE when asked for the user interface languages (LANG only once per process).
+    // Qt reads LANGUAGE at each request (LANG only once per process).
     test::ScopedEnvironment language("LANGUAGE", "de_CH:fr");
     const QStringList languages = preferredLanguages();
     ASSERT_GE(languages.size(), 2);

@@ -8,6 +8,7 @@
 #include <gtest/gtest.h>
 
 #include <functional>
+#include <vector>
 
 namespace zaf::bundle {
 namespace {
@@ -42,44 +43,41 @@ msgid "Untranslated"
 msgstr ""
 )";
 
-class MoCatalogByteOrderTest : public ::testing::TestWithParam<ByteOrder> {};
-
-TEST_P(MoCatalogByteOrderTest, ParsesMsgfmtOutputWithContextPluralsAndHeader)
+// In both byte orders, contexts are keyed "context\x04id", plurals by their singular form, and the
+// header and untranslated entries are no messages.
+TEST(MoCatalogTest, ParsesMsgfmtOutputWithContextPluralsAndHeader)
 {
-    const QByteArray data = test::compilePo(QString::fromUtf8(kRichPo), GetParam());
-    ASSERT_FALSE(data.isEmpty());
-    const MoCatalog catalog = parseMoCatalog(data);
-    ASSERT_TRUE(catalog.isValid()) << catalog.error.toStdString();
-    EXPECT_EQ(catalog.strings.value(QStringLiteral("Hello")), QStringLiteral("Hallo"));
-    EXPECT_EQ(catalog.strings.value(QStringLiteral("SHARE_TEXT_FORMAT")), QStringLiteral("Geteilt mit %@ \"Zitat\""));
-    EXPECT_EQ(catalog.strings.value(QStringLiteral("Open")), QStringLiteral("Aufmachen"));
-    EXPECT_EQ(catalog.strings.value(QStringLiteral("menu\x04Open")), QStringLiteral("Öffnen"));
-    EXPECT_EQ(catalog.strings.value(QStringLiteral("%d file")), QStringLiteral("%d Datei"));
-    EXPECT_FALSE(catalog.strings.contains(QStringLiteral("%d files")));
-    EXPECT_FALSE(catalog.strings.contains(QString())) << "the header entry is not a message";
-    EXPECT_FALSE(catalog.strings.contains(QStringLiteral("Untranslated")));
-    EXPECT_EQ(catalog.strings.size(), 5);
+    for (const ByteOrder order : {ByteOrder::Little, ByteOrder::Big}) {
+        const MoCatalog catalog = parseMoCatalog(test::compilePo(kRichPo, order));
+        ASSERT_TRUE(catalog.isValid()) << catalog.error.toStdString();
+        EXPECT_EQ(catalog.strings, (QHash<QString, QString>{{QStringLiteral("Hello"), QStringLiteral("Hallo")},
+                                                        {QStringLiteral("SHARE_TEXT_FORMAT"), QStringLiteral("Geteilt mit %@ \"Zitat\"")},
+                                                        {QStringLiteral("Open"), QStringLiteral("Aufmachen")},
+                                                        {QStringLiteral("menu\x04Open"), QStringLiteral("Öffnen")},
+                                                        {QStringLiteral("%d file"), QStringLiteral("%d Datei")}}))
+            << (order == ByteOrder::Big ? "big-endian" : "little-endian");
+    }
 }
 
-INSTANTIATE_TEST_SUITE_P(BothByteOrders, MoCatalogByteOrderTest, ::testing::Values(ByteOrder::Little, ByteOrder::Big),
-                         [](const auto &info) { return info.param == ByteOrder::Little ? "Little" : "Big"; });
-
+// Strings are decoded in the charset the header declares.
 TEST(MoCatalogTest, DecodesStringsInTheHeadersLatin1Charset)
 {
     const QByteArray po = QByteArrayLiteral("msgid \"\"\nmsgstr \"Content-Type: text/plain; charset=ISO-8859-1\\n\"\n\n"
                                             "msgid \"Greeting\"\nmsgstr \"Gr\xfc\xdf" "e\"\n");
-    const QByteArray data = test::compilePoBytes(po);
+    const QByteArray data = test::compilePo(po);
     ASSERT_TRUE(data.contains("Gr\xfc\xdf" "e")) << "msgfmt keeps the catalogue in Latin-1";
     const MoCatalog catalog = parseMoCatalog(data);
     ASSERT_TRUE(catalog.isValid()) << catalog.error.toStdString();
     EXPECT_EQ(catalog.strings.value(QStringLiteral("Greeting")), QStringLiteral("Grüße"));
 }
 
+// A file is read whole; a missing, corrupt or too large (over 16 MiB) file gives an error naming it.
 TEST(MoCatalogTest, ReadsAFileAndNamesItInErrors)
 {
     QTemporaryDir dir;
+    const QByteArray valid = test::compilePo(test::poSource({{QStringLiteral("a"), QStringLiteral("b")}}));
     const QString good = dir.filePath(QStringLiteral("good.mo"));
-    test::writeFile(good, test::compilePo(test::poSource({{QStringLiteral("a"), QStringLiteral("b")}})));
+    test::writeFile(good, valid);
     const MoCatalog read = readMoCatalog(good);
     ASSERT_TRUE(read.isValid()) << read.error.toStdString();
     EXPECT_EQ(read.strings.value(QStringLiteral("a")), QStringLiteral("b"));
@@ -88,34 +86,26 @@ TEST(MoCatalogTest, ReadsAFileAndNamesItInErrors)
     EXPECT_FALSE(missing.isValid());
     EXPECT_TRUE(missing.error.contains(QStringLiteral("missing.mo")));
 
-    const QString bad = dir.filePath(QStringLiteral("bad.mo"));
-    test::writeFile(bad, QByteArray(64, 'x'));
-    const MoCatalog corrupt = readMoCatalog(bad);
+    test::writeFile(dir.filePath(QStringLiteral("bad.mo")), QByteArray(64, 'x'));
+    const MoCatalog corrupt = readMoCatalog(dir.filePath(QStringLiteral("bad.mo")));
     EXPECT_FALSE(corrupt.isValid());
-    EXPECT_TRUE(corrupt.error.contains(QStringLiteral("bad.mo"))) << corrupt.error.toStdString();
-    EXPECT_TRUE(corrupt.error.contains(QStringLiteral("magic"))) << corrupt.error.toStdString();
-}
+    EXPECT_TRUE(corrupt.error.contains(QStringLiteral("bad.mo")) && corrupt.error.contains(QStringLiteral("magic")))
+        << corrupt.error.toStdString();
 
-TEST(MoCatalogTest, RefusesFilesLargerThanSixteenMebibytes)
-{
-    QTemporaryDir dir;
-    const QString path = dir.filePath(QStringLiteral("huge.mo"));
-    QFile file(path);
-    ASSERT_TRUE(file.open(QIODevice::WriteOnly));
-    // A valid catalogue at the start, then a sparse tail that takes the file past the limit.
-    ASSERT_GT(file.write(test::compilePo(test::poSource({{QStringLiteral("a"), QStringLiteral("b")}}))), 0);
-    ASSERT_TRUE(file.resize(kMaxMoFileSize + 1));
-    file.close();
-    const MoCatalog catalog = readMoCatalog(path);
-    EXPECT_FALSE(catalog.isValid());
-    EXPECT_TRUE(catalog.error.contains(QStringLiteral("exceeds"))) << catalog.error.toStdString();
-    EXPECT_TRUE(catalog.strings.isEmpty());
-
+    // A valid catalogue followed by a sparse tail past the limit.
+    QFile huge(dir.filePath(QStringLiteral("huge.mo")));
+    ASSERT_TRUE(huge.open(QIODevice::WriteOnly));
+    ASSERT_EQ(huge.write(valid), valid.size());
+    ASSERT_TRUE(huge.resize(kMaxMoFileSize + 1));
+    huge.close();
+    const MoCatalog tooLarge = readMoCatalog(huge.fileName());
+    EXPECT_FALSE(tooLarge.isValid());
+    EXPECT_TRUE(tooLarge.error.contains(QStringLiteral("exceeds"))) << tooLarge.error.toStdString();
+    EXPECT_TRUE(tooLarge.strings.isEmpty());
     EXPECT_FALSE(parseMoCatalog(QByteArray(kMaxMoFileSize + 1, '\0')).isValid());
 }
 
-// Corrupt variants of a little-endian msgfmt catalogue. The layout is read here independently of the
-// reader: header words, then the descriptor tables.
+// The layout of a little-endian msgfmt catalogue, read independently of the reader.
 struct Layout {
     QByteArray data;
     quint32 word(qint64 at) const { return qFromLittleEndian<quint32>(data.constData() + at); }
@@ -152,6 +142,7 @@ protected:
     Layout m_layout;
 };
 
+// Each corruption of the header, the tables or the strings gives an error saying what is wrong, and no strings.
 TEST_F(MoCatalogCorruptionTest, EveryCorruptVariantGivesAnErrorAndNoStrings)
 {
     const std::vector<Corruption> corruptions = {
@@ -196,28 +187,23 @@ TEST_F(MoCatalogCorruptionTest, EveryCorruptVariantGivesAnErrorAndNoStrings)
     }
 }
 
-TEST_F(MoCatalogCorruptionTest, EveryTruncationOfAValidCatalogueGivesAnError)
+// Every truncation is an error, and every header or descriptor word set to an edge value is read
+// without a crash (most of them are fatal: the magic, table offsets, any length of 0xffffffff).
+TEST_F(MoCatalogCorruptionTest, TruncatedOrEdgeValuedCataloguesAreReadWithinBounds)
 {
     for (qsizetype size = 0; size < m_layout.data.size(); ++size) {
         const QByteArray prefix(m_layout.data.constData(), size); // a copy: reads past it are caught
         EXPECT_FALSE(parseMoCatalog(prefix).isValid()) << "prefix of " << size << " bytes";
     }
-}
-
-TEST_F(MoCatalogCorruptionTest, CorruptingAnyHeaderOrDescriptorWordNeverCrashes)
-{
-    // Every word of the header and the descriptor tables set to values at the edges of the range.
     const qint64 end = qMax<qint64>(m_layout.originals(), m_layout.translations()) + 8 * m_layout.count();
     int errors = 0;
     for (qint64 at = 0; at + 4 <= end; at += 4) {
         for (quint32 value : {0u, 1u, 0x7fffffffu, 0xfffffff0u, 0xffffffffu, quint32(m_layout.data.size())}) {
             QByteArray data = m_layout.data;
             putWord(data, at, value);
-            if (!parseMoCatalog(data).isValid())
-                ++errors;
+            errors += parseMoCatalog(data).isValid() ? 0 : 1;
         }
     }
-    // Most of these are fatal (the magic, the tables' offsets, any string length of 0xffffffff).
     EXPECT_GT(errors, int(end / 4));
 }
 

@@ -1,13 +1,9 @@
 #pragma once
 
-// A small AppStream collection written at test time, in a directory of the test's own, so that
-// store lookups never see the system's catalogue.
-//
-// The directory's path is fixed per test (under the temporary directory): AppStream keeps a cache
-// file per catalogue path, and when it runs with root rights that cache lives in a system-wide
-// directory that XDG_CACHE_HOME does not move, so a fresh random path per run would leave a new
-// cache file there every time. XDG_CACHE_HOME is pointed at a scratch directory for every other
-// case.
+// A small AppStream collection written at test time into a directory of the test's own, so store
+// lookups never see the system's catalogue. The path is fixed per test: AppStream keeps a cache file
+// per catalogue path, and as root in a system directory XDG_CACHE_HOME does not move, so a random path
+// would leave a new file there on every run.
 
 #include <QByteArray>
 #include <QDir>
@@ -19,30 +15,20 @@
 
 namespace zaf::test {
 
-// Three components: a complete one (with a German name), one without a name, and one with a name
-// only.
+// A complete component (with a German name), one without a name, and one with a name only.
 inline const char *kFixtureCollection = R"(<?xml version="1.0" encoding="UTF-8"?>
 <components version="0.16" origin="zaf-fixture">
   <component type="desktop-application">
     <id>org.zafrel.Recorder</id>
-    <name>Zafrel Recorder</name>
-    <name xml:lang="de">Zafrel Rekorder</name>
-    <summary>Records the screen</summary>
+    <name>Zafrel Recorder</name><name xml:lang="de">Zafrel Rekorder</name><summary>Records the screen</summary>
     <developer_name>Zafrel Labs</developer_name>
-    <categories>
-      <category>AudioVideo</category>
-      <category>Recorder</category>
-    </categories>
+    <categories><category>AudioVideo</category><category>Recorder</category></categories>
   </component>
   <component type="desktop-application">
-    <id>org.zafrel.Nameless</id>
-    <summary>Has no name</summary>
-    <developer_name>Nameless Works</developer_name>
+    <id>org.zafrel.Nameless</id><summary>Has no name</summary><developer_name>Nameless Works</developer_name>
   </component>
   <component type="desktop-application">
-    <id>org.zafrel.Plain</id>
-    <name>Plain App</name>
-    <summary>Has a name only</summary>
+    <id>org.zafrel.Plain</id><name>Plain App</name><summary>Has a name only</summary>
   </component>
 </components>
 )";

@@ -6,10 +6,7 @@
 #include "tests/platform/store/catalogue_fixture.h"
 #include "tests/support/log_capture.h"
 
-#include <QCoreApplication>
-#include <QThread>
 #include <QThreadPool>
-
 #include <gtest/gtest.h>
 
 #include <atomic>
@@ -27,15 +24,26 @@ struct Answer {
     bool onMainThread = true;
 };
 
-// Starts the request and waits (without the event loop: the callback never needs it) for its answer.
+// Starts the request and waits (without the event loop: the callback never needs it) for its
+// answer, which must come exactly once.
 Answer answerOf(const StoreLookup &lookup)
 {
-    auto promise = std::make_shared<std::promise<Answer>>();
-    std::future<Answer> future = promise->get_future();
-    lookup.start([promise](const std::optional<Response> &response) {
-        promise->set_value(Answer{response, zaf::dispatch::isMainThread()});
+    struct Shared {
+        std::promise<Answer> promise;
+        std::atomic<int> calls{0};
+    };
+    const auto shared = std::make_shared<Shared>();
+    std::future<Answer> future = shared->promise.get_future();
+    lookup.start([shared](const std::optional<Response> &response) {
+        if (++shared->calls == 1)
+            shared->promise.set_value(Answer{response, zaf::dispatch::isMainThread()});
     });
-    EXPECT_EQ(future.wait_for(std::chrono::seconds(20)), std::future_status::ready);
+    if (future.wait_for(std::chrono::seconds(20)) != std::future_status::ready) {
+        ADD_FAILURE() << "no answer";
+        return {};
+    }
+    zaf::dispatch::globalQueue(zaf::dispatch::Priority::Default).waitForDone();
+    EXPECT_EQ(shared->calls.load(), 1);
     return future.get();
 }
 
@@ -46,6 +54,17 @@ StoreLookup productLookup(std::shared_ptr<Catalogue> catalogue, const QStringLis
     lookup.setLocalizationStyle(kLocalizationStyleUser);
     lookup.setBundleIdentifiers(identifiers);
     return lookup;
+}
+
+// "url | name | artist | genres", "-" for an absent property, "none" for no item.
+QString describe(const std::optional<ResultItem> &item)
+{
+    if (!item)
+        return QStringLiteral("none");
+    const auto text = [](const std::optional<QString> &value) { return value.value_or(QStringLiteral("-")); };
+    return QStringList{text(item->shortProductURL), text(item->displayName), text(item->artistName),
+                       item->genreNames ? item->genreNames->join(QLatin1Char(',')) : QStringLiteral("-")}
+        .join(QStringLiteral(" | "));
 }
 
 class CatalogueTest : public ::testing::Test {
@@ -63,118 +82,74 @@ protected:
 
 } // namespace
 
-TEST_F(CatalogueTest, ItemForIdentifier_KnownComponent_HasEveryProperty)
+// Each component gives exactly the properties it has; unknown and empty identifiers give none; a
+// German catalogue takes the translated name and falls back to the untranslated one.
+TEST_F(CatalogueTest, ItemForIdentifierGivesThePropertiesTheComponentHas)
 {
-    const std::optional<ResultItem> item = m_catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Recorder"));
-    ASSERT_TRUE(item.has_value());
-    EXPECT_EQ(item->shortProductURL, QStringLiteral("appstream://org.zafrel.Recorder"));
-    EXPECT_EQ(item->displayName, QStringLiteral("Zafrel Recorder"));
-    EXPECT_EQ(item->artistName, QStringLiteral("Zafrel Labs"));
-    EXPECT_EQ(item->genreNames, (QStringList{QStringLiteral("AudioVideo"), QStringLiteral("Recorder")}));
-}
+    const struct {
+        const char *id;
+        const char *expected;
+    } cases[] = {
+        {"org.zafrel.Recorder", "appstream://org.zafrel.Recorder | Zafrel Recorder | Zafrel Labs | AudioVideo,Recorder"},
+        {"org.zafrel.Nameless", "appstream://org.zafrel.Nameless | - | Nameless Works | -"},
+        {"org.zafrel.Plain", "appstream://org.zafrel.Plain | Plain App | - | -"},
+        {"org.zafrel.Unknown", "none"},
+        {"", "none"},
+    };
+    for (const auto &c : cases)
+        EXPECT_EQ(describe(m_catalogue->itemForIdentifier(QString::fromLatin1(c.id))), QString::fromLatin1(c.expected)) << c.id;
 
-TEST_F(CatalogueTest, ItemForIdentifier_UnknownOrEmptyIdentifier_IsNone)
-{
-    EXPECT_FALSE(m_catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Unknown")).has_value());
-    EXPECT_FALSE(m_catalogue->itemForIdentifier(QString()).has_value());
-}
-
-TEST_F(CatalogueTest, ItemForIdentifier_ComponentWithoutName_HasArtistButNoDisplayName)
-{
-    const std::optional<ResultItem> item = m_catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Nameless"));
-    ASSERT_TRUE(item.has_value());
-    EXPECT_FALSE(item->displayName.has_value());
-    EXPECT_EQ(item->artistName, QStringLiteral("Nameless Works"));
-    EXPECT_EQ(item->shortProductURL, QStringLiteral("appstream://org.zafrel.Nameless"));
-}
-
-TEST_F(CatalogueTest, ItemForIdentifier_ComponentWithNameOnly_LeavesArtistAndGenresAbsent)
-{
-    const std::optional<ResultItem> item = m_catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Plain"));
-    ASSERT_TRUE(item.has_value());
-    EXPECT_EQ(item->displayName, QStringLiteral("Plain App"));
-    EXPECT_FALSE(item->artistName.has_value());
-    EXPECT_FALSE(item->genreNames.has_value());
-}
-
-TEST_F(CatalogueTest, ItemForIdentifier_GermanLocale_GivesTranslatedNameAndFallsBackWithoutOne)
-{
     const auto german = Catalogue::loadFromDirectory(m_dir.path(), QStringLiteral("de-DE"));
     EXPECT_EQ(german->locale(), QStringLiteral("de_DE"));
-    EXPECT_EQ(german->itemForIdentifier(QStringLiteral("org.zafrel.Recorder"))->displayName,
-              QStringLiteral("Zafrel Rekorder"));
-    EXPECT_EQ(german->itemForIdentifier(QStringLiteral("org.zafrel.Plain"))->displayName,
-              QStringLiteral("Plain App"));
+    EXPECT_EQ(german->itemForIdentifier(QStringLiteral("org.zafrel.Recorder"))->displayName, QStringLiteral("Zafrel Rekorder"));
+    EXPECT_EQ(german->itemForIdentifier(QStringLiteral("org.zafrel.Plain"))->displayName, QStringLiteral("Plain App"));
 }
 
-TEST_F(CatalogueTest, Start_KnownIdentifier_AnswersOnceOffTheMainThread)
-{
-    std::atomic<int> calls{0};
-    std::promise<bool> onMain;
-    auto future = onMain.get_future();
-    productLookup(m_catalogue, {QStringLiteral("org.zafrel.Recorder")})
-        .start([&](const std::optional<Response> &response) {
-            ++calls;
-            EXPECT_TRUE(response.has_value());
-            EXPECT_EQ(response ? response->results.size() : -1, 1);
-            onMain.set_value(QThread::currentThread() == QCoreApplication::instance()->thread());
-        });
-    ASSERT_EQ(future.wait_for(std::chrono::seconds(20)), std::future_status::ready);
-    EXPECT_FALSE(future.get());
-    zaf::dispatch::globalQueue(zaf::dispatch::Priority::Default).waitForDone();
-    EXPECT_EQ(calls.load(), 1);
-}
-
-TEST_F(CatalogueTest, Start_SeveralIdentifiers_AnswersKnownOnesInTheOrderAsked)
+// Known identifiers are answered, off the main thread, in the order asked and unknown ones skipped; a
+// request without a key profile or without identifiers is answered with none.
+TEST_F(CatalogueTest, StartAnswersKnownIdentifiersInOrderAndMalformedRequestsWithNone)
 {
     const Answer answer = answerOf(productLookup(m_catalogue,
         {QStringLiteral("org.zafrel.Plain"), QStringLiteral("org.zafrel.Unknown"), QStringLiteral("org.zafrel.Recorder")}));
+    EXPECT_FALSE(answer.onMainThread);
     ASSERT_TRUE(answer.response.has_value());
     ASSERT_EQ(answer.response->results.size(), 2);
     EXPECT_EQ(answer.response->results[0].displayName, QStringLiteral("Plain App"));
     EXPECT_EQ(answer.response->results[1].displayName, QStringLiteral("Zafrel Recorder"));
-}
 
-TEST_F(CatalogueTest, Start_MalformedRequest_AnswersNone)
-{
     StoreLookup noProfile(m_catalogue);
     noProfile.setBundleIdentifiers({QStringLiteral("org.zafrel.Recorder")});
     EXPECT_FALSE(answerOf(noProfile).response.has_value());
-
     EXPECT_FALSE(answerOf(productLookup(m_catalogue, {})).response.has_value());
 }
 
-TEST(StoreCatalogueErrorsTest, LoadFromDirectory_CorruptFileBesideGoodOne_LogsItAndKeepsTheGoodItems)
+// Each corrupt file is logged by name and the good items stay; with only corrupt files the answer,
+// still off the main thread, has no items.
+TEST(StoreCatalogueErrorsTest, CorruptFilesAreLoggedAndTheGoodItemsStay)
 {
-    CatalogueDirectory dir;
-    dir.write(QStringLiteral("a-good.xml"), zaf::test::kFixtureCollection);
-    const QString corrupt = dir.write(QStringLiteral("b-corrupt.xml"), zaf::test::kCorruptCollection);
+    CatalogueDirectory mixed(QStringLiteral("mixed")), corrupt(QStringLiteral("corrupt"));
+    mixed.write(QStringLiteral("a-good.xml"), zaf::test::kFixtureCollection);
+    const QString bad = mixed.write(QStringLiteral("b-corrupt.xml"), zaf::test::kCorruptCollection);
+    corrupt.write(QStringLiteral("corrupt.xml"), zaf::test::kCorruptCollection);
+    corrupt.write(QStringLiteral("garbage.xml.gz"), QByteArray("\x1f\x8b not really gzip", 19));
     LogCapture log;
-    const auto catalogue = Catalogue::loadFromDirectory(dir.path(), QStringLiteral("en_US"));
-
+    const auto catalogue = Catalogue::loadFromDirectory(mixed.path(), QStringLiteral("en_US"));
     const QStringList messages = log.messages(QStringLiteral("zaf.store"));
     ASSERT_EQ(messages.size(), 1) << messages.join(QLatin1Char('\n')).toStdString();
-    EXPECT_TRUE(messages[0].startsWith(QStringLiteral("Store catalogue file %1 is unreadable: ").arg(corrupt)))
-        << messages[0].toStdString();
+    EXPECT_TRUE(messages[0].startsWith(QStringLiteral("Store catalogue file %1 is unreadable: ").arg(bad))) << messages[0].toStdString();
     EXPECT_TRUE(catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Recorder")).has_value());
     EXPECT_FALSE(catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Bro")).has_value());
-}
 
-TEST(StoreCatalogueErrorsTest, Start_OnlyCorruptFiles_LogsThemAndAnswersWithoutItems)
-{
-    CatalogueDirectory dir;
-    dir.write(QStringLiteral("corrupt.xml"), zaf::test::kCorruptCollection);
-    dir.write(QStringLiteral("garbage.xml.gz"), QByteArray("\x1f\x8b not really gzip", 19));
-    LogCapture log;
-    const auto catalogue = Catalogue::loadFromDirectory(dir.path(), QStringLiteral("en_US"));
+    log.clear();
+    const auto broken = Catalogue::loadFromDirectory(corrupt.path(), QStringLiteral("en_US"));
     EXPECT_EQ(log.messages(QStringLiteral("zaf.store")).size(), 2);
-
-    const Answer answer = answerOf(productLookup(catalogue, {QStringLiteral("org.zafrel.Recorder")}));
+    const Answer answer = answerOf(productLookup(broken, {QStringLiteral("org.zafrel.Recorder")}));
     EXPECT_FALSE(answer.onMainThread);
     EXPECT_TRUE(!answer.response || answer.response->results.isEmpty());
 }
 
-TEST(StoreCatalogueErrorsTest, Start_MissingDirectory_LogsItAndAnswersNone)
+// A missing directory is logged, leaves the catalogue unloaded and answers with none.
+TEST(StoreCatalogueErrorsTest, MissingDirectoryIsLoggedAndAnsweredWithNone)
 {
     const QString missing = QDir::temp().filePath(QStringLiteral("zaf-store-fixtures/does-not-exist"));
     QDir(missing).removeRecursively();
@@ -183,19 +158,17 @@ TEST(StoreCatalogueErrorsTest, Start_MissingDirectory_LogsItAndAnswersNone)
     EXPECT_FALSE(catalogue->isLoaded());
     EXPECT_EQ(log.messages(QStringLiteral("zaf.store")),
               QStringList{QStringLiteral("Store catalogue directory %1 is missing or unreadable").arg(missing)});
-
     EXPECT_FALSE(catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Recorder")).has_value());
     EXPECT_FALSE(answerOf(productLookup(catalogue, {QStringLiteral("org.zafrel.Recorder")})).response.has_value());
 }
 
 // The only test of this program that touches the process-wide catalogue, so the directory it
 // names is the one read at the first load.
-TEST(StoreSharedCatalogueTest, Start_WithoutCatalogue_UsesTheDirectoryNamedByTheEnvironment)
+TEST(StoreSharedCatalogueTest, LookupWithoutCatalogueUsesTheDirectoryNamedByTheEnvironment)
 {
     CatalogueDirectory dir;
     dir.write(QStringLiteral("fixture.xml"), zaf::test::kFixtureCollection);
     qputenv(kCatalogDirEnvironmentVariable, dir.path().toUtf8());
-
     StoreLookup lookup;
     lookup.setKeyProfile(KeyProfile::Product);
     lookup.setBundleIdentifiers({QStringLiteral("org.zafrel.Nameless")});
