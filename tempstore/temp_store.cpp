@@ -162,7 +162,9 @@ void ZafTempStore::_srMoveFileFromURL(const QUrl &source, const QUrl &destinatio
     const zaf::FileManager *fm = &m_fileManager;
     const QString from = source.toLocalFile(), to = destination.toLocalFile();
     zaf::dispatch::async(zaf::dispatch::Priority::Default, [fm, from, to, completion = std::move(completion)] {
-        if (fm->fileExistsAtPath(to))
+        // The destination makes way only for a source that is there: with the source missing, the
+        // move fails anyway, and clearing the destination first would lose a file for nothing.
+        if (fm->fileExistsAtPath(to) && fm->fileExistsAtPath(from))
             fm->removeItemAtPath(to); // outcome ignored: the move reports what matters
         zaf::OptionalError result = fm->moveItemAtPath(from, to);
         if (result)

@@ -57,7 +57,8 @@ public:
     // Removes the item at a file URL on the background-priority queue. Nothing there is no error.
     void _srRemoveFile(const QUrl &fileURL, Completion completion = {}) const;
 
-    // Moves an item on the default-priority queue, replacing whatever is at the destination.
+    // Moves an item on the default-priority queue, replacing whatever is at the destination; a missing
+    // source fails the move and leaves the destination alone.
     void _srMoveFileFromURL(const QUrl &source, const QUrl &destination, Completion completion = {}) const;
 
     // Removes, on the default-priority queue, every entry whose name begins with the prefix,
