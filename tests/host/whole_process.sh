@@ -1,6 +1,6 @@
 #!/bin/bash
 # A whole run as a host application makes it: a fixture recording, zaf-host starting the real
-# extension under Xvfb, the editor window cancelled with Escape.
+# extension under Xvfb, the editor driven with the keyboard.
 #
 #   whole_process.sh ZAF_HOST EXTENSION ZAF_FIXTURE SCRATCH_DIR [SCENARIO]
 #
@@ -10,49 +10,43 @@
 #
 # Writes into SCRATCH_DIR: movie.mp4, temp/ (the extension's temporary directory), host.out,
 # host.err, host.status (zaf-host's exit status), extension.pid (the editor window's process) and
-# result (one line: "ok" or what went wrong). Exits 0 when the script itself ran to its end; the
-# caller judges the outputs.
+# result ("ok" or what went wrong). Exits 0 when the script itself ran to its end; the caller
+# judges the outputs.
 set -u
 
 if [ "${1:-}" = "--inside" ]; then
-    shift
-    host=$1 extension=$2 scratch=$3 scenario=${4:-cancel}
+    host=$2 extension=$3 scratch=$4 scenario=$5
     "$host" --movie "$scratch/movie.mp4" --app-name "Whole Process" --bundle-id org.example.WholeProcess \
         --tint '#3366CC' --extension "$extension" >"$scratch/host.out" 2>"$scratch/host.err" &
     host_pid=$!
+    result=ok
     window=$(timeout 60 xdotool search --sync --name "Zafrel Video Editor" | head -n 1)
     if [ -z "$window" ]; then
-        echo "the editor window did not appear" >"$scratch/result"
-        kill "$host_pid" 2>/dev/null
-        wait "$host_pid"
-        echo $? >"$scratch/host.status"
-        exit 0
-    fi
-    xdotool getwindowpid "$window" >"$scratch/extension.pid" 2>/dev/null
-    # Let the editor finish opening the movie before the key arrives.
-    sleep 2
-    # No window manager under Xvfb: give the window the keyboard focus directly.
-    xdotool windowfocus --sync "$window"
-    if [ "$scenario" = trim-save ]; then
-        xdotool key --delay 20 --repeat 30 Right
-        xdotool key i
-        xdotool key --delay 20 --repeat 45 Right
-        xdotool key o Return
-        sleep 4
-        xdotool key ctrl+s
+        result="the editor window did not appear"
     else
-        xdotool key Escape
+        xdotool getwindowpid "$window" >"$scratch/extension.pid" 2>/dev/null
+        # Let the editor finish opening the movie before the keys arrive.
+        sleep 2
+        # No window manager under Xvfb: give the window the keyboard focus directly.
+        xdotool windowfocus --sync "$window"
+        if [ "$scenario" = trim-save ]; then
+            xdotool key --delay 20 --repeat 30 Right
+            xdotool key i
+            xdotool key --delay 20 --repeat 45 Right
+            xdotool key o Return
+            sleep 4
+            xdotool key ctrl+s
+        else
+            xdotool key Escape
+        fi
+        for _ in $(seq 1 600); do
+            kill -0 "$host_pid" 2>/dev/null || break
+            sleep 0.1
+        done
+        kill -0 "$host_pid" 2>/dev/null && result="zaf-host did not exit within 60 s of the last key"
     fi
-    for _ in $(seq 1 600); do
-        kill -0 "$host_pid" 2>/dev/null || break
-        sleep 0.1
-    done
-    if kill -0 "$host_pid" 2>/dev/null; then
-        echo "zaf-host did not exit within 60 s of Escape" >"$scratch/result"
-        kill "$host_pid" 2>/dev/null
-    else
-        echo ok >"$scratch/result"
-    fi
+    [ "$result" = ok ] || kill "$host_pid" 2>/dev/null
+    echo "$result" >"$scratch/result"
     wait "$host_pid"
     echo $? >"$scratch/host.status"
     exit 0
@@ -67,5 +61,4 @@ fi
 export ZAF_TEMP_DIRECTORY="$scratch/temp/"
 export ZAF_VIDEO_LIBRARY="$scratch/Videos"
 export QT_QPA_PLATFORM=xcb
-# No audio device is needed; keep whatever the environment says otherwise.
 exec xvfb-run -a -s "-screen 0 1280x800x24" "$0" --inside "$host" "$extension" "$scratch" "$scenario"

@@ -1,6 +1,6 @@
-// The whole process: zaf-host starts the real extension on a fixture recording under Xvfb, the
-// editor window is cancelled with Escape, and the host prints an empty report and exits cleanly,
-// with the extension gone and its temporary directory left empty.
+// The whole process under Xvfb: zaf-host starts the real extension on a fixture recording, the
+// editor is driven with the keyboard, and the host prints the report and exits cleanly, with the
+// extension gone and its temporary directory left empty.
 #include "tests/support/temp_dir.h"
 
 #include <QDir>
@@ -16,101 +16,70 @@
 namespace zaf::test {
 namespace {
 
-QString readText(const QString &path)
-{
-    QFile file(path);
-    return file.open(QIODevice::ReadOnly) ? QString::fromUtf8(file.readAll()) : QString();
-}
-
-bool toolsMissing(QString *which)
-{
-    for (const char *tool : {"xvfb-run", "Xvfb", "xdotool"}) {
-        if (QStandardPaths::findExecutable(QString::fromLatin1(tool)).isEmpty()) {
-            *which = QString::fromLatin1(tool);
-            return true;
+class ZafHostWholeProcess : public ::testing::Test {
+protected:
+    void SetUp() override
+    {
+        for (const char *tool : {"xvfb-run", "Xvfb", "xdotool"}) {
+            if (QStandardPaths::findExecutable(tool).isEmpty())
+                GTEST_SKIP() << tool << " is not installed; the whole-process run needs an X server and xdotool";
         }
     }
-    return false;
-}
-
-// Runs the whole-process script for a scenario; false (with a failure) when it did not run through.
-bool runScenario(const ScratchDir &scratch, const QString &scenario)
-{
-    QProcess script;
-    script.setProcessChannelMode(QProcess::ForwardedChannels);
-    script.start(QStringLiteral("bash"), {QStringLiteral(ZAF_WHOLE_PROCESS_SCRIPT), QStringLiteral(ZAF_HOST_BIN),
-                                          QStringLiteral(ZAF_EXTENSION_BIN), QStringLiteral(ZAF_FIXTURE_BIN), scratch.path(),
-                                          scenario});
-    if (!script.waitForStarted(10000)) {
-        ADD_FAILURE() << "the whole-process script did not start";
-        return false;
+    QString read(const char *name) const
+    {
+        QFile file(scratch.file(name));
+        return file.open(QIODevice::ReadOnly) ? QString::fromUtf8(file.readAll()) : QString();
     }
-    if (!script.waitForFinished(240000)) {
-        script.kill();
-        script.waitForFinished(5000);
-        ADD_FAILURE() << "the whole-process script did not finish";
-        return false;
+    // Runs the whole-process script for a scenario and checks what every run must end with: the
+    // script ran through, zaf-host printed `report` and exited 0, and the temporary directory is empty.
+    void run(const char *scenario, const char *report)
+    {
+        QProcess script;
+        script.setProcessChannelMode(QProcess::ForwardedChannels);
+        script.start("bash", {ZAF_WHOLE_PROCESS_SCRIPT, ZAF_HOST_BIN, ZAF_EXTENSION_BIN, ZAF_FIXTURE_BIN, scratch.path(), scenario});
+        ASSERT_TRUE(script.waitForStarted(10000));
+        if (!script.waitForFinished(240000)) {
+            script.kill();
+            script.waitForFinished(5000);
+            FAIL() << "the whole-process script did not finish";
+        }
+        ASSERT_EQ(script.exitCode(), 0);
+        const std::string hostErr = read("host.err").toStdString();
+        ASSERT_EQ(read("result").trimmed(), "ok") << "zaf-host stderr:\n" << hostErr;
+        EXPECT_EQ(read("host.status").trimmed(), "0") << hostErr;
+        EXPECT_EQ(read("host.out"), report);
+        const QDir temp(scratch.file("temp"));
+        ASSERT_TRUE(temp.exists()) << "the extension made its temporary directory ready";
+        EXPECT_EQ(temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot), QStringList());
     }
-    EXPECT_EQ(script.exitCode(), 0);
-    return script.exitCode() == 0;
-}
 
-TEST(ZafHostWholeProcess, EscapeInTheEditorReportsNothingAndLeavesNoTrace)
-{
-    QString missing;
-    if (toolsMissing(&missing))
-        GTEST_SKIP() << missing.toStdString() << " is not installed; the whole-process run needs an X server and xdotool";
     ScratchDir scratch;
-    ASSERT_TRUE(runScenario(scratch, QStringLiteral("cancel")));
+};
 
-    const QString result = readText(scratch.file(QStringLiteral("result"))).trimmed();
-    const QString hostErr = readText(scratch.file(QStringLiteral("host.err")));
-    ASSERT_EQ(result, QStringLiteral("ok")) << "zaf-host stderr:\n" << hostErr.toStdString();
-    EXPECT_EQ(readText(scratch.file(QStringLiteral("host.status"))).trimmed(), QStringLiteral("0")) << hostErr.toStdString();
-    EXPECT_EQ(readText(scratch.file(QStringLiteral("host.out"))), QStringLiteral("[]\n"));
-
+TEST_F(ZafHostWholeProcess, EscapeInTheEditorReportsNothingAndLeavesNoTrace)
+{
+    ASSERT_NO_FATAL_FAILURE(run("cancel", "[]\n"));
     // The process that owned the editor window has gone.
     bool ok = false;
-    const int extensionPid = readText(scratch.file(QStringLiteral("extension.pid"))).trimmed().toInt(&ok);
+    const int extensionPid = read("extension.pid").trimmed().toInt(&ok);
     ASSERT_TRUE(ok && extensionPid > 0) << "the editor window's process is unknown";
     EXPECT_TRUE(::kill(extensionPid, 0) != 0 && errno == ESRCH) << "the extension " << extensionPid << " is still running";
-
-    // The extension's temporary directory exists (it made it ready) and is empty.
-    const QDir temp(scratch.file(QStringLiteral("temp")));
-    ASSERT_TRUE(temp.exists());
-    EXPECT_TRUE(temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot).isEmpty())
-        << temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::NoDotAndDotDot).join(u' ').toStdString();
 }
 
-TEST(ZafHostWholeProcess, KeyboardTrimThenSavePutsTheTrimmedMixedMovieInTheLibrary)
+TEST_F(ZafHostWholeProcess, KeyboardTrimThenSavePutsTheTrimmedMixedMovieInTheLibrary)
 {
-    QString missing;
-    if (toolsMissing(&missing))
-        GTEST_SKIP() << missing.toStdString() << " is not installed; the whole-process run needs an X server and xdotool";
-    ScratchDir scratch;
-    ASSERT_TRUE(runScenario(scratch, QStringLiteral("trim-save")));
-    const QString hostErr = readText(scratch.file(QStringLiteral("host.err")));
-    ASSERT_EQ(readText(scratch.file(QStringLiteral("result"))).trimmed(), QStringLiteral("ok")) << hostErr.toStdString();
-    EXPECT_EQ(readText(scratch.file(QStringLiteral("host.status"))).trimmed(), QStringLiteral("0")) << hostErr.toStdString();
-    EXPECT_EQ(readText(scratch.file(QStringLiteral("host.out"))),
-              QStringLiteral("[\"com.zafrel.activity.SaveToPhotoLibrary\",\"com.zafrel.activity.SaveToPhotoLibrary\"]\n"));
-
+    ASSERT_NO_FATAL_FAILURE(run("trim-save", "[\"com.zafrel.activity.SaveToPhotoLibrary\",\"com.zafrel.activity.SaveToPhotoLibrary\"]\n"));
     // The library holds one movie: the range 1 s to 2.5 s, its two audio tracks mixed into one.
-    const QDir library(scratch.file(QStringLiteral("Videos")));
-    const QStringList saved = library.entryList(QDir::Files | QDir::NoDotAndDotDot);
+    const QDir library(scratch.file("Videos"));
+    const QStringList saved = library.entryList(QDir::Files);
     ASSERT_EQ(saved.size(), 1);
     QProcess probe;
-    probe.start(QStringLiteral("ffprobe"), {QStringLiteral("-v"), QStringLiteral("error"), QStringLiteral("-show_entries"),
-                                            QStringLiteral("stream=codec_type:format=duration"), QStringLiteral("-of"),
-                                            QStringLiteral("csv=p=0"), library.filePath(saved.first())});
+    probe.start("ffprobe", {"-v", "error", "-show_entries", "stream=codec_type:format=duration", "-of", "csv=p=0", library.filePath(saved[0])});
     ASSERT_TRUE(probe.waitForFinished(30000));
-    const QStringList lines = QString::fromUtf8(probe.readAllStandardOutput()).split(u'\n', Qt::SkipEmptyParts);
-    EXPECT_EQ(lines.count(QStringLiteral("audio")), 1);
-    EXPECT_EQ(lines.count(QStringLiteral("video")), 1);
+    const QStringList lines = QString::fromUtf8(probe.readAllStandardOutput()).split('\n', Qt::SkipEmptyParts);
+    EXPECT_EQ(lines.count("audio"), 1);
+    EXPECT_EQ(lines.count("video"), 1);
     EXPECT_NEAR(lines.last().toDouble(), 1.5, 0.1);
-
-    const QDir temp(scratch.file(QStringLiteral("temp")));
-    EXPECT_TRUE(temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot).isEmpty());
 }
 
 } // namespace

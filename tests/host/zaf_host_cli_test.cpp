@@ -3,7 +3,6 @@
 #include "tests/support/temp_dir.h"
 
 #include <QProcess>
-#include <QProcessEnvironment>
 
 #include <gtest/gtest.h>
 
@@ -16,121 +15,85 @@ struct HostRun {
     QString err;
 };
 
-HostRun runHost(const QStringList &args, const QStringList &fakeSteps = {}, const QString &extensionPathVariable = {})
+// Runs zaf-host with `args`, the fake's steps and (when not empty) $ZAF_EXTENSION_PATH.
+HostRun runHost(const QStringList &args, const QString &fakeSteps = {}, const QString &extensionPath = {})
 {
     QProcess process;
     QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
-    environment.insert(QStringLiteral("ZAF_FAKE_STEPS"), fakeSteps.join(QLatin1Char(' ')));
-    environment.remove(QStringLiteral("ZAF_EXTENSION_PATH"));
-    if (!extensionPathVariable.isEmpty())
-        environment.insert(QStringLiteral("ZAF_EXTENSION_PATH"), extensionPathVariable);
+    environment.insert("ZAF_FAKE_STEPS", fakeSteps);
+    environment.remove("ZAF_EXTENSION_PATH");
+    if (!extensionPath.isEmpty())
+        environment.insert("ZAF_EXTENSION_PATH", extensionPath);
     process.setProcessEnvironment(environment);
-    process.start(QStringLiteral(ZAF_HOST_BIN), args);
-    HostRun run;
+    process.start(ZAF_HOST_BIN, args);
     if (!process.waitForStarted(10000) || !process.waitForFinished(60000)) {
         process.kill();
         process.waitForFinished(5000);
-        ADD_FAILURE() << "zaf-host did not run to its end: " << args.join(u' ').toStdString();
-        return run;
+        ADD_FAILURE() << "zaf-host did not run to its end: " << args.join(' ').toStdString();
+        return {};
     }
-    run.exitCode = process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1;
-    run.out = QString::fromUtf8(process.readAllStandardOutput());
-    run.err = QString::fromUtf8(process.readAllStandardError());
-    return run;
+    return {process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1, QString::fromUtf8(process.readAllStandardOutput()),
+            QString::fromUtf8(process.readAllStandardError())};
 }
 
 class ZafHostCli : public ::testing::Test {
 protected:
-    QStringList baseArgs() const
-    {
-        return {QStringLiteral("--movie"), m_movie, QStringLiteral("--app-name"), QStringLiteral("Recorder"), QStringLiteral("--bundle-id"),
-                QStringLiteral("org.example.Recorder")};
-    }
-    QStringList withFake(QStringList args) const
-    {
-        return args << QStringLiteral("--extension") << QStringLiteral(ZAF_FAKE_EXTENSION_BIN);
-    }
-
     ScratchDir m_scratch;
-    QString m_movie = m_scratch.write(QStringLiteral("movie.mp4"), 100);
+    QString m_movie = m_scratch.write("movie.mp4", 100);
+    QStringList m_base{"--movie", m_movie, "--app-name", "Recorder", "--bundle-id", "org.example.Recorder"};
+    QStringList m_withFake = m_base + QStringList{"--extension", ZAF_FAKE_EXTENSION_BIN};
 };
 
-TEST_F(ZafHostCli, ArgumentErrorsExitWithStatusTwoAndSayWhatIsWrong)
+TEST_F(ZafHostCli, FailuresExitNonZeroAndSayWhatWentWrong)
 {
-    const QStringList base = baseArgs();
+    // Status 2 for argument errors, 1 when the extension cannot run or ends without a clean report.
     const struct {
         QStringList args;
+        const char *steps;
+        const char *extensionPath;
+        int exitCode;
         const char *expected;
     } cases[] = {
-        {{QStringLiteral("--app-name"), QStringLiteral("A"), QStringLiteral("--bundle-id"), QStringLiteral("b.c")}, "--movie is required"},
-        {base.mid(0, 4), "--bundle-id is required"},
-        {base + QStringList{QStringLiteral("--tint"), QStringLiteral("blue")}, "blue"},
-        {base + QStringList{QStringLiteral("--frobnicate")}, "frobnicate"},
-        {base + QStringList{QStringLiteral("stray")}, "unexpected argument: stray"},
-        {base + QStringList{QStringLiteral("--movie"), m_movie}, "--movie is given more than once"},
-        {{QStringLiteral("--movie"), m_scratch.file(QStringLiteral("absent.mp4")), QStringLiteral("--app-name"), QStringLiteral("A"),
-          QStringLiteral("--bundle-id"), QStringLiteral("b.c")},
-         "is not a file"},
-        {base + QStringList{QStringLiteral("--attachment"), m_scratch.file(QStringLiteral("absent.txt"))}, "is not a file"},
+        {{"--app-name", "A", "--bundle-id", "b.c"}, "", "", 2, "--movie is required"},
+        {m_base.mid(0, 4), "", "", 2, "--bundle-id is required"},
+        {m_base + QStringList{"--tint", "blue"}, "", "", 2, "blue"},
+        {m_base + QStringList{"--frobnicate"}, "", "", 2, "frobnicate"},
+        {m_base + QStringList{"stray"}, "", "", 2, "unexpected argument: stray"},
+        {m_base + QStringList{"--movie", m_movie}, "", "", 2, "--movie is given more than once"},
+        {{"--movie", m_scratch.file("absent.mp4"), "--app-name", "A", "--bundle-id", "b.c"}, "", "", 2, "is not a file"},
+        {m_base + QStringList{"--attachment", m_scratch.file("absent.txt")}, "", "", 2, "is not a file"},
+        {m_base + QStringList{"--extension", m_movie}, "", "", 1, "not an executable file"},
+        {m_base, "", "/nowhere/zaf-extension", 1, "ZAF_EXTENSION_PATH"},
+        {m_withFake, "accept exit 0", "", 1, "without reporting"},
+        {m_withFake, "accept close exit 0", "", 1, "without reporting"},
+        {m_withFake, "accept crash", "", 1, "died (signal 6)"},
+        {m_withFake, "accept exit 5", "", 1, "exit status 5"},
+        // A report followed by a crash is still a failure: the extension did not end cleanly.
+        {m_withFake, "accept report - crash", "", 1, "died"},
+        {m_withFake, "reject await-remove", "", 1, "refused the request"},
     };
     for (const auto &c : cases) {
-        SCOPED_TRACE(c.args.join(u' ').toStdString());
-        const HostRun run = runHost(c.args);
-        EXPECT_EQ(run.exitCode, 2);
-        EXPECT_TRUE(run.err.contains(QString::fromUtf8(c.expected))) << run.err.toStdString();
-        EXPECT_TRUE(run.out.isEmpty());
+        SCOPED_TRACE((c.args.join(' ') + " / " + c.steps).toStdString());
+        const HostRun run = runHost(c.args, c.steps, c.extensionPath);
+        EXPECT_EQ(run.exitCode, c.exitCode);
+        EXPECT_TRUE(run.err.contains(c.expected)) << run.err.toStdString();
+        if (!QString(c.steps).contains("report")) {
+            EXPECT_TRUE(run.out.isEmpty()) << run.out.toStdString();
+        }
     }
-}
-
-TEST_F(ZafHostCli, ExtensionThatCannotBeFoundOrStartedExitsNonZero)
-{
-    const HostRun notExecutable = runHost(baseArgs() << QStringLiteral("--extension") << m_movie);
-    EXPECT_EQ(notExecutable.exitCode, 1);
-    EXPECT_TRUE(notExecutable.err.contains(QStringLiteral("not an executable file"))) << notExecutable.err.toStdString();
-
-    const HostRun badVariable = runHost(baseArgs(), {}, m_scratch.file(QStringLiteral("nowhere")));
-    EXPECT_EQ(badVariable.exitCode, 1);
-    EXPECT_TRUE(badVariable.err.contains(QStringLiteral("ZAF_EXTENSION_PATH"))) << badVariable.err.toStdString();
 }
 
 TEST_F(ZafHostCli, PrintsTheReportRemovesTheViewAndExitsZero)
 {
-    // The fake reports, then exits 0 only once it receives removeExtensionView.
-    const HostRun run = runHost(withFake(baseArgs() << QStringLiteral("--tint") << QStringLiteral("#102030")),
-                                {QStringLiteral("accept"), QStringLiteral("report"), QStringLiteral("com.zafrel.activity.SaveToPhotoLibrary,Mail"),
-                                 QStringLiteral("await-remove")});
+    // The fake exits 0 only once it receives removeExtensionView. The extension is given on the
+    // command line or found through $ZAF_EXTENSION_PATH.
+    HostRun run = runHost(m_withFake + QStringList{"--tint", "#102030"}, "accept report com.zafrel.activity.SaveToPhotoLibrary,Mail await-remove");
     EXPECT_EQ(run.exitCode, 0) << run.err.toStdString();
-    EXPECT_EQ(run.out, QStringLiteral("[\"com.zafrel.activity.SaveToPhotoLibrary\",\"Mail\"]\n"));
-}
+    EXPECT_EQ(run.out, "[\"com.zafrel.activity.SaveToPhotoLibrary\",\"Mail\"]\n");
 
-TEST_F(ZafHostCli, FindsTheExtensionThroughTheEnvironmentVariable)
-{
-    const HostRun run = runHost(baseArgs(), {QStringLiteral("accept"), QStringLiteral("report"), QStringLiteral("-"), QStringLiteral("await-remove")},
-                                QStringLiteral(ZAF_FAKE_EXTENSION_BIN));
+    run = runHost(m_base, "accept report - await-remove", ZAF_FAKE_EXTENSION_BIN);
     EXPECT_EQ(run.exitCode, 0) << run.err.toStdString();
-    EXPECT_EQ(run.out, QStringLiteral("[]\n"));
-}
-
-TEST_F(ZafHostCli, ExtensionEndingWithoutAReportOrDyingExitsNonZero)
-{
-    const struct {
-        QStringList steps;
-        const char *expected;
-    } cases[] = {
-        {{QStringLiteral("accept"), QStringLiteral("exit"), QStringLiteral("0")}, "without reporting"},
-        {{QStringLiteral("accept"), QStringLiteral("close"), QStringLiteral("exit"), QStringLiteral("0")}, "without reporting"},
-        {{QStringLiteral("accept"), QStringLiteral("crash")}, "died (signal 6)"},
-        {{QStringLiteral("accept"), QStringLiteral("exit"), QStringLiteral("5")}, "exit status 5"},
-        // A report followed by a crash is still a failure: the extension did not end cleanly.
-        {{QStringLiteral("accept"), QStringLiteral("report"), QStringLiteral("-"), QStringLiteral("crash")}, "died"},
-        {{QStringLiteral("reject"), QStringLiteral("await-remove")}, "refused the request"},
-    };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.steps.join(u' ').toStdString());
-        const HostRun run = runHost(withFake(baseArgs()), c.steps);
-        EXPECT_EQ(run.exitCode, 1);
-        EXPECT_TRUE(run.err.contains(QString::fromUtf8(c.expected))) << run.err.toStdString();
-    }
+    EXPECT_EQ(run.out, "[]\n");
 }
 
 } // namespace

@@ -1,6 +1,6 @@
-// The channel over a real socket pair: messages both ways, the peer going away, malformed and
-// oversized input, and concurrent writers. SIGPIPE is deliberately left at its default here: a
-// write to a closed peer that raised it would kill this test program.
+// The channel over a real socket pair: messages both ways, the peer going away, malformed,
+// truncated and oversized input, and concurrent writers. SIGPIPE stays at its default here: a write
+// to a closed peer that raised it would kill this test program.
 
 #include "platform/extensionkit/channel.h"
 #include "platform/extensionkit/json_rpc.h"
@@ -9,7 +9,6 @@
 
 #include <QJsonArray>
 #include <QPointer>
-#include <QThread>
 
 #include <gtest/gtest.h>
 
@@ -20,39 +19,38 @@
 #include <thread>
 
 using zaf::extensionkit::Channel;
+using zaf::extensionkit::encodeFrame;
 using zaf::test::SocketPair;
 using zaf::test::waitUntil;
 namespace rpc = zaf::extensionkit::jsonrpc;
 
 namespace {
 
-struct Received {
-    QList<std::tuple<QJsonValue, QString, QJsonValue>> requests;
+// A started channel on the extension's end of a socket pair, recording every signal.
+struct Harness {
+    Harness()
+    {
+        QObject::connect(channel.get(), &Channel::requestReceived,
+                         [this](const QJsonValue &id, const QString &method, const QJsonValue &) { requests.append({id, method}); });
+        QObject::connect(channel.get(), &Channel::notificationReceived,
+                         [this](const QString &method, const QJsonValue &params) { notifications.append({method, params}); });
+        QObject::connect(channel.get(), &Channel::protocolError, [this](const QString &text) { protocolErrors.append(text); });
+        QObject::connect(channel.get(), &Channel::closed, [this](const QString &reason) { closes.append(reason); });
+        EXPECT_TRUE(channel->start());
+    }
+    QString lastNotification() const { return notifications.isEmpty() ? QString() : notifications.last().first; }
+
+    SocketPair pair;
+    std::shared_ptr<Channel> channel = Channel::create(pair.releaseExtensionFd());
+    QList<std::pair<QJsonValue, QString>> requests;
     QList<std::pair<QString, QJsonValue>> notifications;
     QStringList protocolErrors;
     QStringList closes;
 };
 
-class ChannelTest : public ::testing::Test {
+class ChannelTest : public ::testing::Test, protected Harness {
 protected:
-    void SetUp() override
-    {
-        ASSERT_EQ(std::signal(SIGPIPE, SIG_DFL), SIG_DFL) << "this program must run with SIGPIPE at its default";
-        channel = Channel::create(pair.releaseExtensionFd());
-        ASSERT_TRUE(channel->start());
-        QObject::connect(channel.get(), &Channel::requestReceived, [this](const QJsonValue &id, const QString &method, const QJsonValue &params) {
-            received.requests.append({id, method, params});
-        });
-        QObject::connect(channel.get(), &Channel::notificationReceived, [this](const QString &method, const QJsonValue &params) {
-            received.notifications.append({method, params});
-        });
-        QObject::connect(channel.get(), &Channel::protocolError, [this](const QString &text) { received.protocolErrors.append(text); });
-        QObject::connect(channel.get(), &Channel::closed, [this](const QString &reason) { received.closes.append(reason); });
-    }
-
-    SocketPair pair;
-    std::shared_ptr<Channel> channel;
-    Received received;
+    void SetUp() override { ASSERT_EQ(std::signal(SIGPIPE, SIG_DFL), SIG_DFL) << "this program must run with SIGPIPE at its default"; }
 };
 
 } // namespace
@@ -61,62 +59,72 @@ TEST_F(ChannelTest, DeliversRequestsAndNotificationsInOrderAndSendsAnswersBack)
 {
     pair.writeMessage(rpc::makeRequest(1, "beginExtensionRequest", QJsonObject{{"inputItems", QJsonArray{}}}));
     // Two frames in one write, the second split across two writes.
-    const QByteArray two = zaf::extensionkit::encodeFrame(rpc::serialize(rpc::makeNotification("a")))
-                           + zaf::extensionkit::encodeFrame(rpc::serialize(rpc::makeNotification("b", QJsonArray{1})));
+    const QByteArray two = encodeFrame(rpc::serialize(rpc::makeNotification("a")))
+                           + encodeFrame(rpc::serialize(rpc::makeNotification("b", QJsonArray{1})));
     pair.writeRaw(two.left(two.size() - 3));
     pair.writeRaw(two.right(3));
-    ASSERT_TRUE(waitUntil([&] { return received.requests.size() == 1 && received.notifications.size() == 2; }));
-    EXPECT_EQ(std::get<0>(received.requests[0]), QJsonValue(1));
-    EXPECT_EQ(std::get<1>(received.requests[0]), "beginExtensionRequest");
-    EXPECT_EQ(received.notifications[0].first, "a");
-    EXPECT_EQ(received.notifications[1].first, "b");
-    EXPECT_EQ(received.notifications[1].second, QJsonValue(QJsonArray{1}));
+    ASSERT_TRUE(waitUntil([&] { return requests.size() == 1 && notifications.size() == 2; }));
+    EXPECT_EQ(requests[0], std::make_pair(QJsonValue(1), QString("beginExtensionRequest")));
+    EXPECT_EQ(notifications[0].first, "a");
+    EXPECT_EQ(notifications[1], std::make_pair(QString("b"), QJsonValue(QJsonArray{1})));
 
-    EXPECT_FALSE(channel->sendResult(1, QJsonObject{{"accepted", true}}).has_value());
-    EXPECT_FALSE(channel->sendNotification("extensionDidFinishWithActivityTypes", QJsonArray{QJsonArray{"x"}}).has_value());
+    EXPECT_FALSE(channel->sendResult(1, QJsonObject{{"accepted", true}}));
+    EXPECT_FALSE(channel->sendNotification("extensionDidFinishWithActivityTypes", QJsonArray{QJsonArray{"x"}}));
     const QList<QJsonObject> answers = pair.readMessages(2);
     ASSERT_EQ(answers.size(), 2);
     EXPECT_EQ(answers[0], rpc::makeResult(1, QJsonObject{{"accepted", true}}));
-    EXPECT_EQ(answers[1].value("method"), "extensionDidFinishWithActivityTypes");
-    EXPECT_FALSE(answers[1].contains("id"));
-    EXPECT_TRUE(received.protocolErrors.isEmpty());
-    EXPECT_TRUE(received.closes.isEmpty());
+    EXPECT_EQ(answers[1], rpc::makeNotification("extensionDidFinishWithActivityTypes", QJsonArray{QJsonArray{"x"}}));
+    EXPECT_TRUE(protocolErrors.isEmpty());
+    EXPECT_TRUE(closes.isEmpty());
 }
 
-TEST_F(ChannelTest, PeerClosingEmitsClosedOnceAndLaterWritesFailWithEpipe)
+TEST_F(ChannelTest, PeerGoneMakesWritesFailWithoutSigpipeAndClosesOnce)
 {
+    // Before the channel has read the end of stream the write itself fails; afterwards it is closed.
     pair.closeHost();
-    ASSERT_TRUE(waitUntil([&] { return !received.closes.isEmpty(); }));
+    zaf::OptionalError error = channel->sendNotification("afterPeerClosed", QJsonArray{QJsonArray{"a"}});
+    ASSERT_TRUE(error.has_value());
+    EXPECT_TRUE(error->code == EPIPE || error->code == ECONNRESET) << error->code;
+
+    ASSERT_TRUE(waitUntil([&] { return !closes.isEmpty(); }));
     EXPECT_FALSE(channel->isOpen());
-    const zaf::OptionalError error = channel->sendNotification("late");
+    error = channel->sendNotification("late");
     ASSERT_TRUE(error.has_value());
     EXPECT_EQ(error->domain, "posix");
     EXPECT_EQ(error->code, EPIPE);
     channel->close("again");
     waitUntil([] { return false; }, 30);
-    EXPECT_EQ(received.closes.size(), 1);
+    EXPECT_EQ(closes.size(), 1);
 }
 
-TEST_F(ChannelTest, WriteToAPeerThatVanishedReturnsAnErrorInsteadOfRaisingSigpipe)
+TEST(ChannelStream, TruncatedOrOversizedFrameIsOneProtocolErrorThenClosedAfterWhatCameBefore)
 {
-    // The peer is gone but the channel has not read the end of stream yet: the write itself fails.
-    pair.closeHost();
-    const zaf::OptionalError error = channel->sendNotification("afterPeerClosed", QJsonArray{QJsonArray{"a"}});
-    ASSERT_TRUE(error.has_value());
-    EXPECT_TRUE(error->code == EPIPE || error->code == ECONNRESET) << error->code;
+    const QByteArray before = encodeFrame(rpc::serialize(rpc::makeNotification("before")));
+    const struct {
+        const char *name;
+        QByteArray tail;
+        bool peerCloses;
+        const char *error;
+    } cases[] = {
+        {"stream ends inside a frame", encodeFrame(rpc::serialize(rpc::makeNotification("cut"))).left(9), true, "inside a frame"},
+        {"length of 1 MiB + 1", QByteArray::fromHex("01001000") + QByteArray(64, 'x'), false, "1048577"},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.name);
+        Harness h;
+        h.pair.writeRaw(before + c.tail);
+        if (c.peerCloses)
+            h.pair.closeHost();
+        ASSERT_TRUE(waitUntil([&] { return !h.closes.isEmpty(); }));
+        ASSERT_EQ(h.notifications.size(), 1);
+        EXPECT_EQ(h.notifications[0].first, "before");
+        ASSERT_EQ(h.protocolErrors.size(), 1);
+        EXPECT_TRUE(h.protocolErrors[0].contains(c.error)) << h.protocolErrors[0].toStdString();
+        EXPECT_FALSE(h.channel->isOpen());
+    }
 }
 
-TEST_F(ChannelTest, StreamEndingInsideAFrameIsAProtocolErrorThenClosed)
-{
-    pair.writeRaw(zaf::extensionkit::encodeFrame(rpc::serialize(rpc::makeNotification("cut"))).left(9));
-    pair.closeHost();
-    ASSERT_TRUE(waitUntil([&] { return !received.closes.isEmpty(); }));
-    ASSERT_EQ(received.protocolErrors.size(), 1);
-    EXPECT_TRUE(received.protocolErrors[0].contains("inside a frame"));
-    EXPECT_TRUE(received.notifications.isEmpty());
-}
-
-TEST_F(ChannelTest, MalformedMessagesAreReportedAnsweredWhenTheyHadAnIdAndReadingGoesOn)
+TEST_F(ChannelTest, MalformedAndRandomFramesAreReportedAnsweredWhenTheyHadAnIdAndReadingGoesOn)
 {
     zaf::test::LogCapture logs;
     pair.writeFrame("not json");
@@ -125,36 +133,17 @@ TEST_F(ChannelTest, MalformedMessagesAreReportedAnsweredWhenTheyHadAnIdAndReadin
     pair.writeFrame(R"({"jsonrpc":"1.0","method":"noId"})");
     pair.writeFrame(R"({"jsonrpc":"2.0","id":6,"result":1})"); // a response nobody asked for
     pair.writeMessage(rpc::makeNotification("stillAlive"));
-    ASSERT_TRUE(waitUntil([&] { return received.notifications.size() == 1; }));
-    EXPECT_EQ(received.notifications[0].first, "stillAlive");
-    EXPECT_EQ(received.protocolErrors.size(), 4);
-    EXPECT_TRUE(received.requests.isEmpty());
-    EXPECT_TRUE(received.closes.isEmpty());
-
+    ASSERT_TRUE(waitUntil([&] { return lastNotification() == "stillAlive"; }));
+    EXPECT_EQ(notifications.size(), 1);
+    EXPECT_EQ(protocolErrors.size(), 4);
+    EXPECT_TRUE(requests.isEmpty());
     const QList<QJsonObject> answers = pair.readMessages(1);
     ASSERT_EQ(answers.size(), 1);
     EXPECT_EQ(answers[0].value("id"), QJsonValue(5));
     EXPECT_EQ(answers[0].value("error").toObject().value("code"), QJsonValue(rpc::InvalidRequest));
     EXPECT_TRUE(pair.nothingToRead());
     EXPECT_GE(logs.messages("zaf.extensionkit").filter("protocol error").size(), 4);
-}
 
-TEST_F(ChannelTest, OversizedLengthClosesTheChannelAfterDeliveringTheFramesBeforeIt)
-{
-    QByteArray stream = zaf::extensionkit::encodeFrame(rpc::serialize(rpc::makeNotification("before")));
-    stream += QByteArray::fromHex("01001000"); // 1 MiB + 1
-    stream += QByteArray(64, 'x');
-    pair.writeRaw(stream);
-    ASSERT_TRUE(waitUntil([&] { return !received.closes.isEmpty(); }));
-    ASSERT_EQ(received.notifications.size(), 1);
-    EXPECT_EQ(received.notifications[0].first, "before");
-    ASSERT_EQ(received.protocolErrors.size(), 1);
-    EXPECT_TRUE(received.protocolErrors[0].contains("1048577"));
-    EXPECT_FALSE(channel->isOpen());
-}
-
-TEST_F(ChannelTest, RandomGarbageNeverCrashesTheReader)
-{
     std::mt19937 random(4242);
     for (int i = 0; i < 200; ++i) {
         QByteArray payload(int(random() % 300), Qt::Uninitialized);
@@ -163,24 +152,22 @@ TEST_F(ChannelTest, RandomGarbageNeverCrashesTheReader)
         pair.writeFrame(payload);
     }
     pair.writeMessage(rpc::makeNotification("end"));
-    ASSERT_TRUE(waitUntil([&] { return !received.notifications.isEmpty() && received.notifications.last().first == "end"; }));
+    ASSERT_TRUE(waitUntil([&] { return lastNotification() == "end"; }));
     EXPECT_TRUE(channel->isOpen());
-    EXPECT_GE(received.protocolErrors.size(), 190);
+    EXPECT_GE(protocolErrors.size(), 4 + 190);
+    EXPECT_TRUE(closes.isEmpty());
 }
 
 TEST_F(ChannelTest, ConcurrentSendersNeverInterleaveFrames)
 {
-    constexpr int kThreads = 4;
-    constexpr int kPerThread = 200;
+    constexpr int kThreads = 4, kPerThread = 200;
     std::atomic<int> failures{0};
-    std::vector<std::thread> threads;
     const QString filler(2000, QLatin1Char('f')); // large enough for partial writes to happen
+    std::vector<std::thread> threads;
     for (int t = 0; t < kThreads; ++t) {
         threads.emplace_back([&, t] {
-            for (int i = 0; i < kPerThread; ++i) {
-                if (channel->sendNotification("n", QJsonArray{t, i, filler}))
-                    ++failures;
-            }
+            for (int i = 0; i < kPerThread; ++i)
+                failures += channel->sendNotification("n", QJsonArray{t, i, filler}).has_value();
         });
     }
     // Read on this thread while the writers run, so the socket buffer keeps draining.
@@ -192,10 +179,8 @@ TEST_F(ChannelTest, ConcurrentSendersNeverInterleaveFrames)
     std::vector<int> next(kThreads, 0);
     for (const QJsonObject &message : messages) {
         const QJsonArray params = message.value("params").toArray();
-        ASSERT_EQ(params.size(), 3);
         const int t = params[0].toInt();
-        ASSERT_GE(t, 0);
-        ASSERT_LT(t, kThreads);
+        ASSERT_TRUE(params.size() == 3 && t >= 0 && t < kThreads);
         EXPECT_EQ(params[1].toInt(), next[t]++);
         EXPECT_EQ(params[2].toString(), filler);
     }
@@ -213,20 +198,16 @@ TEST_F(ChannelTest, FullSocketBufferFailsWithTimeoutAfterTheBoundedWait)
     EXPECT_EQ(error->code, ETIMEDOUT);
 }
 
-TEST(ChannelStart, RefusesADescriptorThatIsNotOpen)
+TEST(ChannelLifetime, RefusesAClosedDescriptorAndDeletesOnTheMainThreadWhenDroppedOnAWorker)
 {
     int fds[2];
     ASSERT_EQ(::pipe(fds), 0);
     ::close(fds[0]);
     ::close(fds[1]);
-    const auto channel = Channel::create(fds[0]);
     QString error;
-    EXPECT_FALSE(channel->start(&error));
+    EXPECT_FALSE(Channel::create(fds[0])->start(&error));
     EXPECT_TRUE(error.contains("not open"));
-}
 
-TEST(ChannelLifetime, LastReferenceDroppedOnAWorkerThreadDeletesOnTheMainThread)
-{
     SocketPair pair;
     auto channel = Channel::create(pair.releaseExtensionFd());
     ASSERT_TRUE(channel->start());

@@ -1,6 +1,8 @@
 // The runtime driven over a socket pair as a host would drive it: the request, the principal's view
 // coming on screen with the items already in its context, the removal (by message or by the end of
-// the channel), refusals of bad requests, and the one-way proxy back to the host.
+// the channel), refusals of bad requests, and the one-way proxy back to the host. Last, the extension
+// main routine's refusal of a missing or unusable channel descriptor (it returns before any
+// application object is made, so it runs inside this test program).
 
 #include "platform/extensionkit/channel.h"
 #include "platform/extensionkit/extension_runtime.h"
@@ -11,13 +13,15 @@
 #include "tests/support/log_capture.h"
 
 #include <QJsonArray>
-#include <QSemaphore>
+#include <QScopeGuard>
 #include <QWidget>
 
 #include <gtest/gtest.h>
 
 #include <cerrno>
+#include <fcntl.h>
 #include <thread>
+#include <unistd.h>
 
 using namespace zaf::extensionkit;
 using zaf::test::SocketPair;
@@ -39,26 +43,10 @@ public:
         itemsAtViewDidLoad = context ? context->inputItems().size() : -1;
         calls << "viewDidLoad";
     }
-    void viewWillAppear(bool animated) override
-    {
-        ViewController::viewWillAppear(animated);
-        calls << "viewWillAppear";
-    }
-    void viewDidAppear(bool animated) override
-    {
-        ViewController::viewDidAppear(animated);
-        calls << "viewDidAppear";
-    }
-    void viewWillDisappear(bool animated) override
-    {
-        ViewController::viewWillDisappear(animated);
-        calls << "viewWillDisappear";
-    }
-    void viewDidDisappear(bool animated) override
-    {
-        ViewController::viewDidDisappear(animated);
-        calls << "viewDidDisappear";
-    }
+    void viewWillAppear(bool animated) override { ViewController::viewWillAppear(animated); calls << "viewWillAppear"; }
+    void viewDidAppear(bool animated) override { ViewController::viewDidAppear(animated); calls << "viewDidAppear"; }
+    void viewWillDisappear(bool animated) override { ViewController::viewWillDisappear(animated); calls << "viewWillDisappear"; }
+    void viewDidDisappear(bool animated) override { ViewController::viewDidDisappear(animated); calls << "viewDidDisappear"; }
 };
 
 class ReportingContext : public ExtensionContext {
@@ -71,9 +59,9 @@ QJsonObject item(const QJsonValue &title, const QJsonValue &attachments)
     return QJsonObject{{"title", title}, {"attachments", attachments}};
 }
 
-QJsonArray textAttachment(const QString &value)
+QJsonObject textItem(const QString &title, const QString &value)
 {
-    return QJsonArray{QJsonObject{{"type", "text/plain"}, {"value", value}}};
+    return item(title, QJsonArray{QJsonObject{{"type", "text/plain"}, {"value", value}}});
 }
 
 QJsonObject beginRequest(int id, const QJsonArray &items)
@@ -89,32 +77,25 @@ protected:
         declaration.contextClassName = "ReportingContext";
         declaration.principalClassName = "RecordingPrincipal";
         declaration.makeContext = [] { return new ReportingContext; };
-        declaration.makePrincipal = [this] {
-            auto *principal = new RecordingPrincipal;
-            recorder = principal;
-            return principal;
-        };
+        declaration.makePrincipal = [this] { return recorder = new RecordingPrincipal; };
         declaration.windowTitle = "Test Editor";
         declaration.windowSize = QSize(640, 360);
         declaration.onWindowClosed = [this](zaf::ui::ViewController *principal) { closedWith = principal; };
         runtime = std::make_unique<ExtensionRuntime>(pair.releaseExtensionFd(), declaration);
-        QObject::connect(runtime.get(), &ExtensionRuntime::finished, [this] {
-            ++finishedCount;
-            if (recorder)
-                recorder->calls << "finished";
-        });
+        QObject::connect(runtime.get(), &ExtensionRuntime::finished, [this] { ++finishedCount; recorder->calls << "finished"; });
         QString error;
         ASSERT_TRUE(runtime->start(&error)) << error.toStdString();
     }
 
-    void beginWithRequiredItems()
+    // Sends the request, checks it is accepted and waits for the principal's view to appear.
+    void begin(int id = 1, const QJsonArray &items = {textItem("ZafVideoEditorExtensionMovieURLKey", "/tmp/m.mp4"),
+                                                       textItem("ZafVideoEditorExtensionAppNameKey", "App"),
+                                                       textItem("ZafVideoEditorExtensionBundleIdentifierKey", "org.example.App")})
     {
-        pair.writeMessage(beginRequest(1, QJsonArray{item("ZafVideoEditorExtensionMovieURLKey", textAttachment("/tmp/m.mp4")),
-                                                     item("ZafVideoEditorExtensionAppNameKey", textAttachment("App")),
-                                                     item("ZafVideoEditorExtensionBundleIdentifierKey", textAttachment("org.example.App"))}));
+        pair.writeMessage(beginRequest(id, items));
         const QList<QJsonObject> answers = pair.readMessages(1);
         ASSERT_EQ(answers.size(), 1);
-        ASSERT_EQ(answers[0], rpc::makeResult(1, QJsonObject{{"accepted", true}}));
+        ASSERT_EQ(answers[0], rpc::makeResult(id, QJsonObject{{"accepted", true}}));
         ASSERT_TRUE(waitUntil([&] { return recorder->calls.contains("viewDidAppear"); }));
     }
 
@@ -133,28 +114,29 @@ TEST_F(RuntimeTest, StartWiresContextAndPrincipalButShowsNothingBeforeTheRequest
     EXPECT_EQ(runtime->principal(), recorder);
     EXPECT_EQ(runtime->context()->principalObject(), recorder);
     EXPECT_EQ(ExtensionContext::contextOfPrincipal(recorder), runtime->context());
-    EXPECT_FALSE(recorder->isViewLoaded());
-    EXPECT_EQ(runtime->window(), nullptr);
     EXPECT_TRUE(runtime->context()->inputItems().isEmpty());
     EXPECT_FALSE(runtime->hasRequest());
+
+    // The channel closing before any request finishes the runtime without ever loading the view.
+    pair.closeHost();
+    ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
+    EXPECT_EQ(recorder->calls, QStringList{"finished"});
+    EXPECT_FALSE(recorder->isViewLoaded());
+    EXPECT_EQ(runtime->window(), nullptr);
 }
 
 TEST_F(RuntimeTest, RequestSetsTheItemsBeforeThePrincipalsViewLoadsAndShows)
 {
     zaf::test::LogCapture logs;
     const QJsonArray items{
-        item("ZafVideoEditorExtensionMovieURLKey", textAttachment("/tmp/m.mp4")),
-        item(42, textAttachment("title is a number")),
+        textItem("ZafVideoEditorExtensionMovieURLKey", "/tmp/m.mp4"),
+        item(42, QJsonArray{QJsonObject{{"type", "text/plain"}, {"value", "title is a number"}}}),
         item("NoAttachmentsArray", QJsonObject{}),
         QJsonValue("an item that is a string"),
         item("ZafVideoEditorExtensionAppNameKey", QJsonArray{QJsonObject{{"value", "untyped"}}, QJsonValue(7)}),
         item("ZafVideoEditorExtensionOverrideTintColorKey", QJsonArray{QJsonObject{{"type", kTypeIdentifierColor}, {"value", "#FF000080"}}}),
     };
-    pair.writeMessage(beginRequest(17, items));
-    const QList<QJsonObject> answers = pair.readMessages(1);
-    ASSERT_EQ(answers.size(), 1);
-    EXPECT_EQ(answers[0], rpc::makeResult(17, QJsonObject{{"accepted", true}}));
-    ASSERT_TRUE(waitUntil([&] { return recorder->calls.contains("viewDidAppear"); }));
+    begin(17, items);
 
     const QList<InputItem> kept = runtime->context()->inputItems();
     ASSERT_EQ(kept.size(), 3);
@@ -175,9 +157,14 @@ TEST_F(RuntimeTest, RequestSetsTheItemsBeforeThePrincipalsViewLoadsAndShows)
     EXPECT_EQ(logs.messages("zaf.extensionkit").filter("skipped").size(), 3);
 }
 
-TEST_F(RuntimeTest, RemoveExtensionViewMakesTheViewDisappearThenFinishesOnce)
+TEST_F(RuntimeTest, ClosingTheWindowOnlyCallsTheHandlerAndRemovalMakesTheViewDisappearThenFinishesOnce)
 {
-    beginWithRequiredItems();
+    begin();
+    runtime->window()->close();
+    EXPECT_EQ(closedWith, recorder);
+    EXPECT_TRUE(runtime->window()->isVisible());
+    EXPECT_EQ(finishedCount, 0);
+
     recorder->calls.clear();
     pair.writeMessage(rpc::makeNotification("removeExtensionView"));
     ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
@@ -191,28 +178,12 @@ TEST_F(RuntimeTest, RemoveExtensionViewMakesTheViewDisappearThenFinishesOnce)
     EXPECT_EQ(recorder->calls.count("viewDidDisappear"), 1);
 }
 
-TEST_F(RuntimeTest, ChannelClosingCountsAsRemoval)
-{
-    beginWithRequiredItems();
-    recorder->calls.clear();
-    pair.closeHost();
-    ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
-    EXPECT_EQ(recorder->calls, (QStringList{"viewWillDisappear", "viewDidDisappear", "finished"}));
-    EXPECT_TRUE(runtime->isFinished());
-}
-
-TEST_F(RuntimeTest, ChannelClosingBeforeTheRequestFinishesWithoutLoadingTheView)
-{
-    pair.closeHost();
-    ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
-    EXPECT_EQ(recorder->calls, QStringList{"finished"});
-    EXPECT_FALSE(recorder->isViewLoaded());
-    EXPECT_EQ(runtime->window(), nullptr);
-}
-
-TEST_F(RuntimeTest, BadRequestsAreAnsweredWithTheirErrorCodes)
+TEST_F(RuntimeTest, GarbageAndBadRequestsAreLoggedOrAnsweredAndTheRuntimeCarriesOn)
 {
     zaf::test::LogCapture logs;
+    pair.writeFrame("\xff\xfe garbage");
+    pair.writeFrame("{\"jsonrpc\":\"2.0\",\"id\":1,\"method\":\"beginExtensionRequest\",\"params\":");
+    pair.writeFrame(R"({"jsonrpc":"2.0","id":{"x":1},"method":"beginExtensionRequest","params":{"inputItems":[]}})");
     pair.writeMessage(rpc::makeRequest(1, "beginExtensionRequest", QJsonArray{}));
     pair.writeMessage(rpc::makeRequest(2, "beginExtensionRequest", QJsonObject{{"inputItems", "nope"}}));
     pair.writeMessage(rpc::makeRequest(3, "beginExtensionRequest"));
@@ -220,56 +191,46 @@ TEST_F(RuntimeTest, BadRequestsAreAnsweredWithTheirErrorCodes)
     pair.writeMessage(rpc::makeRequest(5, "removeExtensionView"));
     pair.writeMessage(rpc::makeNotification("unknownNotification"));
     pair.writeMessage(rpc::makeNotification("beginExtensionRequest", QJsonObject{{"inputItems", QJsonArray{}}}));
-    const QList<QJsonObject> answers = pair.readMessages(5);
-    ASSERT_EQ(answers.size(), 5);
-    const QList<std::pair<int, int>> expected{{1, rpc::InvalidParams}, {2, rpc::InvalidParams}, {3, rpc::InvalidParams},
-                                              {4, rpc::MethodNotFound}, {5, rpc::InvalidRequest}};
+    const QList<QJsonObject> answers = pair.readMessages(6);
+    ASSERT_EQ(answers.size(), 6);
+    // Only the unreadable frame that carried an id is answered, with a null id.
+    const QList<std::pair<QJsonValue, int>> expected{{QJsonValue::Null, rpc::InvalidRequest}, {1, rpc::InvalidParams}, {2, rpc::InvalidParams},
+                                                     {3, rpc::InvalidParams}, {4, rpc::MethodNotFound}, {5, rpc::InvalidRequest}};
     for (qsizetype i = 0; i < answers.size(); ++i) {
-        EXPECT_EQ(answers[i].value("id"), QJsonValue(expected[i].first));
+        EXPECT_EQ(answers[i].value("id"), expected[i].first) << i;
         EXPECT_EQ(answers[i].value("error").toObject().value("code"), QJsonValue(expected[i].second)) << i;
     }
     EXPECT_TRUE(pair.nothingToRead());
     EXPECT_FALSE(runtime->hasRequest());
     EXPECT_FALSE(runtime->isFinished());
+    EXPECT_GE(logs.messages("zaf.extensionkit").filter("protocol error").size(), 3);
     EXPECT_EQ(logs.messages("zaf.extensionkit").filter("unknown notification unknownNotification").size(), 1);
 
     // A valid request still goes through afterwards; a second one is refused.
-    beginWithRequiredItems();
+    begin();
     pair.writeMessage(beginRequest(9, QJsonArray{}));
     const QList<QJsonObject> second = pair.readMessages(1);
     ASSERT_EQ(second.size(), 1);
     EXPECT_EQ(second[0], rpc::makeError(9, rpc::InvalidRequest, "request already begun"));
     EXPECT_EQ(runtime->context()->inputItems().size(), 3);
-}
-
-TEST_F(RuntimeTest, GarbageFramesAreLoggedAndTheRuntimeCarriesOn)
-{
-    zaf::test::LogCapture logs;
-    pair.writeFrame("\xff\xfe garbage");
-    pair.writeFrame("{\"jsonrpc\":\"2.0\",\"id\":1,\"method\":\"beginExtensionRequest\",\"params\":");
-    pair.writeFrame(R"({"jsonrpc":"2.0","id":{"x":1},"method":"beginExtensionRequest","params":{"inputItems":[]}})");
-    const QList<QJsonObject> answers = pair.readMessages(1);
-    ASSERT_EQ(answers.size(), 1);
-    EXPECT_TRUE(answers[0].value("id").isNull());
-    EXPECT_EQ(answers[0].value("error").toObject().value("code"), QJsonValue(rpc::InvalidRequest));
-    EXPECT_GE(logs.messages("zaf.extensionkit").filter("protocol error").size(), 3);
-    beginWithRequiredItems();
     EXPECT_EQ(finishedCount, 0);
 }
 
-TEST_F(RuntimeTest, OversizedFrameClosesTheChannelAndRemovesTheView)
+TEST_F(RuntimeTest, OversizedFrameClosesTheChannelWhichRemovesTheView)
 {
     zaf::test::LogCapture logs;
-    beginWithRequiredItems();
+    begin();
+    recorder->calls.clear();
     pair.writeRaw(QByteArray::fromHex("ffffffff") + QByteArray(1000, 'x'));
     ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
-    EXPECT_TRUE(recorder->calls.contains("viewDidDisappear"));
+    EXPECT_EQ(recorder->calls, (QStringList{"viewWillDisappear", "viewDidDisappear", "finished"}));
+    EXPECT_TRUE(runtime->isFinished());
     EXPECT_FALSE(logs.messages("zaf.extensionkit").filter("exceeds the limit").isEmpty());
 }
 
 TEST_F(RuntimeTest, ProxyDeliversOneWayMessagesFromAnyThreadAndReportsFailures)
 {
-    beginWithRequiredItems();
+    begin();
     QList<zaf::Error> errors;
     const auto proxy = runtime->context()->remoteObjectProxyWithErrorHandler([&](const zaf::Error &error) { errors.append(error); });
     proxy->sendOneWay(kReportMethod, QJsonArray{QJsonArray{"save", "save"}});
@@ -295,15 +256,6 @@ TEST_F(RuntimeTest, ProxyDeliversOneWayMessagesFromAnyThreadAndReportsFailures)
     EXPECT_TRUE(errors[1].code == EPIPE || errors[1].code == ECONNRESET) << errors[1].code;
 }
 
-TEST_F(RuntimeTest, ClosingTheWindowCallsTheDeclaredHandlerAndKeepsItOpen)
-{
-    beginWithRequiredItems();
-    runtime->window()->close();
-    EXPECT_EQ(closedWith, recorder);
-    EXPECT_TRUE(runtime->window()->isVisible());
-    EXPECT_EQ(finishedCount, 0);
-}
-
 TEST(RuntimeStart, FailsWithoutAPrincipalOrAUsableDescriptor)
 {
     SocketPair pair;
@@ -319,4 +271,40 @@ TEST(RuntimeStart, FailsWithoutAPrincipalOrAUsableDescriptor)
     ExtensionRuntime badFd(-1, declaration);
     EXPECT_FALSE(badFd.start(&error));
     EXPECT_EQ(badFd.principal(), nullptr);
+}
+
+TEST(ExtensionMain, ChannelDescriptorMustNameAnOpenSocketElseMainExitsWithCodeTwo)
+{
+    const auto unset = qScopeGuard([] { qunsetenv(kChannelFdEnvironmentVariable); });
+    const int devNull = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
+    ASSERT_GE(devNull, 0);
+    int closed[2];
+    ASSERT_EQ(::pipe(closed), 0);
+    ::close(closed[0]);
+    ::close(closed[1]);
+    const QList<std::pair<std::optional<QByteArray>, QString>> cases{
+        {std::nullopt, "is not set"},
+        {QByteArray(""), "is not set"},
+        {QByteArray("three"), "not a descriptor number"},
+        {QByteArray("-1"), "not a descriptor number"},
+        {QByteArray("3x"), "not a descriptor number"},
+        {QByteArray::number(closed[0]), "names no open descriptor"},
+        {QByteArray::number(devNull), "is not a socket"},
+    };
+    char name[] = "zaf-test-extension";
+    char *argv[] = {name, nullptr};
+    for (const auto &[value, reason] : cases) {
+        SCOPED_TRACE(value ? value->toStdString() : std::string("(unset)"));
+        value ? qputenv(kChannelFdEnvironmentVariable, *value) : qunsetenv(kChannelFdEnvironmentVariable);
+        QString error;
+        EXPECT_EQ(channelFdFromEnvironment(&error), -1);
+        EXPECT_TRUE(error.contains(reason)) << error.toStdString();
+        EXPECT_EQ(extensionMain(1, argv, ExtensionDeclaration{}), kExitCodeNoChannel);
+    }
+    ::close(devNull);
+
+    zaf::test::SocketPair pair;
+    qputenv(kChannelFdEnvironmentVariable, QByteArray::number(pair.extensionFd()));
+    QString error;
+    EXPECT_EQ(channelFdFromEnvironment(&error), pair.extensionFd()) << error.toStdString();
 }

@@ -4,7 +4,6 @@
 #include "platform/extensionkit/json_rpc.h"
 
 #include <QJsonArray>
-#include <QJsonDocument>
 
 #include <gtest/gtest.h>
 
@@ -12,51 +11,76 @@
 
 namespace rpc = zaf::extensionkit::jsonrpc;
 
-TEST(JsonRpc, ParsesRequestsNotificationsResultsAndErrors)
+namespace {
+
+rpc::Message parsed(const QByteArray &payload)
 {
-    auto request = rpc::parseMessage(R"({"jsonrpc":"2.0","id":7,"method":"beginExtensionRequest","params":{"inputItems":[]}})");
-    ASSERT_TRUE(request.ok()) << request.errorText.toStdString();
-    EXPECT_EQ(request.message->kind, rpc::MessageKind::Request);
-    EXPECT_EQ(request.message->id, QJsonValue(7));
-    EXPECT_EQ(request.message->method, "beginExtensionRequest");
-    EXPECT_TRUE(request.message->params.toObject().value("inputItems").isArray());
-
-    auto notification = rpc::parseMessage(R"({"jsonrpc":"2.0","method":"removeExtensionView"})");
-    ASSERT_TRUE(notification.ok());
-    EXPECT_EQ(notification.message->kind, rpc::MessageKind::Notification);
-    EXPECT_TRUE(notification.message->id.isUndefined());
-    EXPECT_TRUE(notification.message->params.isUndefined());
-
-    auto stringId = rpc::parseMessage(R"({"jsonrpc":"2.0","id":"abc","method":"m","params":[1,2]})");
-    ASSERT_TRUE(stringId.ok());
-    EXPECT_EQ(stringId.message->id, QJsonValue("abc"));
-    EXPECT_EQ(stringId.message->params.toArray().size(), 2);
-
-    auto result = rpc::parseMessage(R"({"jsonrpc":"2.0","id":1,"result":{"accepted":true}})");
-    ASSERT_TRUE(result.ok());
-    EXPECT_EQ(result.message->kind, rpc::MessageKind::Response);
-    EXPECT_TRUE(result.message->result.toObject().value("accepted").toBool());
-
-    auto error = rpc::parseMessage(R"({"jsonrpc":"2.0","id":null,"error":{"code":-32700,"message":"bad","data":[1]}})");
-    ASSERT_TRUE(error.ok());
-    EXPECT_EQ(error.message->kind, rpc::MessageKind::ErrorResponse);
-    EXPECT_EQ(error.message->errorCode, -32700);
-    EXPECT_EQ(error.message->errorMessage, "bad");
-    EXPECT_TRUE(error.message->errorData.isArray());
+    const rpc::ParseResult result = rpc::parseMessage(payload);
+    EXPECT_TRUE(result.ok()) << payload.toStdString() << ": " << result.errorText.toStdString();
+    return result.message.value_or(rpc::Message{});
 }
 
-struct MalformedCase {
-    const char *name;
-    QByteArray payload;
-    int code;
-    // The id an answer must carry; nullopt when the failure must not be answered.
-    std::optional<QJsonValue> answerId;
-};
+} // namespace
+
+TEST(JsonRpc, ParsesEachKindOfMessageWithItsMembers)
+{
+    const rpc::Message request = parsed(R"({"jsonrpc":"2.0","id":7,"method":"beginExtensionRequest","params":{"inputItems":[]}})");
+    EXPECT_EQ(request.kind, rpc::MessageKind::Request);
+    EXPECT_EQ(request.id, QJsonValue(7));
+    EXPECT_EQ(request.method, "beginExtensionRequest");
+    EXPECT_TRUE(request.params.toObject().value("inputItems").isArray());
+
+    const rpc::Message notification = parsed(R"({"jsonrpc":"2.0","method":"removeExtensionView"})");
+    EXPECT_EQ(notification.kind, rpc::MessageKind::Notification);
+    EXPECT_TRUE(notification.id.isUndefined());
+    EXPECT_TRUE(notification.params.isUndefined());
+
+    const rpc::Message stringId = parsed(R"({"jsonrpc":"2.0","id":"abc","method":"m","params":[1,2]})");
+    EXPECT_EQ(stringId.id, QJsonValue("abc"));
+    EXPECT_EQ(stringId.params, QJsonValue(QJsonArray{1, 2}));
+
+    const rpc::Message result = parsed(R"({"jsonrpc":"2.0","id":1,"result":{"accepted":true}})");
+    EXPECT_EQ(result.kind, rpc::MessageKind::Response);
+    EXPECT_EQ(result.result, QJsonValue(QJsonObject{{"accepted", true}}));
+
+    const rpc::Message error = parsed(R"({"jsonrpc":"2.0","id":null,"error":{"code":-32700,"message":"bad","data":[1]}})");
+    EXPECT_EQ(error.kind, rpc::MessageKind::ErrorResponse);
+    EXPECT_EQ(error.errorCode, -32700);
+    EXPECT_EQ(error.errorMessage, "bad");
+    EXPECT_EQ(error.errorData, QJsonValue(QJsonArray{1}));
+}
+
+TEST(JsonRpc, MadeMessagesParseBackAsTheSameKind)
+{
+    const rpc::Message request = parsed(rpc::serialize(rpc::makeRequest(5, "doIt", QJsonArray{1})));
+    EXPECT_EQ(request.kind, rpc::MessageKind::Request);
+    EXPECT_EQ(request.params, QJsonValue(QJsonArray{1}));
+    const QJsonArray types{QJsonArray{"a", "b"}};
+    const rpc::Message notification = parsed(rpc::serialize(rpc::makeNotification("extensionDidFinishWithActivityTypes", types)));
+    EXPECT_EQ(notification.kind, rpc::MessageKind::Notification);
+    EXPECT_EQ(notification.params, QJsonValue(types));
+    EXPECT_EQ(parsed(rpc::serialize(rpc::makeResult("id", QJsonValue()))).kind, rpc::MessageKind::Response);
+    const rpc::Message error = parsed(rpc::serialize(rpc::makeError(9, rpc::MethodNotFound, "no such method")));
+    EXPECT_EQ(error.errorCode, -32601);
+    EXPECT_EQ(error.id, QJsonValue(9));
+
+    // A notification made without params leaves the member out rather than sending null, and an
+    // error for an id that cannot be echoed goes out with a null id.
+    EXPECT_FALSE(rpc::makeNotification("removeExtensionView").contains("params"));
+    EXPECT_TRUE(rpc::makeError(QJsonObject{}, rpc::InvalidRequest, "x").value("id").isNull());
+}
 
 TEST(JsonRpc, RefusesMalformedMessagesWithTheRightCodeAndAnswerability)
 {
+    // The last member is the id an answer must carry; nullopt when the failure must not be answered.
+    struct Case {
+        const char *name;
+        QByteArray payload;
+        int code;
+        std::optional<QJsonValue> answerId;
+    };
     const QJsonValue null(QJsonValue::Null);
-    const QList<MalformedCase> cases{
+    const QList<Case> cases{
         {"empty payload", "", rpc::ParseError, std::nullopt},
         {"truncated JSON", R"({"jsonrpc":"2.0","id":1,"meth)", rpc::ParseError, std::nullopt},
         {"invalid UTF-8 in a string", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"m\xff\xfe\"}"), rpc::ParseError, std::nullopt},
@@ -91,7 +115,7 @@ TEST(JsonRpc, RefusesMalformedMessagesWithTheRightCodeAndAnswerability)
         {"error code out of range", R"({"jsonrpc":"2.0","id":4,"error":{"code":1e12,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
         {"error message missing", R"({"jsonrpc":"2.0","id":4,"error":{"code":1}})", rpc::InvalidRequest, std::nullopt},
     };
-    for (const MalformedCase &c : cases) {
+    for (const Case &c : cases) {
         SCOPED_TRACE(c.name);
         const rpc::ParseResult result = rpc::parseMessage(c.payload);
         EXPECT_FALSE(result.ok());
@@ -99,35 +123,6 @@ TEST(JsonRpc, RefusesMalformedMessagesWithTheRightCodeAndAnswerability)
         EXPECT_FALSE(result.errorText.isEmpty());
         EXPECT_EQ(result.answerId, c.answerId);
     }
-}
-
-TEST(JsonRpc, MadeMessagesParseBackAsTheSameKind)
-{
-    const auto request = rpc::parseMessage(rpc::serialize(rpc::makeRequest(5, "doIt", QJsonArray{1})));
-    ASSERT_TRUE(request.ok());
-    EXPECT_EQ(request.message->kind, rpc::MessageKind::Request);
-    EXPECT_EQ(request.message->params, QJsonValue(QJsonArray{1}));
-
-    const auto notification = rpc::parseMessage(rpc::serialize(rpc::makeNotification("extensionDidFinishWithActivityTypes",
-                                                                                       QJsonArray{QJsonArray{"a", "b"}})));
-    ASSERT_TRUE(notification.ok());
-    EXPECT_EQ(notification.message->kind, rpc::MessageKind::Notification);
-    EXPECT_EQ(notification.message->params, QJsonValue(QJsonArray{QJsonArray{"a", "b"}}));
-
-    // A notification made without params leaves the member out rather than sending null.
-    EXPECT_FALSE(rpc::makeNotification("removeExtensionView").contains("params"));
-
-    const auto result = rpc::parseMessage(rpc::serialize(rpc::makeResult("id", QJsonValue())));
-    ASSERT_TRUE(result.ok());
-    EXPECT_EQ(result.message->kind, rpc::MessageKind::Response);
-
-    const auto error = rpc::parseMessage(rpc::serialize(rpc::makeError(9, rpc::MethodNotFound, "no such method")));
-    ASSERT_TRUE(error.ok());
-    EXPECT_EQ(error.message->errorCode, -32601);
-    EXPECT_EQ(error.message->id, QJsonValue(9));
-
-    // An error for an id that cannot be echoed goes out with a null id.
-    EXPECT_TRUE(rpc::makeError(QJsonObject{}, rpc::InvalidRequest, "x").value("id").isNull());
 }
 
 TEST(JsonRpc, MutatedAndRandomPayloadsNeverCrashAndAlwaysExplainARefusal)
@@ -149,9 +144,7 @@ TEST(JsonRpc, MutatedAndRandomPayloadsNeverCrashAndAlwaysExplainARefusal)
         if (!result.ok()) {
             ASSERT_TRUE(result.errorCode == rpc::ParseError || result.errorCode == rpc::InvalidRequest) << result.errorCode;
             ASSERT_FALSE(result.errorText.isEmpty());
-            if (result.answerId) {
-                ASSERT_TRUE(rpc::isValidId(*result.answerId));
-            }
+            ASSERT_TRUE(!result.answerId || rpc::isValidId(*result.answerId));
         } else {
             ASSERT_FALSE(result.message->kind == rpc::MessageKind::Request && !rpc::isValidId(result.message->id));
         }

@@ -1,14 +1,15 @@
 #pragma once
 
-// Test support for the host channel: a connected socket pair whose "host" end the test drives by
-// hand (raw writes, frame reads with a bounded wait), and a bounded event-loop wait.
+// The host's end of a channel, driven by hand: a connected socket pair whose host end the test writes
+// raw bytes, frames or messages to and reads messages from with a bounded wait.
 
-#include <QByteArray>
+#include "platform/extensionkit/frame_codec.h"
+#include "tests/support/wait_until.h"
+
 #include <QJsonObject>
 #include <QList>
 
-#include <functional>
-#include <optional>
+#include <utility>
 
 namespace zaf::test {
 
@@ -19,32 +20,24 @@ public:
     SocketPair(const SocketPair &) = delete;
     SocketPair &operator=(const SocketPair &) = delete;
 
-    // The extension's end; release it when something else takes ownership of it.
     int extensionFd() const { return m_fds[0]; }
-    int releaseExtensionFd();
-    int hostFd() const { return m_fds[1]; }
+    // Gives the extension's end away to whatever takes ownership of it.
+    int releaseExtensionFd() { return std::exchange(m_fds[0], -1); }
     void closeHost();
 
-    // Writes raw bytes / one framed payload / one framed JSON object from the host end.
     void writeRaw(const QByteArray &bytes) const;
-    void writeFrame(const QByteArray &payload) const;
+    void writeFrame(const QByteArray &payload) const { writeRaw(extensionkit::encodeFrame(payload)); }
     void writeMessage(const QJsonObject &message) const;
 
-    // Reads from the host end, running the Qt event loop meanwhile, until `count` complete frames
-    // have arrived or `timeoutMs` has passed; returns the frames read so far (possibly fewer).
-    QList<QByteArray> readFrames(int count, int timeoutMs = 5000);
-    // The same, for messages parsed as JSON objects.
+    // Runs the event loop until `count` messages have arrived or `timeoutMs` has passed; returns
+    // those read so far (possibly fewer).
     QList<QJsonObject> readMessages(int count, int timeoutMs = 5000);
-    // True when the host end has nothing to read right now (after letting the event loop run for
-    // `settleMs` milliseconds).
+    // True when nothing arrives while the event loop runs for `settleMs`.
     bool nothingToRead(int settleMs = 50);
 
 private:
     int m_fds[2] = {-1, -1};
-    QByteArray m_buffer;
+    extensionkit::FrameDecoder m_decoder{0xffffffffu};
 };
-
-// Runs the Qt event loop until `condition` holds or `timeoutMs` has passed; returns the condition.
-bool waitUntil(const std::function<bool()> &condition, int timeoutMs = 5000);
 
 } // namespace zaf::test
