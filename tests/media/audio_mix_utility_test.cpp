@@ -8,9 +8,7 @@
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/temp_dir.h"
 
-#include <QCoreApplication>
 #include <QFileInfo>
-#include <QJsonArray>
 #include <QThread>
 #include <gtest/gtest.h>
 
@@ -44,14 +42,12 @@ MixResult mix(const QUrl &movie)
     return future.get();
 }
 
-int audioStreamCount(const QString &path)
+qsizetype audioStreamCount(const QString &path)
 {
-    int n = 0;
-    for (const QJsonValue &s : ffprobe(path).value(QStringLiteral("streams")).toArray())
-        n += s.toObject().value(QStringLiteral("codec_type")).toString() == QLatin1String("audio");
-    return n;
+    return probeStreams(path, "audio").size();
 }
 
+// Without a movie the completion runs at once, on the calling thread, with the no-movie error.
 TEST(AudioMixUtility, AbsentMovieFailsAtOnceWithNoMovieCode)
 {
     const MixResult r = mix(QUrl());
@@ -62,15 +58,12 @@ TEST(AudioMixUtility, AbsentMovieFailsAtOnceWithNoMovieCode)
     EXPECT_TRUE(r.onCallingThread);
 }
 
+// Two tracks become one carrying both tones, in the temporary file named at the start, with the
+// video copied packet for packet.
 TEST(AudioMixUtility, TwoTrackMovieBecomesOneTrackCarryingBothTonesWithTheVideoCopied)
 {
-    ScratchDir scratch;
-    fixture::FixtureSpec spec;
-    spec.seconds = 3;
-    spec.audioTracks = 2;
-    const QString source = makeFixtureMovie(scratch.path(), spec);
+    const QString source = sharedFixtureMovie({.seconds = 3, .audioTracks = 2});
     ASSERT_FALSE(source.isEmpty());
-
     const QUrl expected = ZafAudioMixUtility::tempFileURL();
     const MixResult r = mix(QUrl::fromLocalFile(source));
     ASSERT_FALSE(r.error.has_value()) << r.error->description().toStdString();
@@ -79,56 +72,40 @@ TEST(AudioMixUtility, TwoTrackMovieBecomesOneTrackCarryingBothTonesWithTheVideoC
     EXPECT_TRUE(r.url == expected || r.url.toLocalFile().startsWith(ZafTempStore::defaultStore()._srTempPath()));
     const QString out = r.url.toLocalFile();
     EXPECT_TRUE(QFileInfo(out).fileName().startsWith(QStringLiteral("ZafReplay_Final")));
-
     EXPECT_EQ(audioStreamCount(out), 1);
     EXPECT_GT(toneLevel(out, 0, fixture::toneFrequency(0)), 0.3);
     EXPECT_GT(toneLevel(out, 0, fixture::toneFrequency(1)), 0.3);
     EXPECT_EQ(streamMD5(out, QStringLiteral("0:v")), streamMD5(source, QStringLiteral("0:v")));
 }
 
-TEST(AudioMixUtility, MovieWithoutAudioExportsWithAnEmptyMix)
-{
-    ScratchDir scratch;
-    fixture::FixtureSpec spec;
-    spec.audioTracks = 0;
-    const QString source = makeFixtureMovie(scratch.path(), spec);
-    ASSERT_FALSE(source.isEmpty());
-
-    const auto session = ZafAudioMixUtility::exportSessionForMixingAudio(QUrl::fromLocalFile(source),
-                                                                         QUrl::fromLocalFile(scratch.file(QStringLiteral("o.mp4"))));
-    ASSERT_TRUE(session);
-    const std::optional<media::AudioMix> audioMix = session->audioMix();
-    ASSERT_TRUE(audioMix.has_value());
-    EXPECT_TRUE(audioMix->inputParameters.isEmpty());
-
-    const MixResult r = mix(QUrl::fromLocalFile(source));
-    ASSERT_FALSE(r.error.has_value());
-    EXPECT_EQ(audioStreamCount(r.url.toLocalFile()), 0);
-}
-
+// The mix lists every audio track in order and nothing else (the video is track 1); a movie
+// without audio gets an empty mix and exports without an audio track.
 TEST(AudioMixUtility, MixListsEveryAudioTrackInOrderAndNothingElse)
 {
     ScratchDir scratch;
-    fixture::FixtureSpec spec;
-    spec.audioTracks = 3;
-    const QString source = makeFixtureMovie(scratch.path(), spec);
-    const auto session = ZafAudioMixUtility::exportSessionForMixingAudio(QUrl::fromLocalFile(source),
-                                                                         QUrl::fromLocalFile(scratch.file(QStringLiteral("o.mp4"))));
-    ASSERT_TRUE(session);
-    const std::optional<media::AudioMix> audioMix = session->audioMix();
-    ASSERT_TRUE(audioMix.has_value());
-    QList<std::int32_t> ids;
-    for (const auto &p : audioMix->inputParameters)
-        ids << p.trackID;
-    EXPECT_EQ(ids, (QList<std::int32_t>{2, 3, 4})) << "the video is track 1";
+    for (const auto &[tracks, ids] : {std::pair{0, QList<std::int32_t>{}}, {3, {2, 3, 4}}}) {
+        SCOPED_TRACE(tracks);
+        const QString source = sharedFixtureMovie({.audioTracks = tracks});
+        const auto session = ZafAudioMixUtility::exportSessionForMixingAudio(QUrl::fromLocalFile(source),
+                                                                             QUrl::fromLocalFile(scratch.file(QStringLiteral("o.mp4"))));
+        ASSERT_TRUE(session);
+        const std::optional<media::AudioMix> audioMix = session->audioMix();
+        ASSERT_TRUE(audioMix.has_value());
+        QList<std::int32_t> listed;
+        for (const auto &p : audioMix->inputParameters)
+            listed << p.trackID;
+        EXPECT_EQ(listed, ids);
+    }
+    const MixResult r = mix(QUrl::fromLocalFile(sharedFixtureMovie({.audioTracks = 0})));
+    ASSERT_FALSE(r.error.has_value());
+    EXPECT_EQ(audioStreamCount(r.url.toLocalFile()), 0);
 }
 
 TEST(AudioMixUtility, UnreadableMovieFailsWithExportCodeAndLogs)
 {
     ScratchDir scratch;
-    const QString garbage = scratch.write(QStringLiteral("garbage.mp4"), 5000);
     LogCapture logs;
-    for (const QString &path : {garbage, scratch.file(QStringLiteral("missing.mp4"))}) {
+    for (const QString &path : {scratch.write(QStringLiteral("garbage.mp4"), 5000), scratch.file(QStringLiteral("missing.mp4"))}) {
         const MixResult r = mix(QUrl::fromLocalFile(path));
         EXPECT_TRUE(r.url.isEmpty());
         ASSERT_TRUE(r.error.has_value());
@@ -137,11 +114,12 @@ TEST(AudioMixUtility, UnreadableMovieFailsWithExportCodeAndLogs)
     EXPECT_EQ(logs.count(QStringLiteral("ZafAudioMixUtility: MvAssetExportSessionFailed")), 2);
 }
 
+// The temporary file is named from the directory path (whose trailing "/" gives a double slash)
+// and the whole seconds of the time.
 TEST(AudioMixUtility, TempFileURLIsTheDirectoryStemAndWholeSeconds)
 {
     const QString dir = ZafTempStore::defaultStore()._srTempPath();
-    EXPECT_EQ(ZafAudioMixUtility::tempFileURLForTime(1000000000.9).toLocalFile(),
-              dir + QStringLiteral("/ZafReplay_Final1000000000.mp4"));
+    EXPECT_EQ(ZafAudioMixUtility::tempFileURLForTime(1000000000.9).toLocalFile(), dir + QStringLiteral("/ZafReplay_Final1000000000.mp4"));
     EXPECT_TRUE(ZafAudioMixUtility::tempFileURLForTime(1000000000.9).toLocalFile().contains(QStringLiteral("//ZafReplay")));
     EXPECT_EQ(ZafAudioMixUtility::tempFileURLForTime(5.0), ZafAudioMixUtility::tempFileURLForTime(5.99));
 }

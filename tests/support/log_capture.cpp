@@ -27,11 +27,10 @@ LogCapture::~LogCapture()
 
 void LogCapture::handler(QtMsgType type, const QMessageLogContext &context, const QString &message)
 {
-    LogCapture *self = g_active.load();
-    if (!self)
-        return;
-    std::lock_guard lock(self->m_mutex);
-    self->m_entries.append({type, QString::fromLatin1(context.category ? context.category : "default"), message});
+    if (LogCapture *self = g_active.load()) {
+        std::lock_guard lock(self->m_mutex);
+        self->m_entries.append({type, QString::fromLatin1(context.category ? context.category : "default"), message});
+    }
 }
 
 QList<LogEntry> LogCapture::entries() const
@@ -42,9 +41,8 @@ QList<LogEntry> LogCapture::entries() const
 
 QStringList LogCapture::messages(const QString &category) const
 {
-    std::lock_guard lock(m_mutex);
     QStringList out;
-    for (const LogEntry &e : m_entries)
+    for (const LogEntry &e : entries())
         if (e.category == category)
             out << e.message;
     return out;
@@ -52,9 +50,8 @@ QStringList LogCapture::messages(const QString &category) const
 
 int LogCapture::count(const QString &message) const
 {
-    std::lock_guard lock(m_mutex);
     int n = 0;
-    for (const LogEntry &e : m_entries)
+    for (const LogEntry &e : entries())
         n += e.message == message;
     return n;
 }

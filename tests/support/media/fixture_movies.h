@@ -5,7 +5,7 @@
 //
 // Every function runs on the calling thread and waits (bounded) for the tools it starts. Failures
 // are reported with ADD_FAILURE naming the command and its error output; the functions then return
-// an empty value ("" / empty list / empty object / -1 level).
+// an empty value ("" / empty list / empty object / -1).
 
 #include "tools/fixture/fixture_movie.h"
 
@@ -13,11 +13,16 @@
 #include <QJsonObject>
 #include <QList>
 #include <QString>
+#include <QStringList>
+
+#include <functional>
 
 namespace zaf::test {
 
 // Writes a fixture movie with a unique name into `dir` and returns its path ("" on failure).
-QString makeFixtureMovie(const QString &dir, const zaf::fixture::FixtureSpec &spec = {});
+QString makeFixtureMovie(const QString &dir, const zaf::fixture::FixtureSpec &shape = {});
+// A fixture movie made once per process for `shape` and shared by every test that asks for it.
+QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape);
 
 // The number shown by every frame of the first video stream, in presentation order, as displayed
 // (the display rotation applied). -1 for a frame without a readable number.
@@ -32,8 +37,9 @@ double toneLevel(const QString &moviePath, int audioStreamIndex, double frequenc
 
 // ffprobe -show_streams -show_format, parsed.
 QJsonObject ffprobe(const QString &path);
-// The streams of one kind ("video", "audio") from an ffprobe answer, in file order.
+// The streams of one kind ("video", "audio") from an ffprobe answer or of a file, in file order.
 QList<QJsonObject> probeStreams(const QJsonObject &probe, const QString &codecType);
+QList<QJsonObject> probeStreams(const QString &path, const QString &codecType);
 // The clockwise display rotation of a probed video stream (0, 90, 180, 270).
 int probeRotation(const QJsonObject &stream);
 // The number of video frames of the first video stream, counted by decoding with ffprobe.
@@ -44,5 +50,20 @@ QList<int> keyFrameIndexes(const QString &path);
 
 // MD5 of the packets of the streams selected by `map` ("0:v:0", "0:a:1", ...), copied unchanged.
 QString streamMD5(const QString &path, const QString &map);
+
+// A finished run of a command-line program.
+struct ToolRun {
+    int exitCode = -1;
+    QByteArray out;
+    QByteArray err;
+    bool ok() const { return exitCode == 0; }
+};
+// Runs a program to its end. Not starting or not finishing in time is a test failure; a non-zero
+// exit is only reported in the result. `sink`, when given, takes standard output as it arrives.
+ToolRun runTool(const QString &program, const QStringList &args, const std::function<void(QByteArray &)> &sink = {});
+// ffmpeg -nostdin -v error -y ARGS; false, with a test failure carrying ffmpeg's message, on failure.
+bool ffmpeg(const QStringList &args);
+// The space-separated words of `line` (no quoting), to write tool arguments compactly.
+QStringList words(const char *line);
 
 } // namespace zaf::test

@@ -1,0 +1,430 @@
+// The Player on a manual clock (loading, observers, the item's end, seeks and pictures checked by the
+// numbers fixture frames show), its layer and audio stage; the tests wait only for loading and decoding.
+#include "platform/media/playback_audio_decoder.h"
+#include "platform/media/player.h"
+#include "platform/media/player_layer.h"
+#include "tests/support/log_capture.h"
+#include "tests/support/media/fixture_movies.h"
+#include "tests/support/temp_dir.h"
+#include "tests/support/wait_until.h"
+
+#include <QDeadlineTimer>
+#include <QFile>
+#include <QThread>
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <memory>
+#include <numbers>
+#include <vector>
+
+namespace zaf::media {
+namespace {
+
+using zaf::fixture::FixtureSpec;
+using zaf::test::readFrameNumber;
+using zaf::test::sharedFixtureMovie;
+using zaf::test::waitUntil;
+
+// 4 s at 320 x 240 with a keyframe every 30 frames; 12 s and 2 s small ones; 1 s turned 90 degrees.
+const FixtureSpec kMovie{.seconds = 4, .gop = 30};
+const FixtureSpec kLong{.seconds = 12, .width = 160, .height = 120};
+const FixtureSpec kShort{.seconds = 2, .width = 160, .height = 120};
+const FixtureSpec kRotated{.seconds = 1, .rotation = 90};
+
+MediaTime seconds(double s)
+{
+    return MediaTime::fromSeconds(s, 1000000000);
+}
+
+std::shared_ptr<PlayerItem> itemFor(const QString &path)
+{
+    return std::make_shared<PlayerItem>(MediaAsset::assetWithURL(QUrl::fromLocalFile(path)));
+}
+
+bool loaded(const PlayerItem &item)
+{
+    return waitUntil([&] { return item.status() != PlayerItem::Status::Unknown; });
+}
+
+// Lets the event loop run for `ms`, for late deliveries that must not come.
+void settle(int ms)
+{
+    waitUntil([] { return false; }, ms);
+}
+
+TEST(PlaybackClockTest, MediaTimeFollowsAnchorAtRateAndManualSourceOnlyMovesForward)
+{
+    PlaybackClock clock;
+    clock.setAnchor(5.0, 100.0, 1.0);
+    EXPECT_DOUBLE_EQ(clock.mediaTimeAt(102.5), 7.5);
+    clock.setAnchor(1.0, 10.0, 2.0);
+    EXPECT_DOUBLE_EQ(clock.mediaTimeAt(11.0), 3.0);
+
+    ManualTimeSource source(3.0);
+    int advanced = 0;
+    QObject::connect(&source, &TimeSource::advanced, [&] { ++advanced; });
+    source.advance(0.5);
+    source.advance(-2);
+    EXPECT_DOUBLE_EQ(source.now(), 3.5);
+    EXPECT_EQ(advanced, 2);
+}
+
+// An item becomes ready once, with the duration ffprobe reads.
+TEST(PlayerItemTest, ItemBecomesReadyWithDurationOfTheFileAndSignalsOnce)
+{
+    const QString path = sharedFixtureMovie(kShort);
+    auto item = itemFor(path);
+    EXPECT_EQ(item->status(), PlayerItem::Status::Unknown);
+    EXPECT_FALSE(item->duration().isValid());
+    int changes = 0;
+    QObject::connect(item.get(), &PlayerItem::statusChanged, [&] { ++changes; });
+    ASSERT_TRUE(loaded(*item));
+    settle(100);
+    EXPECT_EQ(changes, 1);
+    EXPECT_EQ(item->status(), PlayerItem::Status::ReadyToPlay);
+    EXPECT_FALSE(item->error().has_value());
+    const double probed = zaf::test::ffprobe(path)["format"].toObject()["duration"].toString().toDouble();
+    EXPECT_NEAR(item->duration().seconds(), probed, 0.001);
+    EXPECT_EQ(item->currentTime(), MediaTime::zero());
+}
+
+// Unusable files fail the item once with a logged error, and a player of it stays inert.
+TEST(PlayerItemTest, ItemFailsWithLoggedErrorForMissingEmptyGarbageAndTruncatedFiles)
+{
+    zaf::test::ScratchDir dir;
+    const QString truncated = dir.file(QStringLiteral("truncated.mp4"));
+    ASSERT_TRUE(QFile::copy(sharedFixtureMovie(kShort), truncated) && QFile::resize(truncated, 2000));
+    for (const QString &path : {dir.file(QStringLiteral("missing.mp4")), dir.write(QStringLiteral("empty.mov"), 0),
+                                dir.write(QStringLiteral("garbage.mp4"), 50000), truncated}) {
+        SCOPED_TRACE(path.toStdString());
+        zaf::test::LogCapture log;
+        auto item = itemFor(path);
+        int changes = 0;
+        QObject::connect(item.get(), &PlayerItem::statusChanged, [&] { ++changes; });
+        ASSERT_TRUE(loaded(*item));
+        EXPECT_EQ(item->status(), PlayerItem::Status::Failed);
+        EXPECT_EQ(changes, 1);
+        ASSERT_TRUE(item->error().has_value());
+        EXPECT_EQ(item->error()->domain, QString::fromUtf8(kMediaErrorDomain));
+        EXPECT_FALSE(item->duration().isValid());
+        const QStringList messages = log.messages(QStringLiteral("zaf.media"));
+        EXPECT_TRUE(std::any_of(messages.begin(), messages.end(),
+                                [&](const QString &m) { return m.startsWith(QStringLiteral("Cannot play")) && m.contains(path); }))
+            << messages.join(u'\n').toStdString();
+
+        Player player(item);
+        auto clock = std::make_shared<ManualTimeSource>();
+        player.setTimeSource(clock);
+        player.play();
+        EXPECT_EQ(player.rate(), 0.0f);
+        player.seekToTime(MediaTime::make(1, 1));
+        clock->advance(1);
+        EXPECT_TRUE(player.currentVideoFrame().isNull());
+    }
+}
+
+// An item without asset fails; items and players released while loading do not crash.
+TEST(PlayerItemTest, ItemWithoutAssetFailsAndItemDestroyedWhileLoadingIsSafe)
+{
+    PlayerItem noAsset(nullptr);
+    ASSERT_TRUE(loaded(noAsset));
+    EXPECT_EQ(noAsset.status(), PlayerItem::Status::Failed);
+
+    zaf::test::ScratchDir dir;
+    const QString path = dir.write(QStringLiteral("other.mp4"), 1000);
+    for (int i = 0; i < 5; ++i) {
+        auto item = itemFor(path);
+        auto player = std::make_unique<Player>(item);
+        player.reset();
+        item.reset(); // the load completes after the item is gone
+    }
+    settle(200);
+}
+
+// The audio stage alone (no device): every audio track decoded, resampled to stereo and summed at
+// unity gain into the ring, from the requested time to the end.
+TEST(PlayerAudioMixTest, DecoderSumsEveryTrackAtUnityGainFromRequestedTime)
+{
+    const QString path = sharedFixtureMovie({.seconds = 2, .width = 64, .height = 48, .audioTracks = 2});
+    const QList<QJsonObject> audio = zaf::test::probeStreams(path, "audio");
+    ASSERT_EQ(audio.size(), 2);
+    playback::AudioOutputFormat format{44100, 2, true};
+    playback::AudioRing ring(format.sampleRate * format.bytesPerFrame()); // one second
+    QString failure;
+    playback::AudioDecoder decoder(path, {audio[0]["index"].toInt(), audio[1]["index"].toInt()},
+                                   format, &ring, [&](const QString &message) { failure = message; });
+    const std::uint64_t request = decoder.start(1'500'000'000); // 1.5 s: 0.5 s left
+
+    std::vector<float> samples;
+    QDeadlineTimer deadline(15000);
+    while (!deadline.hasExpired() && !(decoder.servingRequest() == request && ring.ended() && ring.available() == 0)) {
+        std::vector<float> chunk(4096);
+        const qsizetype got = ring.read(reinterpret_cast<char *>(chunk.data()), qsizetype(chunk.size() * sizeof(float)));
+        if (decoder.servingRequest() == request)
+            samples.insert(samples.end(), chunk.begin(), chunk.begin() + got / qsizetype(sizeof(float)));
+        if (got == 0)
+            QThread::msleep(5);
+    }
+    EXPECT_TRUE(failure.isEmpty()) << failure.toStdString();
+    ASSERT_TRUE(ring.ended());
+    // 0.5 s of stereo, within the tail of the AAC stream.
+    EXPECT_NEAR(double(samples.size()) / 2 / format.sampleRate, 0.5, 0.03);
+    for (int channel : {0, 1}) {
+        for (int track : {0, 1}) {
+            double re = 0, im = 0;
+            for (std::size_t i = 0; i < samples.size() / 2; ++i) {
+                const double phase = 2 * std::numbers::pi * zaf::fixture::toneFrequency(track) * double(i) / format.sampleRate;
+                re += samples[i * 2 + channel] * std::cos(phase);
+                im += samples[i * 2 + channel] * std::sin(phase);
+            }
+            EXPECT_NEAR(4 * std::hypot(re, im) / double(samples.size()), zaf::fixture::kToneAmplitude, 0.05) << channel << " " << track;
+        }
+    }
+    for (float v : samples)
+        ASSERT_LE(std::fabs(v), 1.0f);
+}
+
+class PlayerTest : public ::testing::Test {
+protected:
+    // A Player of `shape`'s movie on the manual clock, with its item ready.
+    std::unique_ptr<Player> readyPlayer(const FixtureSpec &shape)
+    {
+        const QString path = sharedFixtureMovie(shape);
+        EXPECT_FALSE(path.isEmpty());
+        auto item = itemFor(path);
+        auto player = std::make_unique<Player>(item);
+        player->setTimeSource(m_clock);
+        EXPECT_TRUE(loaded(*item));
+        EXPECT_EQ(item->status(), PlayerItem::Status::ReadyToPlay);
+        return player;
+    }
+    static int shownNumber(const Player &player) { return readFrameNumber(player.currentVideoFrame()); }
+
+    std::shared_ptr<ManualTimeSource> m_clock = std::make_shared<ManualTimeSource>(100.0);
+};
+
+// Boundary observers fire in order, each at its own time, whether the clock moves in small steps or
+// jumps past several in one; one that pauses stops playback exactly there.
+TEST_F(PlayerTest, BoundaryObserversFireAtTheirTimesAndPauseThereInSmallStepsOrOneJump)
+{
+    for (bool oneJump : {false, true}) {
+        SCOPED_TRACE(oneJump ? "one jump" : "small steps");
+        auto player = readyPlayer(kLong);
+        player->seekToTime(seconds(5));
+        QList<double> order;
+        player->addBoundaryTimeObserver({seconds(9)}, [&] { order.append(player->currentTime().seconds()); });
+        player->addBoundaryTimeObserver({seconds(10), seconds(11.5)}, [&] {
+            order.append(player->currentTime().seconds());
+            player->pause();
+        });
+        player->play();
+        EXPECT_EQ(player->rate(), 1.0f);
+        for (int i = 0; i < (oneJump ? 1 : 100); ++i)
+            m_clock->advance(oneJump ? 7 : 0.07); // 5 s -> 12 s
+        EXPECT_EQ(order, (QList<double>{9, 10}));
+        EXPECT_EQ(player->rate(), 0.0f);
+        EXPECT_EQ(player->currentTime(), seconds(10));
+        EXPECT_EQ(player->currentItem()->currentTime(), seconds(10));
+        player->play();
+        m_clock->advance(3);
+        EXPECT_EQ(order, (QList<double>{9, 10, 11.5}));
+        EXPECT_EQ(player->currentTime(), seconds(11.5));
+    }
+}
+
+// Observers stay silent when a seek jumps over their time or once removed; bad ones are refused.
+TEST_F(PlayerTest, ObserversStaySilentWhenSeekJumpsOverThemOrAfterRemovalAndBadOnesAreRefused)
+{
+    auto player = readyPlayer(kLong);
+    int fired = 0;
+    const TimeObserverToken token = player->addBoundaryTimeObserver({seconds(3)}, [&] { ++fired; });
+    EXPECT_NE(token, 0u);
+    player->removeTimeObserver(player->addPeriodicTimeObserver(seconds(0.1), [&](const MediaTime &) { ++fired; }));
+    player->play();
+    player->seekToTime(seconds(4)); // jumps over 3 s while playing
+    m_clock->advance(0.5);
+    EXPECT_EQ(fired, 0);
+    player->seekToTime(seconds(2));
+    player->removeTimeObserver(token);
+    m_clock->advance(2);
+    EXPECT_EQ(fired, 0);
+    EXPECT_EQ(player->currentTime(), seconds(4));
+    EXPECT_EQ(player->addPeriodicTimeObserver(MediaTime::invalid(), [](const MediaTime &) {}), 0u);
+    EXPECT_EQ(player->addPeriodicTimeObserver(MediaTime::zero(), [](const MediaTime &) {}), 0u);
+    EXPECT_EQ(player->addBoundaryTimeObserver({MediaTime::invalid()}, [] {}), 0u);
+    player->removeTimeObserver(12345); // unknown: ignored
+}
+
+// The end pauses at the duration and signals once per arrival; with ActionAtItemEnd::None it keeps
+// the rate.
+TEST_F(PlayerTest, EndOfItemPausesAtDurationAndEmitsDidPlayToEndTimeOncePerArrival)
+{
+    for (ActionAtItemEnd action : {ActionAtItemEnd::Pause, ActionAtItemEnd::None}) {
+        SCOPED_TRACE(int(action));
+        auto player = readyPlayer(kShort);
+        player->setActionAtItemEnd(action);
+        const float rateAtEnd = action == ActionAtItemEnd::None ? 1.0f : 0.0f;
+        int ended = 0;
+        float rateAtSignal = -1;
+        QObject::connect(player->currentItem().get(), &PlayerItem::didPlayToEndTime, [&] {
+            ++ended;
+            rateAtSignal = player->rate();
+        });
+        player->play();
+        for (int i = 0; i < 12; ++i)
+            m_clock->advance(0.25);
+        EXPECT_EQ(ended, 1);
+        EXPECT_EQ(rateAtSignal, rateAtEnd);
+        EXPECT_EQ(player->rate(), rateAtEnd);
+        EXPECT_EQ(player->currentTime(), player->currentItem()->duration());
+        m_clock->advance(1);
+        EXPECT_EQ(ended, 1);
+
+        // As the editor does: back to the start, play again, reach the end again.
+        player->seekToTime(MediaTime::zero());
+        player->play();
+        m_clock->advance(5);
+        EXPECT_EQ(ended, 2);
+    }
+}
+
+// A periodic observer fires once per interval while playing (one call for a step over several
+// marks), and on play, pause and seek.
+TEST_F(PlayerTest, PeriodicObserverFiresOncePerIntervalWhilePlayingAndOnPlayPauseAndSeek)
+{
+    auto player = readyPlayer(kLong);
+    QList<double> calls;
+    player->addPeriodicTimeObserver(seconds(0.25), [&](const MediaTime &t) { calls.append(t.seconds()); });
+    player->play();
+    EXPECT_EQ(calls, (QList<double>{0}));
+    for (int i = 0; i < 8; ++i)
+        m_clock->advance(0.125);
+    EXPECT_EQ(calls, (QList<double>{0, 0.25, 0.5, 0.75, 1.0}));
+    player->pause();
+    EXPECT_EQ(calls.size(), 6);
+    m_clock->advance(1); // paused: the clock moving does not move playback
+    EXPECT_EQ(calls.size(), 6);
+    EXPECT_EQ(player->currentTime(), seconds(1));
+    player->seekToTime(seconds(3));
+    ASSERT_EQ(calls.size(), 7);
+    EXPECT_EQ(calls.last(), 3.0);
+    player->play();
+    m_clock->advance(1.1);
+    EXPECT_EQ(calls.size(), 9);
+    EXPECT_NEAR(calls.last(), 4.1, 1e-9);
+}
+
+TEST_F(PlayerTest, PlayBeforeReadyStartsOnceTheItemIsReady)
+{
+    auto item = itemFor(sharedFixtureMovie(kLong));
+    Player player(item);
+    player.setTimeSource(m_clock);
+    player.seekToTime(MediaTime::zero());
+    player.play();
+    ASSERT_TRUE(waitUntil([&] { return item->status() == PlayerItem::Status::ReadyToPlay; }));
+    m_clock->advance(2);
+    EXPECT_EQ(player.currentTime(), seconds(2));
+}
+
+// Tearing a Player down on the real clock while it plays, decodes and seeks is safe.
+TEST_F(PlayerTest, DestroyingPlayerWhilePlayingOnRealClockIsSafe)
+{
+    for (int round = 0; round < 3; ++round) {
+        auto item = itemFor(sharedFixtureMovie(kLong));
+        auto player = std::make_unique<Player>(item);
+        player->play();
+        if (round > 0) {
+            ASSERT_TRUE(waitUntil([&] { return !player->currentVideoFrame().isNull(); }));
+            for (int i = 0; i < 5; ++i)
+                player->seekToTime(seconds(1.0 + i));
+        }
+        player.reset();
+        EXPECT_EQ(item->currentTime(), MediaTime::make(0, 1000000000));
+    }
+}
+
+// A new player shows the first frame; a seek shows the frame at its target (between keyframes, on
+// one, between frame times), limited to the item, and an invalid one is ignored.
+TEST_F(PlayerTest, SeekShowsFrameAtTargetBetweenKeyframesOnKeyframeAndBetweenFrameTimes)
+{
+    auto player = readyPlayer(kMovie);
+    ASSERT_TRUE(waitUntil([&] { return !player->currentVideoFrame().isNull(); }));
+    EXPECT_EQ(shownNumber(*player), 0);
+    EXPECT_EQ(player->currentVideoFrame().size(), QSize(320, 240));
+    const MediaTime end = player->currentItem()->duration();
+    const QList<std::tuple<double, MediaTime, int>> cases = {{1.5, seconds(1.5), 45}, {1.0, seconds(1), 30}, {2.51, seconds(2.51), 75},
+                                                             {0.2, seconds(0.2), 6},  {3.95, seconds(3.95), 118}, {60, end, 119},
+                                                             {-3, MediaTime::zero(), 0}};
+    for (const auto &[target, time, expected] : cases) {
+        player->seekToTime(seconds(target));
+        EXPECT_EQ(player->currentTime(), time);
+        EXPECT_TRUE(waitUntil([&] { return shownNumber(*player) == expected; }))
+            << "seek to " << target << " shows " << shownNumber(*player) << ", expected " << expected;
+    }
+    player->seekToTime(MediaTime::invalid());
+    EXPECT_EQ(player->currentTime(), MediaTime::zero());
+}
+
+// Of rapid seeks only the latest target is ever shown, even after late pictures could arrive.
+TEST_F(PlayerTest, RapidSeeksShowOnlyTheLatestTarget)
+{
+    auto player = readyPlayer(kMovie);
+    ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == 0; }));
+    QList<int> shown;
+    QObject::connect(player.get(), &Player::videoFrameChanged, [&] { shown.append(shownNumber(*player)); });
+    for (double target : {0.5, 1.2, 2.9, 1.7, 3.3})
+        player->seekToTime(seconds(target));
+    ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == 99; }));
+    settle(300);
+    EXPECT_EQ(shown, QList<int>{99});
+}
+
+// While playing, the picture is the one due at the clock's time once the decoder catches up, and
+// never one ahead of it.
+TEST_F(PlayerTest, PlayingShowsFrameOfClockTimeAfterDecoderCatchesUp)
+{
+    auto player = readyPlayer(kMovie);
+    player->seekToTime(seconds(1));
+    player->play();
+    for (int i = 0; i < 30; ++i)
+        m_clock->advance(1.0 / 32); // 1.9375 s: frame 58 (1.9333 s) is on screen, 59 (1.9667 s) is not due
+    EXPECT_TRUE(waitUntil([&] { return shownNumber(*player) == 58; })) << shownNumber(*player);
+    settle(200);
+    EXPECT_EQ(shownNumber(*player), 58);
+    m_clock->advance(1.0 / 16);
+    EXPECT_TRUE(waitUntil([&] { return shownNumber(*player) == 60; })) << shownNumber(*player);
+}
+
+// The layer paints a rotated movie upright, aspect-fit on black, and black without a player.
+TEST_F(PlayerTest, LayerPaintsRotatedMovieUprightAspectFitOnBlack)
+{
+    auto player = readyPlayer(kRotated);
+    PlayerLayer layer;
+    layer.resize(400, 400);
+    layer.setPlayer(player.get());
+    ASSERT_TRUE(waitUntil([&] { return !player->currentVideoFrame().isNull(); }));
+    // The stored picture is 320 x 240 and turned back; upright it is 240 x 320, so it fits 300 x 400.
+    EXPECT_EQ(player->currentVideoFrame().size(), QSize(320, 240));
+    EXPECT_EQ(shownNumber(*player), -1);
+    const QRectF rect = layer.videoRect();
+    EXPECT_EQ(rect, QRectF(50, 0, 300, 400));
+
+    const QImage shot = layer.grab().toImage().convertToFormat(QImage::Format_RGB32);
+    const qreal dpr = shot.devicePixelRatio();
+    ASSERT_EQ(shot.size(), (QSizeF(400, 400) * dpr).toSize());
+    EXPECT_EQ(QColor(shot.pixel(QPoint(10, 200) * dpr)), QColor(Qt::black));
+    EXPECT_EQ(QColor(shot.pixel(QPoint(390, 200) * dpr)), QColor(Qt::black));
+    const QColor corner = shot.pixelColor((QPointF(50 + 300 / 8.0, 400 / 10.0) * dpr).toPoint());
+    EXPECT_TRUE(corner.red() > 180 && corner.green() < 80 && corner.blue() < 80) << qPrintable(corner.name()); // red cell
+    EXPECT_EQ(readFrameNumber(shot.copy(QRectF(rect.topLeft() * dpr, rect.size() * dpr).toRect())), 0);
+
+    layer.setPlayer(nullptr);
+    EXPECT_TRUE(layer.videoRect().isEmpty());
+    const QImage cleared = layer.grab().toImage();
+    EXPECT_EQ(QColor(cleared.pixel(cleared.width() / 2, cleared.height() / 2)), QColor(Qt::black));
+}
+
+} // namespace
+} // namespace zaf::media

@@ -1,0 +1,282 @@
+// MovieWriter and the fixture movies built on it, checked from the outside: ffprobe describes what
+// was written, ffmpeg decodes the frames (their drawn numbers must come back in order) and the
+// tones of every audio track. Also the frame-number pattern the other media tests rely on.
+
+#include "platform/media/media_asset.h"
+#include "platform/media/movie_writer.h"
+#include "tests/support/log_capture.h"
+#include "tests/support/media/fixture_movies.h"
+#include "tests/support/temp_dir.h"
+#include "tools/fixture/fixture_movie.h"
+#include "tools/fixture/frame_pattern.h"
+
+#include <QDir>
+#include <QFileInfo>
+#include <QTransform>
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <numeric>
+#include <vector>
+
+using zaf::media::MovieWriter;
+namespace fx = zaf::fixture;
+
+namespace {
+
+QList<int> range(int n)
+{
+    QList<int> list(n);
+    std::iota(list.begin(), list.end(), 0);
+    return list;
+}
+
+std::unique_ptr<MovieWriter> createWriter(const QString &path, const MovieWriter::Settings &settings)
+{
+    auto created = MovieWriter::create(path, settings);
+    EXPECT_TRUE(created.ok()) << (created.error ? qPrintable(created.error->description()) : "");
+    return created.ok() ? std::move(*created.value) : nullptr;
+}
+
+// Appends `frames` numbered frames and a tone per track to match.
+void appendNumberedFrames(MovieWriter &writer, int frames)
+{
+    const MovieWriter::Settings &s = writer.settings();
+    const int samplesPerFrame = int(s.sampleRate / s.frameRate);
+    std::vector<float> pcm(size_t(samplesPerFrame * s.channels));
+    for (int n = 0; n < frames; ++n) {
+        ASSERT_FALSE(writer.appendVideoFrame(fx::frameNumberImage(n, s.videoSize.width(), s.videoSize.height())));
+        for (int k = 0; k < s.audioTracks; ++k) {
+            const double w = 2 * M_PI * fx::toneFrequency(k) / s.sampleRate;
+            for (int i = 0; i < samplesPerFrame; ++i)
+                for (int c = 0; c < s.channels; ++c)
+                    pcm[size_t(i * s.channels + c)] = float(0.5 * std::sin(w * (qint64(n) * samplesPerFrame + i)));
+            ASSERT_FALSE(writer.appendAudio(k, pcm.data(), samplesPerFrame));
+        }
+    }
+}
+
+// The drawn number reads back at any picture size, after smooth scaling down to thumbnail size too.
+TEST(FramePatternTest, ReadFrameNumberReturnsDrawnNumberAtManySizesAndAfterScaling)
+{
+    for (const QSize &size : {QSize(1920, 1080), QSize(320, 240), QSize(64, 36), QSize(28, 38), QSize(1080, 1920)})
+        for (int n : {0, 1, 2, 255, 256, 4097, 30000, 43690, 65535})
+            EXPECT_EQ(fx::readFrameNumber(fx::frameNumberImage(n, size.width(), size.height())), n)
+                << n << " at " << size.width() << "x" << size.height();
+    for (int n : {12345, 54321, 7}) {
+        const QImage thumb = fx::frameNumberImage(n, 1920, 1080).scaled(68, 38, Qt::IgnoreAspectRatio, Qt::SmoothTransformation);
+        EXPECT_EQ(fx::readFrameNumber(thumb), n);
+        EXPECT_TRUE(fx::isUpright(thumb));
+    }
+}
+
+// Turned, mirrored, blank or washed-out pictures are not upright or read no number.
+TEST(FramePatternTest, PicturesWithoutAnUprightPatternReadNoNumber)
+{
+    const QImage upright = fx::frameNumberImage(4242, 320, 240);
+    ASSERT_TRUE(fx::isUpright(upright));
+    for (int degrees : {90, 180, 270}) {
+        const QImage turned = upright.transformed(QTransform().rotate(degrees));
+        EXPECT_FALSE(fx::isUpright(turned)) << degrees;
+        EXPECT_EQ(fx::readFrameNumber(turned), -1) << degrees;
+    }
+    EXPECT_FALSE(fx::isUpright(upright.mirrored(true, false)));
+    EXPECT_FALSE(fx::isUpright(upright.mirrored(false, true)));
+
+    QImage black(320, 240, QImage::Format_RGB32);
+    black.fill(Qt::black);
+    EXPECT_EQ(fx::readFrameNumber(black), -1);
+    QImage grey(320, 240, QImage::Format_RGB32);
+    grey.fill(QColor(128, 128, 128));
+    fx::drawFrameNumber(grey, 9);
+    for (int y = 48; y < 240; ++y) // wash the bit cells out to grey
+        for (int x = 0; x < 320; ++x)
+            grey.setPixel(x, y, qRgb(128, 128, 128));
+    EXPECT_TRUE(fx::isUpright(grey));
+    EXPECT_EQ(fx::readFrameNumber(grey), -1);
+    EXPECT_EQ(fx::readFrameNumber(QImage()), -1);
+    EXPECT_FALSE(fx::isUpright(QImage(3, 3, QImage::Format_RGB32)));
+}
+
+// No tone frequency is another's or a harmonic of another, so tracks can be told apart.
+TEST(FixtureMovieTest, ToneFrequenciesAreDistinctAndNoHarmonicsOfEachOther)
+{
+    for (int i = 0; i < 6; ++i)
+        for (int j = 0; j < 6; ++j) {
+            const double ratio = fx::toneFrequency(i) / fx::toneFrequency(j);
+            EXPECT_TRUE(i == j || std::abs(ratio - std::round(ratio)) > 0.05) << i << " vs " << j;
+        }
+    EXPECT_NE(fx::toneFrequency(6), fx::toneFrequency(7));
+}
+
+// A fixture movie numbers its frames, keeps its GOP, gives each track its own tone, and every call
+// writes its own file.
+TEST(FixtureMovieTest, WriteFixtureMovieNumbersFramesAndTonesTracks)
+{
+    zaf::test::ScratchDir dir;
+    const fx::FixtureSpec shape{.seconds = 1.5, .fps = 20, .audioTracks = 2, .channels = 1, .gop = 7};
+    const QString path = zaf::test::makeFixtureMovie(dir.path(), shape);
+    ASSERT_FALSE(path.isEmpty());
+    EXPECT_EQ(zaf::test::readFrameNumbers(path), range(30));
+    EXPECT_EQ(zaf::test::keyFrameIndexes(path), QList<int>({0, 7, 14, 21, 28}));
+    for (int k = 0; k < 2; ++k)
+        for (int j = 0; j < 2; ++j)
+            EXPECT_NEAR(zaf::test::toneLevel(path, k, j ? 660 : 440), j == k ? 0.5 : 0.0, j == k ? 0.05 : 0.02) << j << " in " << k;
+
+    const QString other = zaf::test::makeFixtureMovie(dir.path(), shape);
+    EXPECT_NE(other, path);
+    EXPECT_TRUE(QFileInfo::exists(other) && QFileInfo::exists(path));
+}
+
+// A rotated fixture stores the picture turned back with a display matrix, so it shows upright.
+class FixtureRotationTest : public ::testing::TestWithParam<int> {};
+
+TEST_P(FixtureRotationTest, RotatedFixtureShowsUprightNumberedFramesWhenDisplayed)
+{
+    const QString path = zaf::test::sharedFixtureMovie({.seconds = 0.2, .audioTracks = 0, .rotation = GetParam()});
+    const QList<QJsonObject> video = zaf::test::probeStreams(path, "video");
+    ASSERT_EQ(video.size(), 1);
+    EXPECT_EQ(video[0]["width"].toInt(), 320);
+    EXPECT_EQ(video[0]["height"].toInt(), 240);
+    EXPECT_EQ(zaf::test::probeRotation(video[0]), GetParam());
+    EXPECT_EQ(zaf::test::readFrameNumbers(path), range(6));
+}
+
+INSTANTIATE_TEST_SUITE_P(Rotations, FixtureRotationTest, ::testing::Values(0, 90, 180, 270));
+
+// The finished movie has the streams the settings describe, every frame in order, the GOP asked
+// for, and each audio track its own tone only.
+TEST(MovieWriterTest, FinishWritesStreamsDescribedBySettingsWithEveryFrameAndTone)
+{
+    zaf::test::ScratchDir dir;
+    const QString path = dir.file(QStringLiteral("out.mp4"));
+    const MovieWriter::Settings settings{.videoSize = QSize(352, 288), .frameRate = 25, .audioTracks = 3, .channels = 1, .gopLength = 10};
+    auto writer = createWriter(path, settings);
+    ASSERT_TRUE(writer);
+    appendNumberedFrames(*writer, 35);
+    ASSERT_FALSE(writer->finish());
+    EXPECT_EQ(writer->videoFramesWritten(), 35);
+
+    const QJsonObject probe = zaf::test::ffprobe(path);
+    EXPECT_TRUE(probe["format"].toObject()["format_name"].toString().contains("mp4"));
+    const QList<QJsonObject> video = zaf::test::probeStreams(probe, "video");
+    ASSERT_EQ(video.size(), 1);
+    EXPECT_EQ(video[0]["codec_name"].toString(), "h264");
+    EXPECT_EQ(video[0]["pix_fmt"].toString(), "yuv420p");
+    EXPECT_EQ(video[0]["width"].toInt(), 352);
+    EXPECT_EQ(video[0]["height"].toInt(), 288);
+    EXPECT_EQ(video[0]["avg_frame_rate"].toString(), "25/1");
+    EXPECT_EQ(zaf::test::probeRotation(video[0]), 0);
+    const QList<QJsonObject> audio = zaf::test::probeStreams(probe, "audio");
+    ASSERT_EQ(audio.size(), 3);
+    for (const QJsonObject &track : audio) {
+        EXPECT_EQ(track["codec_name"].toString(), "aac");
+        EXPECT_EQ(track["sample_rate"].toString(), "48000");
+        EXPECT_EQ(track["channels"].toInt(), 1);
+        EXPECT_NEAR(track["duration"].toString().toDouble(), 35 / 25.0, 0.05);
+    }
+    EXPECT_EQ(zaf::test::keyFrameIndexes(path), QList<int>({0, 10, 20, 30}));
+    EXPECT_EQ(zaf::test::readFrameNumbers(path), range(35));
+    for (int k = 0; k < 3; ++k)
+        for (int j = 0; j < 3; ++j)
+            EXPECT_NEAR(zaf::test::toneLevel(path, k, fx::toneFrequency(j)), j == k ? 0.5 : 0.0, j == k ? 0.05 : 0.02)
+                << "tone of track " << j << " in track " << k;
+}
+
+// Pictures of any format and size are converted and scaled; a null picture is a black frame.
+TEST(MovieWriterTest, AppendVideoFrameScalesAndConvertsPicturesOfAnyFormat)
+{
+    zaf::test::ScratchDir dir;
+    const QString path = dir.file(QStringLiteral("formats.mp4"));
+    auto writer = createWriter(path, MovieWriter::Settings{QSize(256, 160)});
+    ASSERT_TRUE(writer);
+    const QList<QImage::Format> formats = {QImage::Format_RGB888, QImage::Format_ARGB32_Premultiplied, QImage::Format_RGBA8888,
+                                           QImage::Format_RGB16, QImage::Format_BGR30};
+    const QList<QSize> sizes = {QSize(64, 48), QSize(1000, 700), QSize(256, 160), QSize(333, 91), QSize(50, 400)};
+    for (int n = 0; n < formats.size(); ++n)
+        ASSERT_FALSE(writer->appendVideoFrame(fx::frameNumberImage(n + 100, sizes[n].width(), sizes[n].height()).convertToFormat(formats[n])));
+    ASSERT_FALSE(writer->appendVideoFrame(QImage()));
+    ASSERT_FALSE(writer->finish());
+    EXPECT_EQ(zaf::test::readFrameNumbers(path), QList<int>({100, 101, 102, 103, 104, -1}));
+}
+
+// The movie is written under a hidden temporary name and appears under its own name only when
+// finished; an abandoned writer leaves nothing behind.
+TEST(MovieWriterTest, MovieAppearsUnderFinalNameOnlyAfterFinishAndNeverWhenAbandoned)
+{
+    zaf::test::ScratchDir dir;
+    const QString path = dir.file(QStringLiteral("late.mp4"));
+    auto writer = createWriter(path, MovieWriter::Settings{QSize(128, 96)});
+    ASSERT_TRUE(writer);
+    appendNumberedFrames(*writer, 5);
+    EXPECT_FALSE(QFileInfo::exists(path));
+    const QStringList during = QDir(dir.path()).entryList(QDir::Files | QDir::Hidden);
+    ASSERT_EQ(during.size(), 1);
+    EXPECT_TRUE(during[0].startsWith(".late.mp4")) << qPrintable(during[0]);
+    ASSERT_FALSE(writer->finish());
+    EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"late.mp4"}));
+    EXPECT_EQ(zaf::test::countVideoFrames(path), 5);
+
+    writer = createWriter(dir.file(QStringLiteral("abandoned.mp4")), MovieWriter::Settings{QSize(128, 96)});
+    ASSERT_TRUE(writer);
+    appendNumberedFrames(*writer, 5);
+    writer.reset();
+    EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"late.mp4"}));
+}
+
+// Creation fails, leaving no file and an existing one untouched, for an existing path, an
+// unwritable directory (logged with the path) and unsupported settings.
+TEST(MovieWriterTest, CreateFailsForExistingPathUnwritableDirectoryAndUnsupportedSettings)
+{
+    zaf::test::ScratchDir dir;
+    const QString taken = dir.write(QStringLiteral("taken.mp4"), 1234);
+    const QString bad = dir.file(QStringLiteral("bad.mp4"));
+    struct Case {
+        const char *name;
+        QString path;
+        MovieWriter::Settings settings;
+        int code;
+    };
+    const QList<Case> cases{
+        {"existing file", taken, {}, zaf::media::kMediaErrorOutputExists},
+        {"unwritable directory", QStringLiteral("/nonexistent-dir-zaf/out.mp4"), {}, zaf::media::kMediaErrorWriteFailed},
+        {"rotation 45", bad, {.rotation = 45}, zaf::media::kMediaErrorInvalidArgument},
+        {"3 channels", bad, {.audioTracks = 1, .channels = 3}, zaf::media::kMediaErrorInvalidArgument},
+        {"empty picture", bad, {.videoSize = QSize(0, 100)}, zaf::media::kMediaErrorInvalidArgument},
+        {"no frame rate", bad, {.frameRate = 0}, zaf::media::kMediaErrorInvalidArgument},
+    };
+    for (const auto &[name, path, settings, code] : cases) {
+        SCOPED_TRACE(name);
+        zaf::test::LogCapture log;
+        auto created = MovieWriter::create(path, settings);
+        ASSERT_FALSE(created.ok());
+        EXPECT_EQ(created.error->domain, "zaf.media");
+        EXPECT_EQ(created.error->code, code);
+        const QString logged = log.messages(QStringLiteral("zaf.media")).join(u'\n');
+        EXPECT_TRUE(code != zaf::media::kMediaErrorWriteFailed || logged.contains("/nonexistent-dir-zaf")) << qPrintable(logged);
+    }
+    EXPECT_EQ(QFileInfo(taken).size(), 1234);
+    EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"taken.mp4"}));
+}
+
+// An unknown audio track is refused, and after finish() nothing more is accepted.
+TEST(MovieWriterTest, AppendRejectsUnknownTrackAndAnythingAfterFinish)
+{
+    zaf::test::ScratchDir dir;
+    auto writer = createWriter(dir.file(QStringLiteral("closed.mp4")), {.videoSize = QSize(128, 96), .audioTracks = 1});
+    ASSERT_TRUE(writer);
+    const float samples[4] = {0, 0, 0, 0};
+    const zaf::OptionalError unknown = writer->appendAudio(1, samples, 2);
+    ASSERT_TRUE(unknown);
+    EXPECT_EQ(unknown->code, zaf::media::kMediaErrorInvalidArgument);
+    ASSERT_FALSE(writer->appendVideoFrame(fx::frameNumberImage(0, 128, 96)));
+    ASSERT_FALSE(writer->appendAudio(0, samples, 2));
+    ASSERT_FALSE(writer->finish());
+    EXPECT_TRUE(writer->appendVideoFrame(fx::frameNumberImage(1, 128, 96)));
+    EXPECT_TRUE(writer->appendAudio(0, samples, 2));
+    EXPECT_TRUE(writer->finish());
+    EXPECT_EQ(zaf::test::countVideoFrames(dir.file(QStringLiteral("closed.mp4"))), 1);
+}
+
+} // namespace
