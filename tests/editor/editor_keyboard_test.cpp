@@ -1,8 +1,6 @@
 // The desktop keys, typed into a shown editor window.
 #include "tests/editor/editor_test_support.h"
 
-#include "platform/media/playback_clock.h"
-#include "platform/ui/movie_scrubber.h"
 #include "platform/ui/window_host.h"
 
 #include <QApplication>
@@ -13,11 +11,10 @@ namespace {
 
 class EditorKeyboardTest : public EditorTest {
 protected:
-    void open()
+    void SetUp() override
     {
-        editor = makeEditor(movie(4), QRectF(0, 0, 480, 640));
-        ASSERT_TRUE(waitUntilReady(*editor));
-        editor->mvPlayer()->setTimeSource(std::make_shared<media::ManualTimeSource>());
+        EditorTest::SetUp();
+        editor = ready(movie(4), QRectF(0, 0, 480, 640));
         editor->setDelegate(&delegate);
         host = std::make_unique<ui::WindowHost>(editor.get());
         host->resize(480, 640);
@@ -41,19 +38,23 @@ protected:
     std::unique_ptr<ui::WindowHost> host;
 };
 
-TEST_F(EditorKeyboardTest, SpacePlaysAndPauses)
+TEST_F(EditorKeyboardTest, SpacePlaysAndPausesAndArrowsStepThePlayhead)
 {
-    open();
     press(Qt::Key_Space);
     EXPECT_GT(editor->mvPlayer()->rate(), 0);
     EXPECT_FALSE(editor->isIntroMode());
     press(Qt::Key_Space);
     EXPECT_EQ(editor->mvPlayer()->rate(), 0);
+
+    editor->mvTrimmer()->setValue(1.0);
+    press(Qt::Key_Right);
+    EXPECT_NEAR(editor->mvTrimmer()->value(), 1.0 + 1.0 / 30, 1e-6);
+    press(Qt::Key_Left, Qt::ShiftModifier);
+    EXPECT_NEAR(editor->mvTrimmer()->value(), 1.0 / 30, 1e-6);
 }
 
-TEST_F(EditorKeyboardTest, IAndOSetTheRangeAtThePlayheadAndEscapeCancelsTheTrim)
+TEST_F(EditorKeyboardTest, IAndOSetTheRangeAtThePlayheadEscapeCancelsTheTrimThenFinishes)
 {
-    open();
     editor->mvTrimmer()->setValue(1.0);
     press(Qt::Key_I);
     EXPECT_TRUE(editor->isTrimming());
@@ -76,16 +77,6 @@ TEST_F(EditorKeyboardTest, IAndOSetTheRangeAtThePlayheadAndEscapeCancelsTheTrim)
     EXPECT_FALSE(editor->isTrimming());
     EXPECT_FALSE(editor->mvTrimmer()->isEditing());
     EXPECT_TRUE(delegate.reports.isEmpty()) << "Escape during a trim cancels the trim, not the editor";
-}
-
-TEST_F(EditorKeyboardTest, ArrowsStepThePlayheadAndEscapeFinishesWithTheReport)
-{
-    open();
-    editor->mvTrimmer()->setValue(1.0);
-    press(Qt::Key_Right);
-    EXPECT_NEAR(editor->mvTrimmer()->value(), 1.0 + 1.0 / 30, 1e-6);
-    press(Qt::Key_Left, Qt::ShiftModifier);
-    EXPECT_NEAR(editor->mvTrimmer()->value(), 1.0 / 30, 1e-6);
 
     press(Qt::Key_Escape);
     ASSERT_EQ(delegate.reports.size(), 1);
@@ -94,4 +85,3 @@ TEST_F(EditorKeyboardTest, ArrowsStepThePlayheadAndEscapeFinishesWithTheReport)
 
 } // namespace
 } // namespace zaf::test
-

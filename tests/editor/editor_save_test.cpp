@@ -1,9 +1,6 @@
-// Save and done: the mixed movie reaches the video library, the report holds the save, and no file
-// is lost when the library fails.
+// Save and done: the mixed movie reaches the video library, the report holds the save (after any
+// completed share), and no file is lost when the library fails.
 #include "tests/editor/editor_test_support.h"
-
-#include "platform/media/playback_clock.h"
-#include "platform/ui/movie_scrubber.h"
 
 #include <QDir>
 
@@ -15,83 +12,58 @@ const QString kSave = QString::fromLatin1(ZafActivityTypeSaveToPhotoLibrary);
 class EditorSaveTest : public EditorTest {
 protected:
     // The video library of this process (read once per process: each test runs in its own).
-    void useLibrary(const QString &dir) { qputenv("ZAF_VIDEO_LIBRARY", QFile::encodeName(dir)); }
-
-    std::unique_ptr<ZafVideoEditorViewController> ready(const QString &path)
+    void SetUp() override
     {
-        auto e = makeEditor(path, QRectF(0, 0, 400, 700));
-        EXPECT_TRUE(waitUntilReady(*e));
-        e->mvPlayer()->setTimeSource(std::make_shared<media::ManualTimeSource>());
+        EditorTest::SetUp();
+        qputenv("ZAF_VIDEO_LIBRARY", QFile::encodeName(libraryPath));
+    }
+    std::unique_ptr<ZafVideoEditorViewController> open(const QString &path)
+    {
+        auto e = ready(path);
         e->setDelegate(&delegate);
         return e;
     }
-    bool waitForReport(int ms = 60000)
-    {
-        QElapsedTimer timer;
-        timer.start();
-        while (timer.elapsed() < ms && delegate.reports.isEmpty())
-            spin(20);
-        return !delegate.reports.isEmpty();
-    }
-    QStringList library() const
-    {
-        return QDir(scratch.file(QStringLiteral("Videos"))).entryList(QDir::Files | QDir::NoDotAndDotDot);
-    }
+    bool waitForReport() { return waitUntil([&] { return !delegate.reports.isEmpty(); }); }
+    QStringList library() const { return QDir(libraryPath).entryList(QDir::Files | QDir::NoDotAndDotDot); }
 
+    QString libraryPath = scratch.file(QStringLiteral("Videos"));
     RecordingDelegate delegate;
 };
 
 TEST_F(EditorSaveTest, SavePutsOneMixedPlayableMovieInTheLibraryThenFinishes)
 {
-    useLibrary(scratch.file(QStringLiteral("Videos")));
     const QString source = movie(2, 320, 240, 0, 2);
-    auto e = ready(source);
+    auto e = open(source);
     e->saveButton()->trigger();
     ASSERT_TRUE(waitForReport());
     EXPECT_EQ(delegate.reports.first(), QStringList{kSave});
-    const QStringList saved = library();
-    ASSERT_EQ(saved.size(), 1);
-    const QJsonObject probe = ffprobe(QDir(scratch.file(QStringLiteral("Videos"))).filePath(saved.first()));
+    ASSERT_EQ(library().size(), 1);
+    const QJsonObject probe = ffprobe(QDir(libraryPath).filePath(library().first()));
     EXPECT_EQ(probeStreams(probe, QStringLiteral("audio")).size(), 1);
     EXPECT_EQ(probeStreams(probe, QStringLiteral("video")).size(), 1);
     // The movie before mixing goes once the mixed copy is safely in the library.
-    QElapsedTimer timer;
-    timer.start();
-    while (timer.elapsed() < 5000 && QFile::exists(source))
-        spin(20);
-    EXPECT_FALSE(QFile::exists(source));
+    EXPECT_TRUE(waitUntil([&] { return !QFile::exists(source); }, 5000));
 }
 
 TEST_F(EditorSaveTest, TrimThenSaveReportsTheSaveTwiceAndSavesTheTrimmedMovie)
 {
-    useLibrary(scratch.file(QStringLiteral("Videos")));
-    auto e = ready(movie(4, 320, 240, 0, 1));
-    ui::MovieScrubber *s = e->mvTrimmer();
-    s->setEditing(true, false);
-    e->movieScrubberDidBeginEditing(s);
-    e->movieScrubberEditingStartValueDidChange(s, 1);
-    e->movieScrubberEditingEndValueDidChange(s, 3);
-    const QUrl before = e->videoURL();
-    e->trimButton()->trigger();
-    QElapsedTimer timer;
-    timer.start();
-    while (timer.elapsed() < 60000 && e->videoURL() == before)
-        spin(20);
-    ASSERT_NE(e->videoURL(), before);
+    auto e = open(movie(4, 320, 240, 0, 1));
+    const QUrl original = e->videoURL();
+    selectRange(*e, 1, 3);
+    ASSERT_TRUE(applyTrim(*e));
     e->saveButton()->trigger();
     ASSERT_TRUE(waitForReport());
     EXPECT_EQ(delegate.reports.first(), (QStringList{kSave, kSave}));
     ASSERT_EQ(library().size(), 1);
-    const QList<int> frames = readFrameNumbers(QDir(scratch.file(QStringLiteral("Videos"))).filePath(library().first()));
+    const QList<int> frames = readFrameNumbers(QDir(libraryPath).filePath(library().first()));
     ASSERT_EQ(frames.size(), 60);
     EXPECT_EQ(frames.first(), 30);
-    EXPECT_TRUE(QFile::exists(before.toLocalFile())) << "the host's movie was not the one saved";
+    EXPECT_TRUE(QFile::exists(original.toLocalFile())) << "the host's movie was not the one saved";
 }
 
 TEST_F(EditorSaveTest, CompletedShareComesBeforeTheSaveInTheReport)
 {
-    useLibrary(scratch.file(QStringLiteral("Videos")));
-    auto e = ready(movie(1));
+    auto e = open(movie(1));
     e->shareSheetDidCompleteWithActivityType(QStringLiteral("com.zafrel.activity.Mail"), true);
     e->saveAction();
     ASSERT_TRUE(waitForReport());
@@ -100,7 +72,7 @@ TEST_F(EditorSaveTest, CompletedShareComesBeforeTheSaveInTheReport)
 
 TEST_F(EditorSaveTest, WithTheShareSheetUpSaveAndDoneDoNothing)
 {
-    auto e = ready(movie(1));
+    auto e = open(movie(1));
     e->setShareSheetUp(true);
     e->saveAction();
     e->doneAction();
@@ -111,11 +83,12 @@ TEST_F(EditorSaveTest, WithTheShareSheetUpSaveAndDoneDoNothing)
 
 TEST_F(EditorSaveTest, UnavailableLibraryStillFinishesAndKeepsTheMovie)
 {
-    const QString blocker = scratch.write(QStringLiteral("not-a-directory"), 1);
-    useLibrary(blocker + QStringLiteral("/Videos"));
+    // A file where the library's parent folder should be.
+    libraryPath = scratch.write(QStringLiteral("not-a-directory"), 1) + QStringLiteral("/Videos");
+    qputenv("ZAF_VIDEO_LIBRARY", QFile::encodeName(libraryPath));
     LogCapture logs;
     const QString source = movie(1, 320, 240, 0, 2);
-    auto e = ready(source);
+    auto e = open(source);
     e->saveAction();
     ASSERT_TRUE(waitForReport());
     EXPECT_EQ(delegate.reports.first(), QStringList{kSave});

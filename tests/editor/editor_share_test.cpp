@@ -9,7 +9,6 @@
 
 #include <QAbstractButton>
 
-
 namespace zaf::test {
 namespace {
 
@@ -45,10 +44,7 @@ protected:
     }
     ui::ShareSheet *presentedSheet(ZafVideoEditorViewController &e)
     {
-        QElapsedTimer timer;
-        timer.start();
-        while (timer.elapsed() < 10000 && !qobject_cast<ui::ShareSheet *>(e.presentedViewController()))
-            spin(20);
+        waitUntil([&] { return qobject_cast<ui::ShareSheet *>(e.presentedViewController()) != nullptr; }, 10000);
         spin(50);
         return qobject_cast<ui::ShareSheet *>(e.presentedViewController());
     }
@@ -56,17 +52,17 @@ protected:
 
 TEST_F(EditorShareTest, ItemsFollowTheOverrideMessageOrTheStoreRecord)
 {
-    auto e = makeEditor(scratch.file(QStringLiteral("none.mp4")), QRectF(0, 0, 400, 700));
+    auto e = makeEditor(noMovie());
     const QUrl movie = QUrl::fromLocalFile(QStringLiteral("/tmp/movie.mp4"));
     const QUrl attachment = QUrl::fromLocalFile(QStringLiteral("/tmp/notes.txt"));
+    const ZafStoreInfo store = record(QStringLiteral("Rec"), QStringLiteral("Zafrel"), QStringLiteral("appstream://x"));
 
     e->setOverrideShareMessage(QStringLiteral("Look"));
-    EXPECT_EQ(e->shareItemsForStoreInfo(record(QStringLiteral("Rec"), QStringLiteral("Zafrel"), QStringLiteral("appstream://x")), movie),
-              (QVariantList{QStringLiteral("Look"), movie}));
+    EXPECT_EQ(e->shareItemsForStoreInfo(store, movie), (QVariantList{QStringLiteral("Look"), movie}));
 
     e->setOverrideShareMessage(QString());
     e->setFileAttachmentURL(attachment);
-    EXPECT_EQ(e->shareItemsForStoreInfo(record(QStringLiteral("Rec"), QStringLiteral("Zafrel"), QStringLiteral("appstream://x")), movie),
+    EXPECT_EQ(e->shareItemsForStoreInfo(store, movie),
               (QVariantList{QStringLiteral("Recorded with Rec by Zafrel"), QStringLiteral("appstream://x"), movie, attachment}));
     EXPECT_EQ(ZafVideoEditorViewController::shareTextForStoreInfo(record(QStringLiteral("Rec"), QString(""), QString(""))),
               QStringLiteral("Rec"));
@@ -87,10 +83,10 @@ TEST_F(EditorShareTest, PublishingIsOfferedOnlyWithThePluginAndWithoutTheService
     EXPECT_FALSE(ZafVideoEditorViewController::offersPublishingActivity());
 }
 
-TEST_F(EditorShareTest, SheetPutsPublishingThirdExcludesCopyAndCancelRecordsNothing)
+TEST_F(EditorShareTest, SheetOffersPublishingRightAfterMailExcludesCopyAndCancelRecordsNothing)
 {
     installPlugin();
-    auto e = makeEditor(movie(1), QRectF(0, 0, 400, 700));
+    auto e = makeEditor(movie(1));
     e->shareAction();
     ui::ShareSheet *sheet = presentedSheet(*e);
     ASSERT_NE(sheet, nullptr);

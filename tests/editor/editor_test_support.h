@@ -5,18 +5,23 @@
 
 #include "editor/editor.h"
 #include "platform/capability/capability_service.h"
+#include "platform/media/playback_clock.h"
 #include "platform/media/player_item.h"
 #include "platform/ui/bar_button_item.h"
+#include "platform/ui/movie_scrubber.h"
 #include "platform/ui/toolbar.h"
+#include "platform/ui/transition_coordinator.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/process_temp_directory.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tempstore/temp_store.h"
 #include "tests/support/temp_dir.h"
+#include "tests/support/wait_until.h"
 
 #include <QCoreApplication>
 #include <QElapsedTimer>
 #include <QFile>
+#include <QWidget>
 #include <gtest/gtest.h>
 
 #include <memory>
@@ -49,16 +54,10 @@ inline void useCapabilities(const ScratchDir &scratch, const QByteArray &json)
 }
 
 // Waits (bounded) until the editor's current item is ready, handling events.
-inline bool waitUntilReady(ZafVideoEditorViewController &editor, int timeoutMs = 10000)
+inline bool waitUntilReady(ZafVideoEditorViewController &editor)
 {
-    QElapsedTimer timer;
-    timer.start();
-    while (timer.elapsed() < timeoutMs) {
-        if (editor.mvPlayer()->currentItem()->status() == media::PlayerItem::Status::ReadyToPlay)
-            return true;
-        QCoreApplication::processEvents(QEventLoop::AllEvents, 20);
-    }
-    return false;
+    return waitUntil([&] { return editor.mvPlayer()->currentItem()->status() == media::PlayerItem::Status::ReadyToPlay; },
+                     10000);
 }
 
 // Handles pending events for a while (queued main-thread work, fades).
@@ -80,16 +79,15 @@ protected:
     // A movie of the given shape in the scratch directory.
     QString movie(double seconds = 3, int width = 320, int height = 240, int rotation = 0, int audioTracks = 1)
     {
-        fixture::FixtureSpec spec;
-        spec.seconds = seconds;
-        spec.width = width;
-        spec.height = height;
-        spec.rotation = rotation;
-        spec.audioTracks = audioTracks;
-        return makeFixtureMovie(scratch.path(), spec);
+        return makeFixtureMovie(scratch.path(), {.seconds = seconds, .width = width, .height = height,
+                                                 .audioTracks = audioTracks, .rotation = rotation});
     }
 
-    std::unique_ptr<ZafVideoEditorViewController> makeEditor(const QString &path, const QRectF &rect,
+    // A path where no movie is: enough for everything but playback, and quick.
+    QString noMovie() const { return scratch.file(QStringLiteral("none.mp4")); }
+
+    // An editor in a portrait (small-screen) frame unless told otherwise.
+    std::unique_ptr<ZafVideoEditorViewController> makeEditor(const QString &path, const QRectF &rect = QRectF(0, 0, 400, 700),
                                                              const QColor &tint = QColor())
     {
         return std::make_unique<ZafVideoEditorViewController>(QStringLiteral("com.example.recorder"),
@@ -97,8 +95,50 @@ protected:
                                                               tint, rect);
     }
 
+    // An editor whose movie is ready and whose player runs on `clock`, which only the test advances.
+    std::unique_ptr<ZafVideoEditorViewController> ready(const QString &path, const QRectF &rect = QRectF(0, 0, 400, 700))
+    {
+        auto editor = makeEditor(path, rect);
+        EXPECT_TRUE(waitUntilReady(*editor));
+        clock = std::make_shared<media::ManualTimeSource>();
+        editor->mvPlayer()->setTimeSource(clock);
+        return editor;
+    }
+
     ScratchDir scratch;
+    std::shared_ptr<media::ManualTimeSource> clock;
 };
+
+// Resizes the editor's view to a new shape as a window rotation does, running the transition.
+inline void rotate(ZafVideoEditorViewController &e, double width, double height)
+{
+    ui::TransitionCoordinator coordinator(QSizeF(width, height));
+    e.view()->resize(int(width), int(height));
+    e.viewWillTransitionToSize(QSizeF(width, height), coordinator);
+    coordinator.complete();
+}
+
+// Drags the trim handles as the timeline reports it: editing begins, then both values move.
+inline void selectRange(ZafVideoEditorViewController &e, double start, double end)
+{
+    ui::MovieScrubber *s = e.mvTrimmer();
+    if (!s->isEditing()) {
+        s->setEditing(true, false);
+        e.movieScrubberDidBeginEditing(s);
+    }
+    s->setEditingRange(start, end);
+    e.movieScrubberEditingStartValueDidChange(s, start);
+    e.movieScrubberEditingEndValueDidChange(s, end);
+    spin(20);
+}
+
+// Applies the trim with the trim item and waits (bounded) for the trimmed movie to be loaded.
+inline bool applyTrim(ZafVideoEditorViewController &e)
+{
+    const QUrl before = e.videoURL();
+    e.trimButton()->trigger();
+    return waitUntil([&] { return e.videoURL() != before; });
+}
 
 // The items of a toolbar, by the editor's names for them.
 inline QStringList itemNames(const ZafVideoEditorViewController &e, ui::Toolbar *toolbar)

@@ -1,9 +1,6 @@
 // Trimming through the editor on generated movies: the export, the reload, cancel and the shake.
 #include "tests/editor/editor_test_support.h"
 
-#include "platform/media/playback_clock.h"
-#include "platform/ui/movie_scrubber.h"
-
 #include <QDir>
 #include <QFileInfo>
 #include <QRegularExpression>
@@ -11,48 +8,14 @@
 namespace zaf::test {
 namespace {
 
-class EditorTrimTest : public EditorTest {
-protected:
-    std::unique_ptr<ZafVideoEditorViewController> ready(double seconds)
-    {
-        auto e = makeEditor(movie(seconds), QRectF(0, 0, 400, 700));
-        EXPECT_TRUE(waitUntilReady(*e));
-        e->mvPlayer()->setTimeSource(std::make_shared<media::ManualTimeSource>());
-        return e;
-    }
-    // Drags the handles as the timeline reports it: editing begins, then both values move.
-    static void selectRange(ZafVideoEditorViewController &e, double start, double end)
-    {
-        ui::MovieScrubber *s = e.mvTrimmer();
-        if (!s->isEditing()) {
-            s->setEditing(true, false);
-            e.movieScrubberDidBeginEditing(s);
-        }
-        s->setEditingRange(start, end);
-        e.movieScrubberEditingStartValueDidChange(s, start);
-        e.movieScrubberEditingEndValueDidChange(s, end);
-        spin(20);
-    }
-    // Applies the trim with the trim item and waits (bounded) for the trimmed movie to be loaded.
-    static bool applyTrim(ZafVideoEditorViewController &e)
-    {
-        const QUrl before = e.videoURL();
-        e.trimButton()->trigger();
-        QElapsedTimer timer;
-        timer.start();
-        while (timer.elapsed() < 60000 && e.videoURL() == before)
-            spin(20);
-        return e.videoURL() != before;
-    }
-    static QStringList tempEntries()
-    {
-        return QDir(ZafTempStore::defaultStore()._srTempPath()).entryList(QDir::Files | QDir::Hidden | QDir::NoDotAndDotDot);
-    }
-};
-
-TEST_F(EditorTrimTest, AppliedTrimHoldsExactlyTheSelectedFramesAndReplacesTheMovie)
+QStringList tempEntries()
 {
-    auto e = ready(10);
+    return QDir(ZafTempStore::defaultStore()._srTempPath()).entryList(QDir::Files | QDir::Hidden | QDir::NoDotAndDotDot);
+}
+
+TEST_F(EditorTest, AppliedTrimHoldsExactlyTheSelectedFramesAndReplacesTheMovie)
+{
+    auto e = ready(movie(10));
     selectRange(*e, 2, 7);
     EXPECT_TRUE(e->isTrimming());
     media::Player *oldPlayer = e->mvPlayer();
@@ -91,9 +54,9 @@ TEST_F(EditorTrimTest, AppliedTrimHoldsExactlyTheSelectedFramesAndReplacesTheMov
     EXPECT_EQ(frames.last(), 209);
 }
 
-TEST_F(EditorTrimTest, CancelKeepsTheHandleValuesAndTouchesNoFile)
+TEST_F(EditorTest, CancelledTrimKeepsTheHandleValuesAndTouchesNoFile)
 {
-    auto e = ready(4);
+    auto e = ready(movie(4));
     const QStringList before = tempEntries();
     selectRange(*e, 1, 2.5);
     e->cancelTrimButton()->trigger();
@@ -105,9 +68,9 @@ TEST_F(EditorTrimTest, CancelKeepsTheHandleValuesAndTouchesNoFile)
     EXPECT_EQ(itemNames(*e, e->topToolBar()), words("done flex title flex save"));
 }
 
-TEST_F(EditorTrimTest, SecondTrimOfTheTrimmedMovieWorksAndRetiresTheFirstFile)
+TEST_F(EditorTest, SecondTrimOfTheTrimmedMovieWorksAndRetiresTheFirstFile)
 {
-    auto e = ready(10);
+    auto e = ready(movie(10));
     selectRange(*e, 2, 7);
     ASSERT_TRUE(applyTrim(*e));
     ASSERT_TRUE(waitUntilReady(*e));
@@ -123,11 +86,7 @@ TEST_F(EditorTrimTest, SecondTrimOfTheTrimmedMovieWorksAndRetiresTheFirstFile)
     ASSERT_EQ(frames.size(), 60);
     EXPECT_EQ(frames.first(), 90);
     EXPECT_EQ(frames.last(), 149);
-    QElapsedTimer timer;
-    timer.start();
-    while (timer.elapsed() < 5000 && QFile::exists(first))
-        spin(20);
-    EXPECT_FALSE(QFile::exists(first)) << "the earlier trim is removed once the new one is written";
+    EXPECT_TRUE(waitUntil([&] { return !QFile::exists(first); }, 5000)) << "the earlier trim is removed once the new one is written";
 
     e.reset();
     EXPECT_TRUE(tempEntries().isEmpty()) << "destroying the editor empties the temporary directory";

@@ -1,15 +1,22 @@
 #pragma once
 
-// Support for the overlay button tests: action targets, a surface standing for the video behind the
-// button, a pointer that delivers mouse events through a window as the windowing system does, and
-// the capability file that picks the device's graphics-quality level.
+// Support for the overlay button tests: an action target, a surface standing for the video behind
+// the button, a pointer that delivers mouse events through the window as the windowing system does,
+// the capability file that picks the graphics-quality level, and a fixture showing a button of one
+// variant on a surface.
 
+#include "overlay/flat_video_overlay_button.h"
+#include "overlay/high_fidelity_video_overlay_button.h"
+#include "overlay/overlay_images.h"
+#include "overlay/video_overlay_constants.h"
+#include "platform/capability/capability_service.h"
 #include "tests/support/temp_dir.h"
 
-#include <QImage>
-#include <QObject>
-#include <QPoint>
-#include <QWidget>
+#include <QApplication>
+#include <QFile>
+#include <QMouseEvent>
+#include <QWindow>
+#include <gtest/gtest.h>
 
 #include <optional>
 
@@ -23,20 +30,20 @@ public:
     QObject *lastSender = nullptr;
 
 public Q_SLOTS:
-    void playAction(QObject *sender);
+    void playAction(QObject *sender) { ++calls, lastSender = sender; }
 };
 
 // A top-level widget standing for the video: counts the mouse presses and releases that reach it.
 class TapSurface : public QWidget {
     Q_OBJECT
 public:
-    TapSurface();
+    TapSurface() { resize(400, 300); }
     int presses = 0;
     int releases = 0;
 
 protected:
-    void mousePressEvent(QMouseEvent *event) override;
-    void mouseReleaseEvent(QMouseEvent *event) override;
+    void mousePressEvent(QMouseEvent *event) override { ++presses, event->accept(); }
+    void mouseReleaseEvent(QMouseEvent *event) override { ++releases, event->accept(); }
 };
 
 // Sends left-button mouse events to a shown top-level widget's window at window coordinates, so the
@@ -44,35 +51,106 @@ protected:
 class Pointer {
 public:
     explicit Pointer(QWidget *window) : m_window(window) {}
-    void press(QPoint pos, Qt::MouseButton button = Qt::LeftButton);
-    void move(QPoint pos);
-    void release(QPoint pos, Qt::MouseButton button = Qt::LeftButton);
-    // press then release at the same point.
-    void tap(QPoint pos);
+    void press(QPoint pos) { send(QEvent::MouseButtonPress, pos, Qt::LeftButton, Qt::LeftButton); }
+    void move(QPoint pos) { send(QEvent::MouseMove, pos, Qt::NoButton, m_buttons); }
+    void release(QPoint pos) { send(QEvent::MouseButtonRelease, pos, Qt::LeftButton, Qt::NoButton); }
+    void tap(QPoint pos) { press(pos), release(pos); }
 
 private:
-    void send(int type, QPoint pos, Qt::MouseButton button, Qt::MouseButtons buttons);
+    void send(QEvent::Type type, QPoint pos, Qt::MouseButton button, Qt::MouseButtons buttons)
+    {
+        m_buttons = buttons;
+        QWindow *window = m_window->windowHandle();
+        QMouseEvent event(type, QPointF(pos), window->mapToGlobal(QPointF(pos)), button, buttons, Qt::NoModifier);
+        QApplication::sendEvent(window, &event);
+    }
     QWidget *m_window;
     Qt::MouseButtons m_buttons;
 };
 
 // A widget's centre, and a point outside it (but inside the window), in the window's coordinates.
-QPoint centreInWindow(const QWidget *widget);
-QPoint outsideInWindow(const QWidget *widget);
+inline QPoint centreInWindow(const QWidget *widget)
+{
+    return widget->mapTo(widget->window(), widget->rect().center());
+}
+inline QPoint outsideInWindow(const QWidget *widget)
+{
+    return widget->mapTo(widget->window(), QPoint(widget->width() + 10, widget->height() + 10));
+}
 
 // Points the capability service at a file answering `level` as graphics-quality level (no file when
 // empty); the destructor restores the defaults.
 class GraphicsQualityLevel {
 public:
-    explicit GraphicsQualityLevel(std::optional<int> level);
-    ~GraphicsQualityLevel();
+    explicit GraphicsQualityLevel(std::optional<int> level)
+    {
+        qunsetenv("ZAF_CAPABILITIES_FILE");
+        if (level) {
+            QFile file(m_scratch.file(QStringLiteral("capabilities.json")));
+            if (file.open(QIODevice::WriteOnly))
+                file.write(QByteArray(R"({"graphics-quality-level": )") + QByteArray::number(*level) + "}");
+            qputenv("ZAF_CAPABILITIES_FILE", QFile::encodeName(file.fileName()));
+        }
+        CapabilityService::shared().reload();
+    }
+    ~GraphicsQualityLevel()
+    {
+        qunsetenv("ZAF_CAPABILITIES_FILE");
+        CapabilityService::shared().reload();
+    }
 
 private:
     ScratchDir m_scratch;
 };
 
 // The mask images as the buttons load them.
-QImage backgroundMask();
-QImage glyphMask();
+inline QImage backgroundMask()
+{
+    return overlay::imageNamed(QLatin1String(ZafVideoOverlayBackgroundMaskImageName));
+}
+inline QImage glyphMask()
+{
+    return overlay::imageNamed(QLatin1String(ZafVideoOverlayGlyphMaskImageName));
+}
+
+// Whether the button shows its pressed look: it paints the highlighted shared image (flat), or its
+// glyph has the pressed alpha (high fidelity). Any third look fails the test.
+inline bool looksPressed(ZafFlatVideoOverlayButton *button)
+{
+    const QImage &highlighted = ZafFlatVideoOverlayButton::_highlightedButtonImage();
+    QImage painted(highlighted.size(), QImage::Format_ARGB32_Premultiplied);
+    painted.setDevicePixelRatio(highlighted.devicePixelRatio());
+    painted.fill(Qt::transparent);
+    button->render(&painted, QPoint(), QRegion(), QWidget::DrawChildren);
+    EXPECT_TRUE(painted == highlighted || painted == ZafFlatVideoOverlayButton::_normalButtonImage());
+    return painted == highlighted;
+}
+inline bool looksPressed(ZafHighFidelityVideoOverlayButton *button)
+{
+    const double alpha = button->glyphAlpha();
+    EXPECT_TRUE(alpha == ZafVideoOverlayDefaultGlyphAlpha || alpha == ZafVideoOverlayHighlightedGlyphAlpha) << alpha;
+    return alpha == ZafVideoOverlayHighlightedGlyphAlpha;
+}
+
+// A style-0 button of the variant `Button` on a shown surface standing for the video, its tap aimed
+// at target.playAction.
+template <class Button>
+class ButtonOnSurface : public ::testing::Test {
+protected:
+    void SetUp() override
+    {
+        button = new Button(0, &surface);
+        button->move(80, 60);
+        button->setTargetAction(&target, "playAction");
+        surface.show();
+    }
+    QPoint centre() const { return centreInWindow(button); }
+    QPoint outside() const { return outsideInWindow(button); }
+
+    TapSurface surface;
+    ActionTarget target;
+    Button *button = nullptr;
+    Pointer pointer{&surface};
+};
 
 } // namespace zaf::test

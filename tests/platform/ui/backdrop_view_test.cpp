@@ -8,23 +8,21 @@
 namespace zaf::ui {
 namespace {
 
-QWidget *solid(QWidget *parent, const QRect &frame, const QColor &colour)
-{
-    auto *widget = new QWidget(parent);
-    widget->setGeometry(frame);
-    widget->setAutoFillBackground(true);
-    QPalette palette = widget->palette();
-    palette.setColor(QPalette::Window, colour);
-    widget->setPalette(palette);
-    widget->show();
-    return widget;
-}
-
 void recolour(QWidget *widget, const QColor &colour)
 {
     QPalette palette = widget->palette();
     palette.setColor(QPalette::Window, colour);
     widget->setPalette(palette);
+}
+
+QWidget *solid(QWidget *parent, const QRect &frame, const QColor &colour)
+{
+    auto *widget = new QWidget(parent);
+    widget->setGeometry(frame);
+    widget->setAutoFillBackground(true);
+    recolour(widget, colour);
+    widget->show();
+    return widget;
 }
 
 // The average colour of a column band of an image (x from `from` to `to` as fractions of the width).
@@ -56,7 +54,7 @@ struct BackdropFixture : ::testing::Test {
     }
 };
 
-TEST_F(BackdropFixture, RendersABlurredCopyWhoseColourFollowsWhatLiesBehind)
+TEST_F(BackdropFixture, RendersABlurredCopyOfWhatLiesBehindOnRefreshAndOnItsOwnWhileShown)
 {
     backdrop->refresh();
     QImage picture = backdrop->lastRenderedBackground();
@@ -77,6 +75,12 @@ TEST_F(BackdropFixture, RendersABlurredCopyWhoseColourFollowsWhatLiesBehind)
     backdrop->refresh();
     EXPECT_GT(average(backdrop->lastRenderedBackground(), 0.05, 0.3).green(), 150);
     EXPECT_LT(average(backdrop->lastRenderedBackground(), 0.05, 0.3).red(), 40);
+
+    // Without a refresh call, the refresh timer (about 15 times a second) picks up a change.
+    recolour(right, QColor(0, 220, 0));
+    for (int i = 0; i < 50 && average(backdrop->lastRenderedBackground(), 0.7, 0.95).green() < 150; ++i)
+        QTest::qWait(20);
+    EXPECT_GT(average(backdrop->lastRenderedBackground(), 0.7, 0.95).green(), 150);
 }
 
 TEST_F(BackdropFixture, LeavesOutItsChildrenAndWhatIsStackedAbove)
@@ -89,17 +93,6 @@ TEST_F(BackdropFixture, LeavesOutItsChildrenAndWhatIsStackedAbove)
     const QColor rightPart = average(picture, 0.7, 0.95);
     EXPECT_GT(rightPart.blue(), 180);
     EXPECT_LT(rightPart.green(), 40);
-}
-
-TEST_F(BackdropFixture, RefreshesOnItsOwnWhileShown)
-{
-    QApplication::processEvents();
-    ASSERT_FALSE(backdrop->lastRenderedBackground().isNull());
-    recolour(right, QColor(0, 220, 0));
-    // The refresh timer runs about 15 times a second.
-    for (int i = 0; i < 50 && average(backdrop->lastRenderedBackground(), 0.7, 0.95).green() < 150; ++i)
-        QTest::qWait(20);
-    EXPECT_GT(average(backdrop->lastRenderedBackground(), 0.7, 0.95).green(), 150);
 }
 
 TEST_F(BackdropFixture, TintsLightAndMasksShapeWhereItShows)
@@ -120,8 +113,6 @@ TEST_F(BackdropFixture, TintsLightAndMasksShapeWhereItShows)
     QWidget *glyph = solid(backdrop, QRect(225, 0, 75, 38), Qt::white);
     BackdropView::setBackdropMaskFlags(glyph, 1 | 2);
     backdrop->addMaskView(glyph);
-    EXPECT_EQ(backdrop->maskViews(), (QList<QWidget *>{shape, glyph}));
-    EXPECT_EQ(BackdropView::backdropMaskFlags(glyph), 3);
 
     const QImage shaped = backdrop->grab().toImage();
     EXPECT_EQ(average(shaped, 0.05, 0.4).alpha(), 0);

@@ -29,8 +29,8 @@ struct EditorLikeView : ::testing::Test {
         view.show();
     }
 
-    // The four rules the small-screen (bottom = toolbar top) or large-screen (bottom = view bottom)
-    // arrangement adds each time it is applied.
+    // The four rules of the small-screen (bottom = toolbar top) or large-screen (bottom = view
+    // bottom) arrangement.
     QList<LayoutRule> arrangement(bool large, const QByteArray &group = {})
     {
         return {
@@ -43,18 +43,13 @@ struct EditorLikeView : ::testing::Test {
     }
 };
 
-TEST_F(EditorLikeView, SmallScreenArrangementPutsContainerAboveBottomToolbar)
+TEST_F(EditorLikeView, SwitchingArrangementsBackAndForthNeverKeepsStaleGeometry)
 {
+    // Small screen: the container sits above the bottom toolbar.
     rules->addRules(arrangement(false));
     EXPECT_EQ(LayoutRules::forView(&view), rules);
     settle();   // adding rules lays the view out on the next pass
     EXPECT_EQ(container->geometry(), QRect(0, 618, 400, 38));
-}
-
-TEST_F(EditorLikeView, SwitchingArrangementsBackAndForthNeverKeepsStaleGeometry)
-{
-    rules->addRules(arrangement(false));
-    settle();
 
     // Large screen: the bottom toolbar leaves the view, its rule goes dormant.
     removeFromSuperview(bottomBar);
@@ -97,17 +92,7 @@ TEST_F(EditorLikeView, RetiringAGroupLeavesOnlyTheOtherArrangement)
     EXPECT_EQ(container->geometry(), QRect(0, 662, 400, 38));   // nothing moves it any more
 }
 
-TEST_F(EditorLikeView, RuleWhoseSecondItemIsDestroyedIsSkippedNotTreatedAsConstant)
-{
-    rules->addRules(arrangement(true));
-    rules->addRules(arrangement(false));
-    delete bottomBar;
-    bottomBar = nullptr;
-    view.resize(400, 600);
-    EXPECT_EQ(container->geometry(), QRect(0, 562, 400, 38));
-}
-
-TEST_F(EditorLikeView, RuleWhoseSecondItemBelongsElsewhereIsSkipped)
+TEST_F(EditorLikeView, RuleWhoseSecondItemBelongsElsewhereOrIsDestroyedIsSkippedNotTreatedAsConstant)
 {
     QWidget elsewhere;
     QWidget *stranger = new QWidget(&elsewhere);
@@ -116,6 +101,12 @@ TEST_F(EditorLikeView, RuleWhoseSecondItemBelongsElsewhereIsSkipped)
     rules->addRule({container, A::Bottom, stranger, A::Top, 1, 0, {}});
     rules->layoutIfNeeded();
     EXPECT_EQ(container->geometry(), QRect(0, 662, 400, 38));
+
+    rules->addRules(arrangement(false));
+    delete bottomBar;
+    bottomBar = nullptr;
+    view.resize(400, 600);
+    EXPECT_EQ(container->geometry(), QRect(0, 562, 400, 38));
 }
 
 TEST(LayoutRulesTest, AttributesCombinePerAxis)

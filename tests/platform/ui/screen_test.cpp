@@ -22,12 +22,11 @@ TEST(ScreenTest, BoundsStartAtOriginWithThePrimaryScreensSizeAndScale)
 
 TEST(DeviceTest, IdiomFollowsTheCapabilityServiceAndDefaultsToCannotTell)
 {
-    struct Case {
+    const struct {
         const char *json;
         bool canTell;
         DeviceIdiom idiom;
-    };
-    const Case cases[] = {
+    } cases[] = {
         {nullptr, false, DeviceIdiom::Unspecified},
         {R"({"device-idiom": 1})", true, DeviceIdiom::Pad},
         {R"({"device-idiom": 0})", true, DeviceIdiom::Phone},
@@ -35,12 +34,11 @@ TEST(DeviceTest, IdiomFollowsTheCapabilityServiceAndDefaultsToCannotTell)
     };
     const QByteArray saved = qgetenv("ZAF_CAPABILITIES_FILE");
     zaf::test::ScratchDir dir;
-    for (const Case &c : cases) {
+    for (const auto &c : cases) {
         SCOPED_TRACE(c.json ? c.json : "no file");
         if (c.json) {
             QFile file(dir.file("capabilities.json"));
-            ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate));
-            file.write(c.json);
+            ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate) && file.write(c.json) > 0);
             file.close();
             qputenv("ZAF_CAPABILITIES_FILE", QFile::encodeName(file.fileName()));
         } else {

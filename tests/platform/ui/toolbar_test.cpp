@@ -16,23 +16,6 @@
 namespace zaf::ui {
 namespace {
 
-// A target whose "map" action takes the sender: QSignalMapper reports which mapped sender called.
-struct ActionTarget {
-    QSignalMapper mapper;
-    int plays = 0;
-    QObject *lastSender = nullptr;
-    std::function<void()> onPlay;
-    ActionTarget()
-    {
-        QObject::connect(&mapper, &QSignalMapper::mappedObject, [this](QObject *sender) {
-            ++plays;
-            lastSender = sender;
-            if (onPlay)
-                onPlay();
-        });
-    }
-};
-
 void settle()
 {
     for (int i = 0; i < 3; ++i) {
@@ -49,9 +32,8 @@ int pixelsNear(QWidget *widget, const QColor &colour)
     for (int y = 0; y < image.height(); ++y) {
         for (int x = 0; x < image.width(); ++x) {
             const QColor c = QColor::fromRgba(image.pixel(x, y));
-            if (c.alpha() > 120 && std::abs(c.red() - colour.red()) < 60 && std::abs(c.green() - colour.green()) < 60
-                && std::abs(c.blue() - colour.blue()) < 60)
-                ++count;
+            count += c.alpha() > 120 && std::abs(c.red() - colour.red()) < 60
+                && std::abs(c.green() - colour.green()) < 60 && std::abs(c.blue() - colour.blue()) < 60;
         }
     }
     return count;
@@ -66,22 +48,24 @@ double inkCentreY(QWidget *widget)
     double sum = 0, weight = 0;
     for (int y = 0; y < image.height(); ++y) {
         for (int x = 0; x < image.width(); ++x) {
-            const QRgb p = image.pixel(x, y);
-            if (std::abs(qGray(p) - qGray(background)) > 60) {
-                sum += y;
-                weight += 1;
-            }
+            if (std::abs(qGray(image.pixel(x, y)) - qGray(background)) > 60)
+                sum += y, weight += 1;
         }
     }
     return weight > 0 ? sum / weight : -1;
 }
 
-struct Fixture : ::testing::Test {
+// Two toolbars in a shown window, and items; Play's "map" action reaches the QSignalMapper, which
+// reports the sender.
+struct ToolbarTest : ::testing::Test {
     QWidget window;
     Toolbar *top = new Toolbar(&window);
     Toolbar *bottom = new Toolbar(&window);
-    ActionTarget target;
-    BarButtonItem play{SystemItem::Play, &target.mapper, "map"};
+    QSignalMapper mapper;
+    int plays = 0;
+    QObject *lastSender = nullptr;
+    std::function<void()> onPlay;
+    BarButtonItem play{SystemItem::Play, &mapper, "map"};
     BarButtonItem done{SystemItem::Done, nullptr, "doneAction"};
     BarButtonItem cancel{SystemItem::Cancel, nullptr, "doneAction"};
     BarButtonItem save{SystemItem::Save, nullptr, "saveAction"};
@@ -91,7 +75,12 @@ struct Fixture : ::testing::Test {
 
     void SetUp() override
     {
-        target.mapper.setMapping(&play, &play);
+        mapper.setMapping(&play, &play);
+        QObject::connect(&mapper, &QSignalMapper::mappedObject, [this](QObject *sender) {
+            ++plays, lastSender = sender;
+            if (onPlay)
+                onPlay();
+        });
         window.resize(600, 400);
         top->setGeometry(0, 0, 600, 60);
         bottom->setGeometry(0, 356, 600, 44);
@@ -100,17 +89,18 @@ struct Fixture : ::testing::Test {
     }
 };
 
-TEST_F(Fixture, SetItemsReplacesWholeListKeepingOrderAndRepeatedSpaces)
+TEST_F(ToolbarTest, SetItemsReplacesWholeListKeepingOrderAndRepeatedSpaces)
 {
+    fixed.setWidth(0.005 * 1280);
     top->setItems({&cancel, &flex, &play, &flex, &save});
     settle();
-    top->setItems({&done, &flex, &play, &flex, &fixed, &save});
+    top->setItems({&done, &flex, &play, &flex, &fixed, &save, &fixed});
     settle();
 
-    ASSERT_EQ(top->items(), (QList<BarButtonItem *>{&done, &flex, &play, &flex, &fixed, &save}));
+    ASSERT_EQ(top->items(), (QList<BarButtonItem *>{&done, &flex, &play, &flex, &fixed, &save, &fixed}));
     // One widget per occurrence, left to right in list order, the two flexible spaces distinct.
     int previousRight = -1;
-    for (int i = 0; i < 6; ++i) {
+    for (int i = 0; i < 7; ++i) {
         QWidget *widget = top->widgetForItemAt(i);
         ASSERT_NE(widget, nullptr) << i;
         EXPECT_TRUE(widget->isVisible()) << i;
@@ -119,7 +109,13 @@ TEST_F(Fixture, SetItemsReplacesWholeListKeepingOrderAndRepeatedSpaces)
         previousRight = frame.right();
     }
     EXPECT_NE(top->widgetForItemAt(1), top->widgetForItemAt(3));
-    EXPECT_EQ(top->widgetForItemAt(6), nullptr);
+    EXPECT_EQ(top->widgetForItemAt(7), nullptr);
+    // Fixed spaces take their width, rounded, and follow later changes.
+    EXPECT_EQ(top->widgetForItemAt(4)->width(), 6);
+    fixed.setWidth(24);
+    settle();
+    EXPECT_EQ(top->widgetForItemAt(4)->width(), 24);
+    EXPECT_EQ(top->widgetForItemAt(6)->width(), 24);
     // The flexible spaces take the slack between them equally.
     EXPECT_GT(top->widgetForItemAt(1)->width(), 100);
     EXPECT_NEAR(top->widgetForItemAt(1)->width(), top->widgetForItemAt(3)->width(), 2);
@@ -134,19 +130,7 @@ TEST_F(Fixture, SetItemsReplacesWholeListKeepingOrderAndRepeatedSpaces)
     EXPECT_EQ(bottom->widgetForItemAt(0), nullptr);
 }
 
-TEST_F(Fixture, FixedSpaceTakesItsWidthAndFollowsLaterChanges)
-{
-    fixed.setWidth(0.005 * 1280);
-    top->setItems({&play, &fixed, &share, &fixed, &save});
-    settle();
-    EXPECT_EQ(top->widgetForItemAt(1)->width(), 6);
-    fixed.setWidth(24);
-    settle();
-    EXPECT_EQ(top->widgetForItemAt(1)->width(), 24);
-    EXPECT_EQ(top->widgetForItemAt(3)->width(), 24);
-}
-
-TEST_F(Fixture, TintColoursTextItemsOnlyOnTheToolbarGivenIt)
+TEST_F(ToolbarTest, TintColoursTextItemsOnlyOnTheToolbarGivenIt)
 {
     const QColor red(220, 0, 0);
     top->setTintColor(red);
@@ -163,7 +147,7 @@ TEST_F(Fixture, TintColoursTextItemsOnlyOnTheToolbarGivenIt)
     EXPECT_GT(pixelsNear(bottom->widgetForItemAt(2), QColor(0, 0, 220)), 5);
 }
 
-TEST_F(Fixture, ImageInsetsMoveTheIconWithoutMovingTheButton)
+TEST_F(ToolbarTest, ImageInsetsMoveTheIconWithoutMovingTheButton)
 {
     top->setItems({&flex, &play, &flex});
     settle();
@@ -185,30 +169,27 @@ TEST_F(Fixture, ImageInsetsMoveTheIconWithoutMovingTheButton)
     EXPECT_NEAR(inkCentreY(top->widgetForItemAt(1)), plain, 0.5);
 }
 
+// Text items show their standard text, the others an icon; every button is named for screen readers
+// and tool tips by its title.
 TEST(BarButtonItemTest, SystemKindsHaveStandardTextsIconsAndAccessibleNames)
 {
-    struct Case {
+    const struct {
         SystemItem kind;
-        bool icon;
-        const char *title;
-    };
-    const Case cases[] = {
-        {SystemItem::Done, false, "Done"},   {SystemItem::Cancel, false, "Cancel"},
-        {SystemItem::Save, false, "Save"},   {SystemItem::Action, true, nullptr},
-        {SystemItem::Play, true, nullptr},   {SystemItem::Pause, true, nullptr},
-        {SystemItem::Undo, true, nullptr},
+        const char *title;   // nullptr: an icon item, any title
+    } cases[] = {
+        {SystemItem::Done, "Done"}, {SystemItem::Cancel, "Cancel"}, {SystemItem::Save, "Save"}, {SystemItem::Action, nullptr},
+        {SystemItem::Play, nullptr}, {SystemItem::Pause, nullptr}, {SystemItem::Undo, nullptr},
     };
     Toolbar bar;
     bar.resize(300, 44);
-    for (const Case &c : cases) {
+    for (const auto &c : cases) {
         BarButtonItem item(c.kind, nullptr, {});
         SCOPED_TRACE(item.title().toStdString());
         EXPECT_FALSE(item.title().isEmpty());
         if (c.title) {
             EXPECT_EQ(item.title(), QString::fromLatin1(c.title));   // no translation installed
         }
-        EXPECT_EQ(item.toolTip(), item.title());
-        EXPECT_EQ(!item.icon().isNull(), c.icon);
+        EXPECT_EQ(item.icon().isNull(), c.title != nullptr);
         EXPECT_FALSE(item.isSpace());
         ASSERT_NE(item.action(), nullptr);
         bar.setItems({&item});
@@ -222,9 +203,9 @@ TEST(BarButtonItemTest, SystemKindsHaveStandardTextsIconsAndAccessibleNames)
     EXPECT_EQ(space.action(), nullptr);
 }
 
-TEST_F(Fixture, ClickingAButtonSendsTheActionEvenWhenItReplacesTheItems)
+TEST_F(ToolbarTest, ClickingAButtonSendsTheActionEvenWhenItReplacesTheItems)
 {
-    target.onPlay = [&] { top->setItems({&flex, &save}); };
+    onPlay = [&] { top->setItems({&flex, &save}); };
     top->setItems({&flex, &play, &flex});
     settle();
     QWidget *button = top->widgetForItemAt(1);
@@ -235,17 +216,17 @@ TEST_F(Fixture, ClickingAButtonSendsTheActionEvenWhenItReplacesTheItems)
                         Qt::NoButton, Qt::NoModifier);
     QApplication::sendEvent(button, &press);
     QApplication::sendEvent(button, &release);
-    EXPECT_EQ(target.plays, 1);
-    EXPECT_EQ(target.lastSender, &play);
+    EXPECT_EQ(plays, 1);
+    EXPECT_EQ(lastSender, &play);
     settle();
     EXPECT_EQ(top->items(), (QList<BarButtonItem *>{&flex, &save}));
 
     play.setEnabled(false);
     play.trigger();
-    EXPECT_EQ(target.plays, 1);
+    EXPECT_EQ(plays, 1);
 }
 
-TEST_F(Fixture, CustomViewLivesInTheToolbarThatShowedItLastAndSurvivesRemoval)
+TEST_F(ToolbarTest, CustomViewLivesInTheToolbarThatShowedItLastAndSurvivesRemoval)
 {
     auto *label = new QLabel("Title");
     label->resize(120, 17);

@@ -6,9 +6,10 @@
 
 #include <QApplication>
 #include <QKeyEvent>
-#include <QLineEdit>
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -25,14 +26,10 @@ public:
     void viewDidAppear(bool) override { note("didAppear"); }
     void viewWillDisappear(bool) override { note("willDisappear"); }
     void viewDidDisappear(bool) override { note("didDisappear"); }
-    void viewDidLayoutSubviews() override
-    {
-        note("didLayout " + std::to_string(view()->width()) + "x" + std::to_string(view()->height()));
-    }
+    void viewDidLayoutSubviews() override { note("didLayout " + sizeText(view()->size())); }
     void viewWillTransitionToSize(const QSizeF &size, TransitionCoordinator &coordinator) override
     {
-        note("willTransition " + std::to_string(int(size.width())) + "x" + std::to_string(int(size.height()))
-             + " from " + std::to_string(view()->width()) + "x" + std::to_string(view()->height()));
+        note("willTransition " + sizeText(size.toSize()) + " from " + sizeText(view()->size()));
         coordinator.animateAlongsideTransition([this] { note("alongside"); }, [this] { note("completion"); });
         ViewController::viewWillTransitionToSize(size, coordinator);
     }
@@ -51,20 +48,22 @@ public:
 
 private:
     void note(const std::string &what) { m_log->push_back(m_name + " " + what); }
+    static std::string sizeText(QSize s) { return std::to_string(s.width()) + "x" + std::to_string(s.height()); }
     std::string m_name;
     Log *m_log;
     bool m_responder;
 };
 
-// The position of an entry in the log (fails the test when it is missing).
-size_t indexOf(const Log &log, const std::string &entry)
+// Whether the entries appear in the log in this order, others possibly between them.
+::testing::AssertionResult inOrder(const Log &log, std::initializer_list<std::string> entries)
 {
-    for (size_t i = 0; i < log.size(); ++i) {
-        if (log[i] == entry)
-            return i;
+    auto at = log.begin();
+    for (const std::string &entry : entries) {
+        at = std::find(at, log.end(), entry);
+        if (at == log.end())
+            return ::testing::AssertionFailure() << "\"" << entry << "\" missing or out of order";
     }
-    ADD_FAILURE() << "missing log entry: " << entry;
-    return log.size();
+    return ::testing::AssertionSuccess();
 }
 
 void sendKey(QWidget *to, int key, Qt::KeyboardModifiers modifiers)
@@ -95,30 +94,23 @@ TEST_F(HostFixture, ShowAndHideDeliverAppearanceInOrderToRootAndChildren)
     host.resize(320, 240);
     host.show();
     EXPECT_EQ(root.view()->size(), QSize(320, 240));
-    EXPECT_LT(indexOf(log, "root willAppear"), indexOf(log, "child willAppear"));
-    EXPECT_LT(indexOf(log, "child willAppear"), indexOf(log, "root didLayout 320x240"));
-    EXPECT_LT(indexOf(log, "root didLayout 320x240"), indexOf(log, "root didAppear"));
-    EXPECT_LT(indexOf(log, "root didAppear"), indexOf(log, "child didAppear"));
+    EXPECT_TRUE(inOrder(log, {"root willAppear", "child willAppear", "root didLayout 320x240", "root didAppear", "child didAppear"}));
     EXPECT_TRUE(root.isViewVisible());
     EXPECT_TRUE(child.isViewVisible());
 
+    {   // a child added to the shown view gets its own callbacks
+        Recorder late("late", &log);
+        root.addChildViewController(&late);
+        log.clear();
+        late.view()->setParent(root.view());
+        late.view()->setGeometry(10, 10, 100, 30);
+        late.view()->show();
+        EXPECT_EQ(log, (Log{"late didLoad", "late willAppear", "late didLayout 100x30", "late didAppear"}));
+    }
     log.clear();
     host.hide();
     EXPECT_EQ(log, (Log{"root willDisappear", "child willDisappear", "root didDisappear", "child didDisappear"}));
     EXPECT_FALSE(root.isViewVisible());
-}
-
-TEST_F(HostFixture, ChildAddedToAShownViewGetsItsOwnAppearanceCallbacks)
-{
-    WindowHost host(&root);
-    host.show();
-    Recorder late("late", &log);
-    root.addChildViewController(&late);
-    log.clear();
-    late.view()->setParent(root.view());
-    late.view()->setGeometry(10, 10, 100, 30);
-    late.view()->show();
-    EXPECT_EQ(log, (Log{"late didLoad", "late willAppear", "late didLayout 100x30", "late didAppear"}));
 }
 
 TEST_F(HostFixture, ResizeRunsTransitionBeforeTheNewSizeThenLayoutThenCompletion)
@@ -202,9 +194,11 @@ TEST_F(HostFixture, CtrlZAnywhereInTheWindowShakesTheFirstResponder)
     EXPECT_EQ(log.size(), 1u);
 }
 
-TEST_F(HostFixture, CloseCallsTheHandlerInsteadOfClosing)
+TEST_F(HostFixture, CloseCallsTheHandlerInsteadOfClosingAndDestroyingTheHostGivesTheViewBack)
 {
-    WindowHost host(&root);
+    QWidget *view = root.view();
+    auto owner = std::make_unique<WindowHost>(&root);
+    WindowHost &host = *owner;
     host.show();
     int calls = 0;
     host.setCloseHandler([&] { ++calls; });
@@ -222,20 +216,13 @@ TEST_F(HostFixture, CloseCallsTheHandlerInsteadOfClosing)
     EXPECT_EQ(calls, 2);
     EXPECT_FALSE(host.isVisible());
     EXPECT_EQ(log.front(), "root willDisappear");
-}
 
-TEST_F(HostFixture, DestroyingTheHostGivesTheRootItsViewBack)
-{
-    QWidget *view = root.view();
-    {
-        WindowHost host(&root);
-        host.show();
-    }
+    owner.reset();
     EXPECT_EQ(root.view(), view);
     EXPECT_EQ(view->parentWidget(), nullptr);
 }
 
-TEST_F(HostFixture, PresentationShowsAWindowModalDialogThenRunsTheCompletion)
+TEST_F(HostFixture, PresentationShowsAWindowModalDialogAndDismissalOrClosingEndsIt)
 {
     WindowHost host(&root);
     host.show();
@@ -253,7 +240,7 @@ TEST_F(HostFixture, PresentationShowsAWindowModalDialogThenRunsTheCompletion)
     EXPECT_EQ(sheet.view()->window(), dialog);
     EXPECT_EQ(root.presentedViewController(), &sheet);
     EXPECT_EQ(sheet.presentingViewController(), &root);
-    EXPECT_LT(indexOf(log, "sheet willAppear"), indexOf(log, "sheet didAppear"));
+    EXPECT_TRUE(inOrder(log, {"sheet willAppear", "sheet didAppear"}));
     QApplication::processEvents();
     EXPECT_TRUE(presented);
 
@@ -272,15 +259,9 @@ TEST_F(HostFixture, PresentationShowsAWindowModalDialogThenRunsTheCompletion)
     EXPECT_FALSE(dismissed);
     QApplication::processEvents();
     EXPECT_TRUE(dismissed);
-    // The root's own view never disappeared.
-    EXPECT_TRUE(root.isViewVisible());
-}
+    EXPECT_TRUE(root.isViewVisible());   // the root's own view never disappeared
 
-TEST_F(HostFixture, UserClosingThePresentedDialogDismissesIt)
-{
-    WindowHost host(&root);
-    host.show();
-    Recorder sheet("sheet", &log);
+    // The user closing the dialog dismisses it as well.
     root.presentViewController(&sheet, false);
     log.clear();
     root.presentationWindow()->close();
