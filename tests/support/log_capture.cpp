@@ -13,8 +13,9 @@ std::atomic<LogCapture *> g_active{nullptr};
 
 LogCapture::LogCapture()
 {
-    // Debug output of every category is captured, whatever the environment's filter rules say.
-    QLoggingCategory::setFilterRules(QStringLiteral("*.debug=true"));
+    // Debug output of our categories is captured, whatever the environment's filter rules say; Qt's
+    // own categories keep their defaults so their chatter stays out of test output.
+    QLoggingCategory::setFilterRules(QStringLiteral("zaf.*.debug=true\ndefault.debug=true"));
     g_active.store(this);
     m_previous = qInstallMessageHandler(&LogCapture::handler);
 }
@@ -23,6 +24,7 @@ LogCapture::~LogCapture()
 {
     qInstallMessageHandler(m_previous);
     g_active.store(nullptr);
+    QLoggingCategory::setFilterRules(QString());
 }
 
 void LogCapture::handler(QtMsgType type, const QMessageLogContext &context, const QString &message)
