@@ -1,5 +1,6 @@
 #include "publishing/progress_overlay.h"
 
+#include "platform/text/percent_format.h"
 #include "platform/ui/activity_indicator.h"
 #include "platform/ui/view_animation.h"
 
@@ -186,7 +187,7 @@ QString ZafYouTubeActivityProgressOverlay::progressText(double fraction)
     if (std::isnan(fraction) || fraction < 0.0)
         return QString();
     const int percent = int(std::floor(std::min(fraction, 1.0) * 100.0 + 1e-9));
-    return QStringLiteral("%1 %").arg(percent);
+    return zaf::text::formatPercent(percent);
 }
 
 void ZafYouTubeActivityProgressOverlay::applyProgress()

@@ -52,7 +52,8 @@ public:
     // The progress display: null until the indicator has been created.
     QProgressBar *progressBar() const { return m_progressBar; }
     QLabel *progressLabel() const { return m_progressLabel; }
-    // The text the percentage label shows for a fraction: "42 %"-style, empty when unknown.
+    // The text the percentage label shows for a fraction, rounded down and written as the user's
+    // locale writes percentages ("42%", "42 %"); empty when unknown.
     static QString progressText(double fraction);
 
     // The dimming child made at set-up; null before.

@@ -1,6 +1,7 @@
-// Text helpers: prefix comparison regardless of case and diacritics, date and object formats.
+// Text helpers: prefix comparison regardless of case and diacritics, date, percent and object formats.
 #include "platform/text/date_format.h"
 #include "platform/text/object_format.h"
+#include "platform/text/percent_format.h"
 #include "platform/text/string_compare.h"
 
 #include <gtest/gtest.h>
@@ -36,6 +37,13 @@ TEST(DateFormat, FormatsThePatternInTheGivenLocaleAndNothingForAnInvalidDate)
     EXPECT_EQ(formatDate(QDateTime(QDate(2026, 11, 16), QTime(16, 47)), "MMMM d HH:mm", QLocale("fr_FR")), "novembre 16 16:47");
     EXPECT_EQ(formatDate(QDateTime(QDate(2026, 1, 2), QTime(0, 5)), "d MMM hh:mm a", QLocale("en_US")), "2 Jan 12:05 AM");
     EXPECT_TRUE(formatDate(QDateTime(), "MMMM").isEmpty());
+}
+
+TEST(PercentFormat, WritesThePercentSignAsTheLocaleDoes)
+{
+    EXPECT_EQ(formatPercent(57, QLocale("en_US")), QStringLiteral("57%"));
+    EXPECT_EQ(formatPercent(100, QLocale("de_DE")), QStringLiteral("100\u00a0%"));
+    EXPECT_EQ(formatPercent(0, QLocale("C")), QStringLiteral("0%"));
 }
 
 } // namespace

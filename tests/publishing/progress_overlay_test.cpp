@@ -7,9 +7,12 @@
 
 #include <QEventLoop>
 #include <QLabel>
+#include <QLocale>
 #include <QProgressBar>
+#include <QScopeGuard>
 #include <QTimer>
 #include <QWidget>
+
 #include <gtest/gtest.h>
 
 #include <memory>
@@ -156,6 +159,9 @@ TEST_F(ProgressOverlayTest, HidingRemovesTheOverlayAfterItsFade)
 // empty (with a busy bar) when the total is unknown.
 TEST_F(ProgressOverlayTest, ProgressDisplayFollowsSetProgress)
 {
+    const QLocale previous;
+    QLocale::setDefault(QLocale(QLocale::English, QLocale::UnitedStates));
+    const auto restore = qScopeGuard([&] { QLocale::setDefault(previous); });
     m_overlay->setProgress(0.25);
     EXPECT_EQ(m_overlay->progressLabel(), nullptr);
     m_overlay->setShowingAnimated(true, true);
@@ -163,17 +169,17 @@ TEST_F(ProgressOverlayTest, ProgressDisplayFollowsSetProgress)
     QLabel *label = m_overlay->progressLabel();
     QProgressBar *bar = m_overlay->progressBar();
     ASSERT_NE(label, nullptr);
-    EXPECT_EQ(label->text(), QStringLiteral("25 %"));
+    EXPECT_EQ(label->text(), QStringLiteral("25%"));
     EXPECT_EQ(bar->value(), bar->maximum() / 4);
     m_overlay->setProgress(0.5);
-    EXPECT_EQ(label->text(), QStringLiteral("50 %"));
+    EXPECT_EQ(label->text(), QStringLiteral("50%"));
     EXPECT_EQ(bar->value(), bar->maximum() / 2);
     m_overlay->setProgress(1.7);
-    EXPECT_EQ(label->text(), QStringLiteral("100 %"));
+    EXPECT_EQ(label->text(), QStringLiteral("100%"));
     EXPECT_DOUBLE_EQ(m_overlay->progress(), 1.0);
     m_overlay->setProgress(-1.0);
     EXPECT_TRUE(label->text().isEmpty());
     EXPECT_EQ(bar->maximum(), 0);
-    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.29), QStringLiteral("29 %"));
-    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.999), QStringLiteral("99 %"));
+    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.29), QStringLiteral("29%"));
+    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.999), QStringLiteral("99%"));
 }
