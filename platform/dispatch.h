@@ -24,8 +24,11 @@ void mainSync(std::function<void()> fn);
 // Runs fn on a thread of the global queue of the given priority and returns at once.
 void async(Priority priority, std::function<void()> fn);
 
-// The pool behind a global queue (for waiting on it in tests and at shutdown).
+// The pool behind a global queue.
 QThreadPool &globalQueue(Priority priority);
+// Waits until the global queue has run everything submitted so far (tests and shutdown); what that
+// work wrote is visible afterwards.
+void waitForGlobalQueue(Priority priority);
 
 // True on the thread that runs the Qt event loop of the application (the main thread).
 bool isMainThread();

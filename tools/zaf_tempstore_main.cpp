@@ -79,7 +79,7 @@ int main(int argc, char **argv)
     }
     if (args.size() == 3 && args[1] == QLatin1String("--prefix")) {
         store._srDeleteFilesWithPrefix(args[2]);
-        zaf::dispatch::globalQueue(zaf::dispatch::Priority::Default).waitForDone();
+        zaf::dispatch::waitForGlobalQueue(zaf::dispatch::Priority::Default);
         return 0;
     }
     return usage();

@@ -42,8 +42,8 @@ TEST(Dispatch, GlobalQueuesRunConcurrentlyOffTheMainThread)
         async(Priority::Background, [&] { offMain += !isMainThread(); });
         async(Priority::Default, [&] { offMain += !isMainThread(); });
     }
-    globalQueue(Priority::Background).waitForDone();
-    globalQueue(Priority::Default).waitForDone();
+    waitForGlobalQueue(Priority::Background);
+    waitForGlobalQueue(Priority::Default);
     EXPECT_EQ(offMain.load(), 16);
     EXPECT_NE(&globalQueue(Priority::Background), &globalQueue(Priority::Default));
 }

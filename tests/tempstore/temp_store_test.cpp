@@ -263,7 +263,7 @@ TEST_F(TempStoreTest, RemoveFileRemovesOffTheMainThreadTreatsNothingThereAsSucce
     // Without a completion the removal still happens.
     const QString quiet = entry("quiet.mp4", 10, 0);
     store._srRemoveFile(url(quiet));
-    dispatch::globalQueue(dispatch::Priority::Background).waitForDone();
+    dispatch::waitForGlobalQueue(dispatch::Priority::Background);
     EXPECT_FALSE(QFile::exists(quiet));
 }
 
@@ -298,7 +298,7 @@ TEST_F(TempStoreTest, PrefixCleanupIgnoresCaseAndDiacriticsAndRemovesMatchingDir
     entry("keep/ZafReplay_Final9.mp4", 1, 0);
 
     store._srDeleteFilesWithPrefix("zafreplay_final");
-    dispatch::globalQueue(dispatch::Priority::Default).waitForDone();
+    dispatch::waitForGlobalQueue(dispatch::Priority::Default);
     for (const QString &name : matching + QStringList{"ZAFREPLAY_FINALdir"})
         EXPECT_FALSE(exists(name)) << name.toStdString();
     EXPECT_TRUE(exists("Other_ZafReplay_Final.mp4"));
@@ -313,7 +313,7 @@ TEST_F(TempStoreTest, PrefixCleanupLogsEachFailedRemovalAndGoesOnAndIgnoresAMiss
     fileManager.failingRemovals = {"ZafReplay_YouTube1.mp4", "ZafReplay_YouTube3.mp4"};
     store._srDeleteFilesWithPrefix("ZafReplay_YouTube");
     ZafTempStore(fileManager, scratch.path() + "/absent/")._srDeleteFilesWithPrefix("x");
-    dispatch::globalQueue(dispatch::Priority::Default).waitForDone();
+    dispatch::waitForGlobalQueue(dispatch::Priority::Default);
     EXPECT_FALSE(exists("ZafReplay_YouTube2.mp4"));
     EXPECT_EQ(logs.messages("zaf.tempstore"), QStringList(2, QString("_zavDeleteFilesWithPrefix error: %1").arg(EBUSY)));
     EXPECT_EQ(logs.entries().size(), 2) << "nothing else, in any category";

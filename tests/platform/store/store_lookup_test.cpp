@@ -42,7 +42,7 @@ Answer answerOf(const StoreLookup &lookup)
         ADD_FAILURE() << "no answer";
         return {};
     }
-    zaf::dispatch::globalQueue(zaf::dispatch::Priority::Default).waitForDone();
+    zaf::dispatch::waitForGlobalQueue(zaf::dispatch::Priority::Default);
     EXPECT_EQ(shared->calls.load(), 1);
     return future.get();
 }
