@@ -25,6 +25,7 @@ build: configure
 
 test: build
 	@cd $(BUILD_DIR) && QT_QPA_PLATFORM=offscreen TSAN_OPTIONS="suppressions=$(CURDIR)/scripts/tsan.supp $(TSAN_OPTIONS)" \
+	  LSAN_OPTIONS="suppressions=$(CURDIR)/scripts/lsan.supp $(LSAN_OPTIONS)" \
 	  ctest --output-on-failure -j2 --timeout 600
 
 run: build
