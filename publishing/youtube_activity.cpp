@@ -220,19 +220,14 @@ QUrl ZafYouTubeActivity::tempFileURLForTime(double secondsSince1970)
 
 QUrl ZafYouTubeActivity::movieInItems(const QVariantList &activityItems)
 {
-    // The usual list carries the movie at position 2.
-    if (activityItems.size() > 2 && isLocalFileURL(activityItems.at(2))) {
-        const QUrl url = activityItems.at(2).toUrl();
-        if (opensAsPlayableMovie(url))
-            return url;
-    }
-    // A list led by the host's own message: the first local file that plays.
+    // The share flow puts the movie before any attachment, in both of its lists (position 2 of the
+    // usual one, position 1 of a list led by the host's message). A later file is the attachment:
+    // it is never taken instead, even when the movie does not play.
     for (const QVariant &item : activityItems) {
         if (!isLocalFileURL(item))
             continue;
         const QUrl url = item.toUrl();
-        if (opensAsPlayableMovie(url))
-            return url;
+        return opensAsPlayableMovie(url) ? url : QUrl();
     }
     return {};
 }
@@ -255,7 +250,8 @@ void ZafYouTubeActivity::prepareWithActivityItems(const QVariantList &activityIt
     zaf::ui::ShareActivity::prepareWithActivityItems(activityItems);
 
     m_movieURL = tempFileURL();
-    m_sourceMovieURL = movieInItems(activityItems);
+    // The editor names its movie; the items are only searched when it did not.
+    m_sourceMovieURL = m_editorMovieURL.isEmpty() ? movieInItems(activityItems) : m_editorMovieURL;
     m_exportSession.reset();
 
     if (m_sourceMovieURL.isEmpty()) {

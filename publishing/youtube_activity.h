@@ -10,8 +10,10 @@
 // Activity items, by position, as the editor's share flow supplies them:
 //   0  the share text          1  the store link (a string, possibly empty)      2  the movie's file URL
 // With a host-supplied share message the flow passes only the message, the movie and perhaps an
-// attachment; the activity then takes the first item that opens as a playable movie. No position
-// past the end of the list is ever read.
+// attachment. The movie always comes before the attachment, so without a movie set by the editor
+// (setSourceMovieURL) the activity takes the first local file of the list, and only when it plays:
+// an attachment is never published in the recording's place, even when it is a movie itself. No
+// position past the end of the list is ever read.
 //
 // Threads: main thread only. prepareWithActivityItems() returns at once; the export runs on its own
 // worker thread and its completion only logs. exportSession() gives the running export so that the
@@ -88,6 +90,9 @@ public:
     std::shared_ptr<zaf::media::ExportSession> exportSession() const { return m_exportSession; }
     // The movie the copy is made from; empty when no movie was among the items.
     QUrl sourceMovieURL() const { return m_sourceMovieURL; }
+    // The editor's movie: when set (before preparation), preparation copies this movie whatever the
+    // items hold.
+    void setSourceMovieURL(const QUrl &movie) { m_editorMovieURL = movie; }
 
     // Filled by the publishing flow.
     std::shared_ptr<ZafPublishingAgent> publishingAgent() const { return m_publishingAgent; }
@@ -132,6 +137,7 @@ private:
 
     QUrl m_movieURL;
     QUrl m_sourceMovieURL;
+    QUrl m_editorMovieURL;
     QString m_descriptionText;
     std::shared_ptr<zaf::media::ExportSession> m_exportSession;
     std::shared_ptr<ZafPublishingAgent> m_publishingAgent;

@@ -118,7 +118,8 @@ TEST(YouTubeActivity, CanPerformFollowsTheCapabilityWhateverTheItems)
 }
 
 // Preparation for every shape of item list: the description takes the leading texts; the movie is
-// found wherever it is (a host message list still exports it) and copied into the temporary
+// the editor's when it names one, else the first file of the list (never a later attachment, even a
+// playable one), and is copied into the temporary
 // directory with its audio tracks mixed into one and the video unchanged; no position past the end
 // of a short list is read.
 TEST(YouTubeActivity, PrepareHandlesEveryShapeOfItemList)
@@ -135,12 +136,17 @@ TEST(YouTubeActivity, PrepareHandlesEveryShapeOfItemList)
         QString description;
         QUrl source; // empty: nothing to export
         int audioStreams;
+        QUrl editorMovie = {};
     } cases[] = {
         {"usual list", {QStringLiteral("Look at this"), QStringLiteral("https://example.invalid/app"), movie},
          QStringLiteral("Look at this https://example.invalid/app"), movie, 1},
         {"empty store link", {QStringLiteral("Share text"), QString(), movie}, QStringLiteral("Share text "), movie, 1},
         {"host message and attachment", {QStringLiteral("Host message"), movie, attachment}, QStringLiteral("Host message"), movie, 1},
         {"host message only", {QStringLiteral("Host message"), movie}, QStringLiteral("Host message"), movie, 1},
+        {"host message and a movie attachment", {QStringLiteral("Host message"), movie, silent}, QStringLiteral("Host message"), movie, 1},
+        {"usual list and a movie attachment", {QStringLiteral("T"), QStringLiteral("L"), movie, silent}, QStringLiteral("T L"), movie, 1},
+        {"unplayable movie before a movie attachment", {QStringLiteral("M"), garbage, silent}, QStringLiteral("M"), QUrl(), 0},
+        {"the editor's movie", {QStringLiteral("M"), silent, silent}, QStringLiteral("M"), movie, 1, movie},
         {"movie without audio", {QStringLiteral("T"), QStringLiteral("L"), silent}, QStringLiteral("T L"), silent, 0},
         {"no movie", {QStringLiteral("a"), QStringLiteral("b"), garbage}, QStringLiteral("a b"), QUrl(), 0},
         {"no items", {}, QString(), QUrl(), 0},
@@ -149,6 +155,7 @@ TEST(YouTubeActivity, PrepareHandlesEveryShapeOfItemList)
         SCOPED_TRACE(c.name);
         LogCapture logs;
         ZafYouTubeActivity activity;
+        activity.setSourceMovieURL(c.editorMovie);
         activity.prepareWithActivityItems(c.items);
         EXPECT_EQ(activity.descriptionText(), c.description);
         const QString copy = activity.movieURL().toLocalFile();
