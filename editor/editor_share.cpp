@@ -15,8 +15,6 @@
 #include "publishing/plugin_loader.h"
 #include "publishing/youtube_activity.h"
 
-#include <QFileInfo>
-
 using namespace zaf::ui;
 
 namespace {
@@ -89,17 +87,25 @@ bool ZafVideoEditorViewController::offersPublishingActivity()
 {
     const bool serviceExtensionInstalled = static_cast<bool>(
         zaf::extensionkit::ExtensionRegistry::extensionWithIdentifier(QLatin1String(kVideoServiceShareExtensionIdentifier)));
-    // The publishing plug-in's presence means the video service can be reached.
-    return !serviceExtensionInstalled && QFileInfo::exists(zaf::publishing::defaultPublishingPluginPath());
+    if (serviceExtensionInstalled)
+        return false;
+    // Only a plug-in that loads, has our API version and has the agent class counts: a mere file at
+    // the plug-in's place would offer an action that cannot run. The answer is cached per process
+    // (see publishingAgentClass), so the plug-in is loaded once, at the first share.
+    return zaf::publishing::publishingAgentClass(zaf::publishing::defaultPublishingPluginPath(),
+                                                 QLatin1String(kZafYouTubePublishingAgentClassName))
+        .ok();
 }
 
-void ZafVideoEditorViewController::presentShareSheet(const QVariantList &items, const QUrl &)
+void ZafVideoEditorViewController::presentShareSheet(const QVariantList &items, const QUrl &movieURL)
 {
     QStringList order{QLatin1String(kActivityTypeMail), QLatin1String(kActivityTypeMessage),
                       QLatin1String(kActivityTypeCopyToPasteboard), QLatin1String(kActivityTypePostToSocial)};
     QList<ShareActivity *> applicationActivities;
     if (offersPublishingActivity()) {
         auto *activity = new ZafYouTubeActivity;
+        // The recording is published, never the host's attachment, whatever the items' order.
+        activity->setSourceMovieURL(movieURL);
         applicationActivities << activity;
         order.insert(2, activity->activityType());
     }

@@ -17,6 +17,7 @@ Q_LOGGING_CATEGORY(lcPluginLoader, "zaf.publishing.plugin")
 struct PluginCache {
     QHash<QString, ZafPublishingPluginInterface *> plugins;  // by canonical path
     QHash<QString, const QMetaObject *> agentClasses;         // by canonical path + '\n' + class name
+    QHash<QString, QString> refusedAgentClasses;              // the same keys: why the look-up failed
 };
 
 PluginCache &cache()
@@ -79,15 +80,22 @@ PluginLookup<const QMetaObject> publishingAgentClass(const QString &path, const 
     const QString key = cacheKey(path) + QLatin1Char('\n') + className;
     if (const QMetaObject *agentClass = cache().agentClasses.value(key))
         return {agentClass, {}};
+    if (const auto refused = cache().refusedAgentClasses.constFind(key); refused != cache().refusedAgentClasses.cend())
+        return {nullptr, refused.value()};
 
+    const auto remember = [&key](PluginLookup<const QMetaObject> lookup) {
+        if (!lookup.ok())
+            cache().refusedAgentClasses.insert(key, lookup.errorText);
+        return lookup;
+    };
     const PluginLookup<ZafPublishingPluginInterface> plugin = loadPublishingPlugin(path);
     if (!plugin.ok())
-        return {nullptr, plugin.errorText};
+        return remember({nullptr, plugin.errorText});
     const QMetaObject *agentClass = plugin.value->agentClassNamed(className);
     if (!agentClass)
-        return refuse<const QMetaObject>(QStringLiteral("The publishing plug-in %1 has no agent class %2").arg(path, className));
+        return remember(refuse<const QMetaObject>(QStringLiteral("The publishing plug-in %1 has no agent class %2").arg(path, className)));
     if (!agentClass->inherits(&ZafPublishingAgent::staticMetaObject))
-        return refuse<const QMetaObject>(QStringLiteral("%1 of %2 is not a publishing agent").arg(className, path));
+        return remember(refuse<const QMetaObject>(QStringLiteral("%1 of %2 is not a publishing agent").arg(className, path)));
     cache().agentClasses.insert(key, agentClass);
     return {agentClass, {}};
 }

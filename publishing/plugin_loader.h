@@ -26,7 +26,9 @@ struct PluginLookup {
 // The plug-in instance of the library at `path`.
 PluginLookup<ZafPublishingPluginInterface> loadPublishingPlugin(const QString &path);
 // The meta-object of the agent class `className` of the plug-in at `path` (make an agent with
-// newInstance()).
+// newInstance()). The answer, found or refused, is kept for the life of the process: the first call
+// for a path and class loads the plug-in, every later one is a hash probe. So whether the share sheet
+// offers publishing is decided once per process, and a plug-in put in place later is not seen.
 PluginLookup<const QMetaObject> publishingAgentClass(const QString &path, const QString &className);
 // The plug-in's usual place: <directory of the executable>/publishing/plugin/<kZafPublishingPluginFileName>
 // unless $ZAF_PUBLISHING_PLUGIN names another file.

@@ -6,6 +6,9 @@
 #include "platform/bundle/bundle.h"
 #include "platform/ui/share_activity.h"
 #include "platform/ui/share_sheet.h"
+#include "platform/media/export_session.h"
+#include "publishing/plugin_loader.h"
+#include "publishing/youtube_activity.h"
 
 #include <QAbstractButton>
 
@@ -34,7 +37,9 @@ protected:
         qputenv("XDG_DATA_HOME", QFile::encodeName(scratch.file(QStringLiteral("data"))));
         qputenv("XDG_DATA_DIRS", QFile::encodeName(scratch.file(QStringLiteral("none"))));
     }
-    void installPlugin() { qputenv("ZAF_PUBLISHING_PLUGIN_PATH", QFile::encodeName(scratch.write(QStringLiteral("plugin.so"), 8))); }
+    // The built plug-in at its default place.
+    void installPlugin() { qunsetenv("ZAF_PUBLISHING_PLUGIN_PATH"); }
+    void pluginAt(const QString &path) { qputenv("ZAF_PUBLISHING_PLUGIN_PATH", QFile::encodeName(path)); }
     void installServiceExtension(bool enabled)
     {
         QDir().mkpath(scratch.file(QStringLiteral("data/zafrel/extensions")));
@@ -71,16 +76,56 @@ TEST_F(EditorShareTest, ItemsFollowTheOverrideMessageOrTheStoreRecord)
     EXPECT_EQ(ZafVideoEditorViewController::shareTextForStoreInfo(nameless), QStringLiteral(""));
 }
 
-TEST_F(EditorShareTest, PublishingIsOfferedOnlyWithThePluginAndWithoutTheServicesOwnExtension)
+// Only a plug-in that loads and has the agent class offers publishing: a file at the plug-in's place
+// that is no plug-in (garbage, a library that is no plug-in) is not offered, and asking does not
+// stop the process.
+TEST_F(EditorShareTest, PublishingIsOfferedOnlyWithALoadablePluginAndWithoutTheServicesOwnExtension)
 {
-    qputenv("ZAF_PUBLISHING_PLUGIN_PATH", QFile::encodeName(scratch.file(QStringLiteral("no-plugin.so"))));
-    EXPECT_FALSE(ZafVideoEditorViewController::offersPublishingActivity()) << "no plug-in";
+    const QString builtPlugin = zaf::publishing::defaultPublishingPluginPath();
+    const struct {
+        const char *name;
+        QString path;
+    } unusable[] = {
+        {"no file", scratch.file(QStringLiteral("no-plugin.so"))},
+        {"garbage bytes", scratch.write(QStringLiteral("plugin.so"), 8)},
+        {"a library that is no plug-in", QFileInfo(builtPlugin).dir().filePath(QStringLiteral("libzaf_publishing_agent.so"))},
+    };
+    for (const auto &c : unusable) {
+        SCOPED_TRACE(c.name);
+        pluginAt(c.path);
+        EXPECT_FALSE(ZafVideoEditorViewController::offersPublishingActivity());
+    }
     installPlugin();
     EXPECT_TRUE(ZafVideoEditorViewController::offersPublishingActivity());
     installServiceExtension(false);
     EXPECT_TRUE(ZafVideoEditorViewController::offersPublishingActivity()) << "a disabled extension does not count";
     installServiceExtension(true);
     EXPECT_FALSE(ZafVideoEditorViewController::offersPublishingActivity());
+}
+
+// With the host's message and a movie attachment, the publishing action is handed the editor's
+// movie, not the attachment that takes the movie's usual place in the items.
+TEST_F(EditorShareTest, PublishingActionIsGivenTheEditorsMovieNotTheAttachment)
+{
+    installPlugin();
+    auto e = makeEditor(movie(1));
+    const QUrl attachment = QUrl::fromLocalFile(movie(2));
+    e->setOverrideShareMessage(QStringLiteral("Look"));
+    e->setFileAttachmentURL(attachment);
+    e->shareAction();
+    ui::ShareSheet *sheet = presentedSheet(*e);
+    ASSERT_NE(sheet, nullptr);
+    ZafYouTubeActivity *activity = nullptr;
+    for (ui::ShareActivity *candidate : sheet->visibleActivities())
+        activity = activity ? activity : qobject_cast<ZafYouTubeActivity *>(candidate);
+    ASSERT_NE(activity, nullptr);
+    ASSERT_EQ(sheet->activityItems().value(2).toUrl(), attachment);
+    activity->prepareWithActivityItems(sheet->activityItems());
+    EXPECT_EQ(activity->sourceMovieURL(), e->videoURL());
+    if (activity->exportSession())
+        activity->exportSession()->cancelExport();
+    sheet->cancelButton()->click();
+    spin(100);
 }
 
 TEST_F(EditorShareTest, SheetOffersPublishingRightAfterMailExcludesCopyAndCancelRecordsNothing)
@@ -108,7 +153,7 @@ TEST_F(EditorShareTest, SheetOffersPublishingRightAfterMailExcludesCopyAndCancel
 
 TEST_F(EditorShareTest, PadLayoutInIntroModeLeavesPlayOutAndSheetWithoutPluginHasNoOrder)
 {
-    qputenv("ZAF_PUBLISHING_PLUGIN_PATH", QFile::encodeName(scratch.file(QStringLiteral("no-plugin.so"))));
+    pluginAt(scratch.file(QStringLiteral("no-plugin.so")));
     auto e = makeEditor(movie(1), QRectF(0, 0, 900, 500));
     ASSERT_TRUE(e->isPadMode());
     e->view()->resize(900, 500);
