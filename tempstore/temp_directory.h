@@ -6,9 +6,11 @@
 
 #include <cstdint>
 
-// The directory every intermediate movie lives in: absolute, always ending in "/".
-// Resolved once per process: $ZAF_TEMP_DIRECTORY when set (tests), else $XDG_CACHE_HOME/Zafrel/,
-// else ~/.cache/Zafrel/. A per-user cache directory, so two users never share it.
+// The directory every intermediate movie lives in: absolute, always ending in "/". It is this
+// process's own directory inside the per-user root ($ZAF_TEMP_DIRECTORY when set, for tests, else
+// $XDG_CACHE_HOME/Zafrel/, else ~/.cache/Zafrel/), claimed once on first use and held for the
+// process's lifetime, so editors running side by side never empty each other's files (see
+// tempstore/process_directory.h).
 const QString &ZafScreenRecorderTempDirectory();
 
 // The free space a recording needs, in bytes (decimal: one hundred million).

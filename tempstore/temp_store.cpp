@@ -3,6 +3,7 @@
 #include "platform/dispatch.h"
 #include "platform/log.h"
 #include "platform/text/string_compare.h"
+#include "tempstore/process_directory.h"
 #include "tempstore/temp_directory.h"
 
 #include <chrono>
@@ -36,14 +37,16 @@ int toInt32(double v)
 
 ZafTempStore &ZafTempStore::defaultStore()
 {
-    static ZafTempStore store(zaf::FileManager::defaultManager(), ZafScreenRecorderTempDirectory());
+    static ZafTempStore store(zaf::FileManager::defaultManager(), ZafScreenRecorderTempDirectory(), {},
+                              [] { zaf::tempstore::processDirectory().sweepAbandonedSiblings(); });
     return store;
 }
 
-ZafTempStore::ZafTempStore(const zaf::FileManager &fileManager, QString directory, Clock clock)
+ZafTempStore::ZafTempStore(const zaf::FileManager &fileManager, QString directory, Clock clock, AbandonedSweep sweep)
     : m_fileManager(fileManager)
     , m_directory(std::move(directory))
     , m_clock(clock ? std::move(clock) : Clock([] { return std::chrono::system_clock::now(); }))
+    , m_sweep(std::move(sweep))
 {
 }
 
@@ -92,7 +95,10 @@ std::int64_t ZafTempStore::_srSizeOfTempDir(zaf::OptionalError *errorOut) const
 
 std::int64_t ZafTempStore::_srDeleteAllTempFiles() const
 {
-    return _srDeleteFilesOlderThanTimeToLiveInSeconds(0.0);
+    const std::int64_t freed = _srDeleteFilesOlderThanTimeToLiveInSeconds(0.0);
+    if (m_sweep)
+        m_sweep();
+    return freed;
 }
 
 void ZafTempStore::reportAgeCleanupError(const zaf::Error &e) const

@@ -25,13 +25,17 @@ class ZafTempStore {
 public:
     using Completion = std::function<void(const zaf::OptionalError &)>;
     using Clock = std::function<zaf::Date()>;
+    // Removes what processes that have ended left beside this store's directory.
+    using AbandonedSweep = std::function<void()>;
 
     // The store on the default file manager and the process's temporary directory.
     static ZafTempStore &defaultStore();
 
     // A store over another file manager or directory (tests: a private directory, a fixed clock,
     // a file manager whose volume reports a chosen free size). The directory must end in "/".
-    explicit ZafTempStore(const zaf::FileManager &fileManager, QString directory, Clock clock = {});
+    // With a sweep, every emptying also runs it.
+    explicit ZafTempStore(const zaf::FileManager &fileManager, QString directory, Clock clock = {},
+                          AbandonedSweep sweep = {});
 
     // The directory path, exactly as configured.
     QString _srTempPath() const;
@@ -47,7 +51,8 @@ public:
     // in *error when it cannot be read.
     std::int64_t _srSizeOfTempDir(zaf::OptionalError *error) const;
 
-    // Removes every entry of the directory; returns the bytes freed.
+    // Removes every entry of the directory; returns the bytes freed. The default store then also
+    // removes the directories of processes that have ended (never another living editor's).
     std::int64_t _srDeleteAllTempFiles() const;
 
     // Removes the entries whose modification date is more than timeToLive seconds ago (every entry
@@ -79,4 +84,5 @@ private:
     const zaf::FileManager &m_fileManager;
     QString m_directory;
     Clock m_clock;
+    AbandonedSweep m_sweep;
 };

@@ -1,48 +1,63 @@
-// zaf-tempstore: shows and tidies the editor's temporary directory.
+// zaf-tempstore: shows and tidies the editors' temporary directories.
 //
-//   zaf-tempstore [status]             path, size of the directory entry, free space, entries
-//   zaf-tempstore setup                create the directory (mode 0700) if it is missing
-//   zaf-tempstore clean [--older-than SECONDS]   remove entries (all of them by default)
-//   zaf-tempstore clean --prefix TEXT  remove entries whose names begin with TEXT (any case, accents)
-#include "platform/dispatch.h"
+//   zaf-tempstore [status]   the per-user root, its free space, and each editor's directory there:
+//                            in use by a running editor, or left by one that has ended
+//   zaf-tempstore clean      remove what editors that have ended left behind (never the directory
+//                            of a running editor)
 #include "platform/files/file_manager.h"
 #include "platform/log.h"
+#include "tempstore/process_directory.h"
 #include "tempstore/temp_directory.h"
-#include "tempstore/temp_store.h"
 
 #include <QCoreApplication>
-#include <QThreadPool>
+#include <QDirIterator>
 
 #include <cstdio>
+
+using zaf::tempstore::ProcessDirectory;
 
 namespace {
 
 int usage()
 {
-    std::fprintf(stderr, "usage: zaf-tempstore [status | setup | clean [--older-than SECONDS | --prefix TEXT]]\n");
+    std::fprintf(stderr, "usage: zaf-tempstore [status | clean]\n");
     return 2;
 }
 
-int status(const ZafTempStore &store)
+// Bytes in the regular files below a directory (or of the file itself).
+qint64 bytesBelow(const QString &path)
+{
+    const QFileInfo info(path);
+    if (!info.isDir())
+        return info.size();
+    qint64 total = 0;
+    QDirIterator it(path, QDir::Files | QDir::Hidden | QDir::System, QDirIterator::Subdirectories);
+    while (it.hasNext()) {
+        it.next();
+        total += it.fileInfo().size();
+    }
+    return total;
+}
+
+int status(const QString &root)
 {
     const zaf::FileManager &fm = zaf::FileManager::defaultManager();
-    std::printf("directory:   %s\n", qPrintable(store._srTempPath()));
-    zaf::OptionalError error;
-    const std::int64_t size = store._srSizeOfTempDir(&error);
-    if (error)
-        std::printf("state:       %s\n", qPrintable(error->message));
-    else
-        std::printf("entry size:  %lld bytes\n", static_cast<long long>(size));
-    std::printf("free space:  %llu bytes (%s for a recording)\n",
-                static_cast<unsigned long long>(store._srDeviceFreeDiskSpace()),
-                store._srDeviceHasSufficientFreeSpaceForRecording() ? "enough" : "not enough");
-    const zaf::Result<QStringList> entries = fm.contentsOfDirectoryAtPath(store._srTempPath());
-    if (entries.ok()) {
-        std::printf("entries:     %lld\n", static_cast<long long>(entries.value->size()));
-        for (const QString &name : *entries.value) {
-            const auto attrs = fm.attributesOfItemAtPath(store._srTempPath() + name);
-            std::printf("  %12lld  %s\n", static_cast<long long>(attrs.ok() ? attrs.value->size : 0), qPrintable(name));
-        }
+    std::printf("root:        %s\n", qPrintable(root));
+    const auto fs = fm.attributesOfFileSystemForPath(root);
+    std::printf("free space:  %llu bytes (%s for a recording)\n", static_cast<unsigned long long>(fs.ok() ? fs.value->freeSize : 0),
+                fs.ok() && fs.value->freeSize > std::uint64_t(ZafScreenRecorderRequiredFreeSpace) ? "enough" : "not enough");
+    const zaf::Result<QStringList> entries = fm.contentsOfDirectoryAtPath(root);
+    if (!entries.ok()) {
+        std::printf("state:       %s\n", qPrintable(entries.error->message));
+        return 0;
+    }
+    std::printf("entries:     %lld\n", static_cast<long long>(entries.value->size()));
+    for (const QString &name : *entries.value) {
+        const QString path = root + name;
+        const char *state = !QFileInfo(path).isDir()           ? "loose file"
+                            : ProcessDirectory::isHeldByLivingProcess(path) ? "in use"
+                                                                            : "left by an editor that has ended";
+        std::printf("  %12lld  %s  (%s)\n", static_cast<long long>(bytesBelow(path)), qPrintable(name), state);
     }
     return 0;
 }
@@ -54,32 +69,12 @@ int main(int argc, char **argv)
     QCoreApplication app(argc, argv);
     zaf::log::hideInformationalEntriesByDefault();
     const QStringList args = app.arguments().mid(1);
-    const ZafTempStore &store = ZafTempStore::defaultStore();
+    const QString root = zaf::tempstore::perUserTempRoot();
 
     if (args.isEmpty() || args == QStringList{QStringLiteral("status")})
-        return status(store);
-    if (args == QStringList{QStringLiteral("setup")}) {
-        store.prepareAtProcessStart();
-        return zaf::FileManager::defaultManager().fileExistsAtPath(store._srTempPath()) ? 0 : 1;
-    }
-    if (args.first() != QLatin1String("clean"))
-        return usage();
-    if (args.size() == 1) {
-        std::printf("freed %lld bytes\n", static_cast<long long>(store._srDeleteAllTempFiles()));
-        return 0;
-    }
-    if (args.size() == 3 && args[1] == QLatin1String("--older-than")) {
-        bool ok = false;
-        const double ttl = args[2].toDouble(&ok);
-        if (!ok || ttl < 0)
-            return usage();
-        std::printf("freed %lld bytes\n",
-                    static_cast<long long>(store._srDeleteFilesOlderThanTimeToLiveInSeconds(ttl)));
-        return 0;
-    }
-    if (args.size() == 3 && args[1] == QLatin1String("--prefix")) {
-        store._srDeleteFilesWithPrefix(args[2]);
-        zaf::dispatch::waitForGlobalQueue(zaf::dispatch::Priority::Default);
+        return status(root);
+    if (args == QStringList{QStringLiteral("clean")}) {
+        std::printf("removed %d entries\n", ProcessDirectory::sweepAbandoned(zaf::FileManager::defaultManager(), root));
         return 0;
     }
     return usage();

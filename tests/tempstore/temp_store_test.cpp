@@ -3,9 +3,11 @@
 // free-space check, and removal, move and prefix clean-up off the caller's thread.
 #include "platform/dispatch.h"
 #include "platform/files/file_manager.h"
+#include "tempstore/process_directory.h"
 #include "tempstore/temp_directory.h"
 #include "tempstore/temp_store.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/process_temp_directory.h"
 #include "tests/support/temp_dir.h"
 
 #include <QCoreApplication>
@@ -17,6 +19,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <chrono>
 #include <ctime>
 #include <future>
@@ -112,14 +115,19 @@ TEST_F(TempStoreTest, SetupLeavesAFileInTheWayAloneAndReportsAMissingParentWitho
     EXPECT_EQ(QFileInfo(scratch.file("cache")).permissions() & QFileDevice::ReadOther, 0);
 }
 
-TEST(TempStoreNames, DirectoryIsResolvedOnceAbsoluteWithASlashAndMovieNamesAreStemSecondsAndExtension)
+TEST(TempStoreNames, DirectoryIsTheProcessesOwnUnderTheRootResolvedOnceAndMovieNamesAreStemSecondsAndExtension)
 {
+    const QByteArray overridden = qgetenv("ZAF_TEMP_DIRECTORY");
+    qunsetenv("ZAF_TEMP_DIRECTORY");
+    EXPECT_TRUE(tempstore::perUserTempRoot().endsWith("/Zafrel/")) << tempstore::perUserTempRoot().toStdString();
+    qputenv("ZAF_TEMP_DIRECTORY", overridden);
+
+    usePrivateTempDirectoryForProcess();
     const QString &dir = ZafScreenRecorderTempDirectory();
-    EXPECT_TRUE(dir.startsWith('/') && dir.endsWith('/')) << dir.toStdString();
     EXPECT_EQ(&dir, &ZafScreenRecorderTempDirectory());
-    if (qEnvironmentVariableIsEmpty("ZAF_TEMP_DIRECTORY")) {
-        EXPECT_TRUE(dir.endsWith("/Zafrel/"));
-    }
+    EXPECT_TRUE(dir.startsWith(tempstore::perUserTempRoot() + "session-") && dir.endsWith('/')) << dir.toStdString();
+    EXPECT_TRUE(QFileInfo(dir).isDir());
+    EXPECT_TRUE(tempstore::ProcessDirectory::isHeldByLivingProcess(dir));
     EXPECT_EQ(ZafTempStore::defaultStore()._srTempPath(), dir);
 
     const qint64 before = std::time(nullptr);
@@ -317,6 +325,80 @@ TEST_F(TempStoreTest, PrefixCleanupLogsEachFailedRemovalAndGoesOnAndIgnoresAMiss
     EXPECT_FALSE(exists("ZafReplay_YouTube2.mp4"));
     EXPECT_EQ(logs.messages("zaf.tempstore"), QStringList(2, QString("_zavDeleteFilesWithPrefix error: %1").arg(EBUSY)));
     EXPECT_EQ(logs.entries().size(), 2) << "nothing else, in any category";
+}
+
+// Editors running side by side: each process claims a locked directory of its own under the root.
+// flock belongs to an open file description, so two claims in one test process stand for two
+// processes exactly as the kernel sees them.
+class ProcessDirectoryTest : public ::testing::Test {
+protected:
+    QString root() const { return scratch.path() + "/Zafrel/"; }
+    tempstore::ProcessDirectory claim() const { return tempstore::ProcessDirectory::claim(fileManager, root()); }
+    QStringList rootEntries() const
+    {
+        QStringList names = QDir(root()).entryList(QDir::AllEntries | QDir::Hidden | QDir::NoDotAndDotDot);
+        std::sort(names.begin(), names.end());
+        return names;
+    }
+
+    ScratchDir scratch;
+    FileManager fileManager;
+};
+
+TEST_F(ProcessDirectoryTest, EmptyingOneEditorsDirectoryLeavesTheOtherEditorsMovieAlone)
+{
+    const tempstore::ProcessDirectory a = claim();
+    const tempstore::ProcessDirectory b = claim();
+    ASSERT_TRUE(a.isClaimed() && b.isClaimed());
+    ASSERT_NE(a.path(), b.path());
+    EXPECT_EQ(QFileInfo(root()).permissions() & (QFileDevice::ReadOther | QFileDevice::ReadGroup), 0);
+    EXPECT_EQ(QFileInfo(a.path()).permissions() & (QFileDevice::ReadOther | QFileDevice::ReadGroup), 0);
+
+    const QString trimmedByA = scratch.write("Zafrel/" + a.path().section('/', -2, -2) + "/Recorder_1.mp4", 500);
+    scratch.write("Zafrel/" + b.path().section('/', -2, -2) + "/Recorder_2.mp4", 700);
+    const ZafTempStore storeOfB(fileManager, b.path(), {}, [&b] { b.sweepAbandonedSiblings(); });
+    EXPECT_EQ(storeOfB._srDeleteAllTempFiles(), 700);
+    EXPECT_TRUE(QFile::exists(trimmedByA)) << "B's emptying removed A's trimmed movie";
+    EXPECT_EQ(claim().sweepAbandonedSiblings(), 0) << "a living editor's directory is never swept";
+    EXPECT_TRUE(QFile::exists(trimmedByA));
+}
+
+TEST_F(ProcessDirectoryTest, WhatEndedProcessesLeftIsSweptAtClaimAndAtEmptying)
+{
+    std::optional<tempstore::ProcessDirectory> ended(claim());
+    const QString endedPath = ended->path();
+    scratch.write("Zafrel/" + endedPath.section('/', -2, -2) + "/Recorder_1.mp4", 10);
+    ended.reset(); // as a process that exits normally
+    EXPECT_FALSE(QFileInfo::exists(endedPath)) << "a process that ends normally removes its own directory";
+
+    // A crashed process's directory: there, unlocked. Loose files from versions that wrote into the
+    // root itself go once they are a day old.
+    ASSERT_TRUE(QDir().mkpath(root() + "session-crashed/sub"));
+    scratch.write("Zafrel/session-crashed/sub/Recorder_9.mp4", 10);
+    const QString oldLoose = scratch.write("Zafrel/Recorder_1600000000.mp4", 10);
+    ASSERT_TRUE(setModificationTime(oldLoose, std::time(nullptr) - 2 * 24 * 3600));
+    const QString freshLoose = scratch.write("Zafrel/ZafReplay_Final1700000000.mp4", 10);
+
+    const tempstore::ProcessDirectory living = claim();
+    EXPECT_FALSE(QFileInfo::exists(root() + "session-crashed"));
+    EXPECT_FALSE(QFileInfo::exists(oldLoose));
+    EXPECT_TRUE(QFileInfo::exists(freshLoose));
+
+    // A process killed while this one runs is swept by this one's next emptying.
+    ASSERT_TRUE(QDir().mkpath(root() + "session-killed"));
+    const ZafTempStore store(fileManager, living.path(), {}, [&living] { living.sweepAbandonedSiblings(); });
+    store._srDeleteAllTempFiles();
+    EXPECT_EQ(rootEntries(), QStringList({"ZafReplay_Final1700000000.mp4", living.path().section('/', -2, -2)}));
+}
+
+TEST_F(ProcessDirectoryTest, ARootThatCannotBeMadeLeavesTheDirectoryUnclaimedWithALoggedError)
+{
+    LogCapture logs;
+    scratch.write("file", 1);
+    const tempstore::ProcessDirectory d = tempstore::ProcessDirectory::claim(fileManager, scratch.file("file/Zafrel"));
+    EXPECT_FALSE(d.isClaimed());
+    EXPECT_TRUE(d.path().startsWith(scratch.file("file/Zafrel/session-")) && d.path().endsWith('/'));
+    EXPECT_EQ(logs.messages("zaf.tempstore").size(), 1);
 }
 
 } // namespace
