@@ -2,48 +2,101 @@
 # A whole run as a host application makes it: a fixture recording, zaf-host starting the real
 # extension under Xvfb, the editor driven with the keyboard.
 #
-#   whole_process.sh ZAF_HOST EXTENSION ZAF_FIXTURE SCRATCH_DIR [SCENARIO]
+#   whole_process.sh ZAF_HOST EXTENSION ZAF_FIXTURE SCRATCH_DIR [SCENARIO] [MOVIE]
 #
 # SCENARIO "cancel" (the default) presses Escape. "trim-save" trims with the keyboard (the playhead
 # to 1 s, I, to 2.5 s, O, Return to apply), waits for the trim, then saves with Ctrl+S into
-# SCRATCH_DIR/Videos.
+# SCRATCH_DIR/Videos. "two-editors" runs two hosts at once on the same user's temporary root: the
+# first editor applies the same trim, the second is cancelled while the first stays open, then
+# the first saves.
 #
-# Writes into SCRATCH_DIR: movie.mp4, temp/ (the extension's temporary directory), host.out,
-# host.err, host.status (zaf-host's exit status), extension.pid (the editor window's process) and
-# result ("ok" or what went wrong). Exits 0 when the script itself ran to its end; the caller
-# judges the outputs.
+# MOVIE "fixture" (the default) is a 3 s 640x360 recording with two audio tracks; "tiny" is a 4x4
+# H.264 movie; "garbage" is random bytes named .mp4.
+#
+# Writes into SCRATCH_DIR: movie.mp4, temp/ (the per-user temporary root), host.out, host.err,
+# host.status (zaf-host's exit status), extension.pid (the editor window's process), for
+# "two-editors" also second.out, second.err and second.status, and result ("ok" or what went
+# wrong). Exits 0 when the script itself ran to its end; the caller judges the outputs.
 set -u
 
 if [ "${1:-}" = "--inside" ]; then
     host=$2 extension=$3 scratch=$4 scenario=$5
-    "$host" --movie "$scratch/movie.mp4" --app-name "Whole Process" --bundle-id org.example.WholeProcess \
-        --tint '#3366CC' --extension "$extension" >"$scratch/host.out" 2>"$scratch/host.err" &
+
+    # start_host NAME: a host presenting the editor on the movie; its output goes to NAME.out/.err.
+    start_host() {
+        "$host" --movie "$scratch/movie.mp4" --app-name "Whole Process" --bundle-id org.example.WholeProcess \
+            --tint '#3366CC' --extension "$extension" >"$scratch/$1.out" 2>"$scratch/$1.err" &
+    }
+    # new_window KNOWN: waits up to 60 s for an editor window other than KNOWN and prints it.
+    new_window() {
+        for _ in $(seq 1 600); do
+            for w in $(xdotool search --name "Zafrel Video Editor" 2>/dev/null); do
+                [ "$w" != "$1" ] && { echo "$w"; return 0; }
+            done
+            sleep 0.1
+        done
+        return 1
+    }
+    # wait_exit PID: true once the process has gone, false after 60 s.
+    wait_exit() {
+        for _ in $(seq 1 600); do
+            kill -0 "$1" 2>/dev/null || return 0
+            sleep 0.1
+        done
+        return 1
+    }
+    # No window manager under Xvfb: the window gets the keyboard focus directly.
+    trim_with_keys() {
+        xdotool windowfocus --sync "$1"
+        xdotool key --delay 20 --repeat 30 Right
+        xdotool key i
+        xdotool key --delay 20 --repeat 45 Right
+        xdotool key o Return
+        sleep 4
+    }
+
+    start_host host
     host_pid=$!
     result=ok
-    window=$(timeout 60 xdotool search --sync --name "Zafrel Video Editor" | head -n 1)
+    window=$(new_window none)
     if [ -z "$window" ]; then
         result="the editor window did not appear"
     else
         xdotool getwindowpid "$window" >"$scratch/extension.pid" 2>/dev/null
         # Let the editor finish opening the movie before the keys arrive.
         sleep 2
-        # No window manager under Xvfb: give the window the keyboard focus directly.
-        xdotool windowfocus --sync "$window"
-        if [ "$scenario" = trim-save ]; then
-            xdotool key --delay 20 --repeat 30 Right
-            xdotool key i
-            xdotool key --delay 20 --repeat 45 Right
-            xdotool key o Return
-            sleep 4
+        case "$scenario" in
+        trim-save)
+            trim_with_keys "$window"
             xdotool key ctrl+s
-        else
+            ;;
+        two-editors)
+            trim_with_keys "$window"
+            start_host second
+            second_pid=$!
+            second_window=$(new_window "$window")
+            if [ -z "$second_window" ]; then
+                result="the second editor window did not appear"
+            else
+                sleep 2
+                xdotool windowfocus --sync "$second_window"
+                xdotool key Escape
+                wait_exit "$second_pid" || result="the second zaf-host did not exit within 60 s of Escape"
+            fi
+            [ "$result" = ok ] || kill "$second_pid" 2>/dev/null
+            wait "$second_pid"
+            echo $? >"$scratch/second.status"
+            xdotool windowfocus --sync "$window"
+            xdotool key ctrl+s
+            ;;
+        *)
+            xdotool windowfocus --sync "$window"
             xdotool key Escape
+            ;;
+        esac
+        if [ "$result" = ok ]; then
+            wait_exit "$host_pid" || result="zaf-host did not exit within 60 s of the last key"
         fi
-        for _ in $(seq 1 600); do
-            kill -0 "$host_pid" 2>/dev/null || break
-            sleep 0.1
-        done
-        kill -0 "$host_pid" 2>/dev/null && result="zaf-host did not exit within 60 s of the last key"
     fi
     [ "$result" = ok ] || kill "$host_pid" 2>/dev/null
     echo "$result" >"$scratch/result"
@@ -52,10 +105,22 @@ if [ "${1:-}" = "--inside" ]; then
     exit 0
 fi
 
-host=$1 extension=$2 fixture=$3 scratch=$4 scenario=${5:-cancel}
+host=$1 extension=$2 fixture=$3 scratch=$4 scenario=${5:-cancel} movie=${6:-fixture}
 mkdir -p "$scratch/temp" "$scratch/Videos"
-if ! "$fixture" "$scratch/movie.mp4" --seconds 3 --size 640x360 --audio-tracks 2 2>"$scratch/fixture.err"; then
-    echo "the fixture movie could not be made" >"$scratch/result"
+case "$movie" in
+tiny)
+    ffmpeg -v error -f lavfi -i testsrc=size=4x4:rate=30 -t 2 -c:v libx264 -pix_fmt yuv420p \
+        "$scratch/movie.mp4" 2>"$scratch/fixture.err"
+    ;;
+garbage)
+    head -c 65536 /dev/urandom >"$scratch/movie.mp4"
+    ;;
+*)
+    "$fixture" "$scratch/movie.mp4" --seconds 3 --size 640x360 --audio-tracks 2 2>"$scratch/fixture.err"
+    ;;
+esac
+if [ ! -s "$scratch/movie.mp4" ]; then
+    echo "the $movie movie could not be made" >"$scratch/result"
     exit 0
 fi
 export ZAF_TEMP_DIRECTORY="$scratch/temp/"
