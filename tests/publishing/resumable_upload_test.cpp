@@ -1,6 +1,7 @@
 // The resumable upload against the loopback server: a clean run, recovery from each fault the
 // service produces, and the errors that end an upload for good.
 #include "tests/publishing/upload_test_support.h"
+#include "publishing/plugin/upload/upload_chunk_device.h"
 #include "tests/support/log_capture.h"
 
 #include <gtest/gtest.h>
@@ -17,12 +18,12 @@ namespace {
 
 constexpr qint64 kChunk = UploadHarness::kChunk;
 
-// The Content-Range starts of the data PUTs, in order.
+// The Content-Range starts of the data PUTs the upload sent (not the network stack's resends), in order.
 QList<qint64> dataStarts(const UploadTestServer &server)
 {
     QList<qint64> starts;
     for (const auto &request : server.requests()) {
-        if (request.method == QLatin1String("PUT") && !request.contentRange.startsWith("bytes */"))
+        if (request.method == QLatin1String("PUT") && !request.contentRange.startsWith("bytes */") && !request.resent)
             starts.append(request.contentRange.mid(6, request.contentRange.indexOf('-') - 6).toLongLong());
     }
     return starts;
@@ -101,6 +102,9 @@ TEST(ResumableUpload, recoversFromEachServiceFault)
         {"308 without Range restarts from zero", 3 * kChunk, {{FaultKind::DropBody, 2000}, {FaultKind::ForgetBytes}},
          {1000ms}, {0, 0}, 1, 1},
         {"404 starts a new session", 3 * kChunk, {{FaultKind::SessionGone}}, {}, {0, 0}, 0, 2},
+        // A connection lost once is the network stack's to mend: it rewinds the chunk and sends it
+        // again, and the upload neither waits nor asks the server.
+        {"interrupted once, resent by the network stack", 2 * kChunk, {{FaultKind::DropBodyOnce, 1000}}, {}, {0, kChunk}, 0, 1},
     };
     for (const auto &c : cases) {
         SCOPED_TRACE(c.name);
@@ -180,6 +184,59 @@ TEST(ResumableUpload, endsWithAnErrorAtEachLimit)
         });
         EXPECT_EQ(failureCode(h), UploadCancelledError);
     }
+}
+
+// A server that misleads the upload cannot keep it going or get the token elsewhere: a 308 that keeps
+// none of a chunk (no Range, or a Range stuck before the chunk) is a failed attempt within the
+// bounded retries, and a session address off the base's origin ends the upload before any PUT.
+TEST(ResumableUpload, endsWhenTheServerStallsOrSendsTheSessionElsewhere)
+{
+    const struct {
+        const char *name;
+        qint64 stallAfter;
+        QString sessionOrigin; // "PORT" stands for the server's port
+        int code;
+        int dataPuts;
+    } cases[] = {
+        {"308 without Range for ever", 0, {}, UploadTooManyRetriesError, 4},
+        {"308 with a Range stuck after the first chunk", kChunk, {}, UploadTooManyRetriesError, 5},
+        {"session on another host", -1, QStringLiteral("http://localhost:PORT"), UploadUntrustedSessionError, 0},
+        {"session on another port", -1, QStringLiteral("http://127.0.0.1:1"), UploadUntrustedSessionError, 0},
+    };
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.name);
+        UploadHarness h(3 * kChunk);
+        h.upload.setBackoff(1000ms, 4000ms, 3);
+        h.server.setStallAfter(c.stallAfter);
+        QString origin = c.sessionOrigin;
+        h.server.setSessionOrigin(QUrl(origin.replace(QStringLiteral("PORT"), QString::number(h.server.baseUrl().port()))));
+        EXPECT_EQ(failureCode(h), c.code);
+        EXPECT_EQ(h.server.count(QStringLiteral("PUT")), c.dataPuts);
+        EXPECT_EQ(h.delays.size(), c.code == UploadTooManyRetriesError ? 3u : 0u);
+        EXPECT_EQ(h.server.initiations(), 1);
+    }
+}
+
+// The chunk device reads its slice of the file and rewinds, so the network stack can resend it.
+TEST(UploadChunkDevice, readsItsSliceAndRewinds)
+{
+    zaf::test::ScratchDir scratch;
+    const QByteArray bytes = zaf::test::variedBytes(1000);
+    const QString path = scratch.file(QStringLiteral("movie.mp4"));
+    QFile file(path);
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly) && file.write(bytes) == bytes.size());
+    file.close();
+    UploadChunkDevice device(path, 100, 300);
+    ASSERT_TRUE(device.openChunk());
+    EXPECT_EQ(device.size(), 300);
+    EXPECT_EQ(device.readAll(), bytes.mid(100, 300));
+    EXPECT_TRUE(device.atEnd());
+    ASSERT_TRUE(device.reset());
+    EXPECT_EQ(device.readAll(), bytes.mid(100, 300));
+    ASSERT_TRUE(device.seek(250));
+    EXPECT_EQ(device.readAll(), bytes.mid(350, 50));
+    EXPECT_FALSE(device.seek(301));
+    EXPECT_FALSE(UploadChunkDevice(path, 900, 300).openChunk()) << "a chunk past the file's end";
 }
 
 // The server closes itself after its lifetime, so a test that goes wrong cannot keep it busy.

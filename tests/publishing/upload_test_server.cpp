@@ -134,9 +134,24 @@ void UploadTestServer::readFrom(QTcpSocket *socket)
         m_requests.append(Request{c.method, c.target.toString(), range, c.contentLength});
         if (m_requests.size() > m_maxRequests)
             return respondError(socket, 403, QStringLiteral("The test server answers no more requests"));
-        if (c.method == QLatin1String("PUT") && range.startsWith("bytes ") && !range.startsWith("bytes */")) {
-            if (const auto fault = takeFault(FaultKind::DropBody))
+        if (c.method == QLatin1String("PUT") && range.startsWith("bytes */")) {
+            m_lastDataRange.clear();
+            m_resendDrop.reset();
+        } else if (c.method == QLatin1String("PUT") && range.startsWith("bytes ")) {
+            const QByteArray sessionRange = c.target.toEncoded() + ' ' + range;
+            const bool resent = sessionRange == m_lastDataRange;
+            m_requests.last().resent = resent;
+            m_lastDataRange = sessionRange;
+            if (!resent)
+                m_resendDrop.reset();
+            if (resent && m_resendDrop) {
+                c.dropAfter = m_resendDrop->bytes;
+            } else if (const auto fault = takeFault(FaultKind::DropBody)) {
                 c.dropAfter = fault->bytes;
+                m_resendDrop = fault;
+            } else if (const auto once = takeFault(FaultKind::DropBodyOnce)) {
+                c.dropAfter = once->bytes;
+            }
         }
     }
     if (c.dropAfter >= 0 && c.dropAfter < c.contentLength && c.buffer.size() >= c.dropAfter) {
@@ -173,7 +188,8 @@ void UploadTestServer::handleInitiation(QTcpSocket *socket, const Connection &c,
     m_initiationBodies.append(body);
     const QString id = QStringLiteral("s%1").arg(m_nextSession++);
     m_sessions.insert(id, Session{total, {}});
-    respond(socket, 200, {{"Location", (baseUrl().toString() + kUploadPath + QStringLiteral("?uploadType=resumable&upload_id=") + id).toLatin1()}});
+    const QString origin = m_sessionOrigin.isEmpty() ? baseUrl().toString() : m_sessionOrigin.toString();
+    respond(socket, 200, {{"Location", (origin + kUploadPath + QStringLiteral("?uploadType=resumable&upload_id=") + id).toLatin1()}});
 }
 
 void UploadTestServer::handlePut(QTcpSocket *socket, const Connection &c, const QByteArray &body)
@@ -196,10 +212,14 @@ void UploadTestServer::handlePut(QTcpSocket *socket, const Connection &c, const 
         return respondError(socket, 400, QStringLiteral("Invalid Content-Range"));
     if (!range.startsWith("bytes */")) {
         const qint64 first = rangeStart(range), last = rangeEnd(range);
-        if (first != session->bytes.size() || last - first + 1 != body.size() || last >= session->total)
+        const qint64 held = session->bytes.size();
+        const qint64 overlap = qMin<qint64>(held - first, body.size());
+        if (first > held || last - first + 1 != body.size() || last >= session->total
+            || session->bytes.mid(first, overlap) != body.left(overlap))
             return respondError(socket, 400, QStringLiteral("Content-Range %1 does not continue the %2 bytes held")
-                                                 .arg(QString::fromLatin1(range)).arg(session->bytes.size()));
-        session->bytes.append(body);
+                                                 .arg(QString::fromLatin1(range)).arg(held));
+        if (m_stallAfter < 0 || held < m_stallAfter)
+            session->bytes.append(body.mid(overlap));
     } else if (takeFault(FaultKind::ForgetBytes)) {
         session->bytes.clear();
     }

@@ -2,7 +2,9 @@
 
 // A loopback HTTP/1.1 server speaking enough of the video service's resumable upload protocol for the
 // upload tests: it checks the requests as the service does, keeps each session's bytes, answers 308
-// with the Range it holds and 201 with a video resource once a session is complete. One request per
+// with the Range it holds and 201 with a video resource once a session is complete. A data PUT may
+// repeat bytes the session holds (a request the client's network stack resent) as long as they are
+// the same bytes. One request per
 // connection, 127.0.0.1 only, at most maxRequests answers (then 403) and closed after `lifetime`, so
 // a test that goes wrong cannot keep it busy. Queued faults are each spent on the first request they
 // apply to. Lives on the thread that creates it.
@@ -30,7 +32,9 @@ class UploadTestServer : public QObject {
 
 public:
     enum class FaultKind {
-        DropBody,    // a data PUT: keep the first `bytes` of its body, then drop the connection unanswered
+        DropBody,    // a data PUT: keep the first `bytes` of its body, then drop the connection unanswered;
+                     // the client's resends of that PUT are dropped alike until its next status query
+        DropBodyOnce, // as DropBody, but a resend of the PUT gets through
         Unavailable, // any PUT on a session: 503 with "Retry-After: retryAfterSeconds" (none when negative)
         ForgetBytes, // a status query: the server forgets what it holds and answers 308 without Range
         SessionGone, // any PUT on a session: the session is discarded and the answer is 404
@@ -47,6 +51,9 @@ public:
         QByteArray contentRange;
         qint64 bodyBytes = 0;
         int status = 0; // 0: dropped without an answer
+        // A data PUT with the previous data PUT's session and Content-Range and no status query between: sent
+        // again by the client's network stack, not by the upload.
+        bool resent = false;
     };
 
     explicit UploadTestServer(int maxRequests = 200, std::chrono::milliseconds lifetime = std::chrono::seconds(30),
@@ -63,6 +70,11 @@ public:
     void setResponseDelay(std::chrono::milliseconds delay) { m_responseDelay = delay; }
     // Initiations whose category is not in this set are refused with 400 (empty: any category).
     void setAcceptedCategories(const QSet<QString> &categories) { m_categories = categories; }
+    // A server stuck at 308: once a session holds `bytes`, every data PUT is read, its bytes dropped
+    // and answered 308 with the Range held (none while nothing is held). Negative: off.
+    void setStallAfter(qint64 bytes) { m_stallAfter = bytes; }
+    // The scheme, host and port the session addresses in Location name (empty: the server's own).
+    void setSessionOrigin(const QUrl &origin) { m_sessionOrigin = origin; }
 
     const QList<Request> &requests() const { return m_requests; }
     // Requests with this method; PUTs are data PUTs or, with `statusQueries`, status queries.
@@ -101,6 +113,10 @@ private:
     QTimer m_lifetime;
     int m_maxRequests;
     std::chrono::milliseconds m_responseDelay{0};
+    qint64 m_stallAfter = -1;
+    QByteArray m_lastDataRange; // session and Content-Range of the last data PUT since the last status query
+    std::optional<Fault> m_resendDrop; // the DropBody fault that also drops resends of m_lastDataRange
+    QUrl m_sessionOrigin;
     QHash<QTcpSocket *, Connection> m_connections;
     QList<Fault> m_faults;
     QByteArray m_token = "test-token";

@@ -31,6 +31,11 @@ constexpr milliseconds kMaxRetryAfter{10 * 60 * 1000};
 // Server messages end up in logs and dialogs; keep them readable.
 constexpr int kMaxServerMessageLength = 500;
 
+int defaultPort(const QString &scheme)
+{
+    return scheme.compare(QLatin1String("https"), Qt::CaseInsensitive) == 0 ? 443 : 80;
+}
+
 bool isRetryableStatus(int status)
 {
     return status == 500 || status == 502 || status == 503 || status == 504;
@@ -145,10 +150,24 @@ void ResumableUpload::cancel()
     fail(UploadCancelledError, QStringLiteral("The upload was cancelled"));
 }
 
+bool ResumableUpload::mayCarryToken(const QUrl &url) const
+{
+    if (!url.isValid() || !url.userName().isEmpty())
+        return false;
+    const auto sameOrigin = [&url](const QUrl &origin) {
+        return url.scheme().compare(origin.scheme(), Qt::CaseInsensitive) == 0
+            && url.host().compare(origin.host(), Qt::CaseInsensitive) == 0
+            && url.port(defaultPort(url.scheme())) == origin.port(defaultPort(origin.scheme()));
+    };
+    return sameOrigin(QUrl(QStringLiteral("https://") + QLatin1String(kServiceApiHost))) || sameOrigin(m_baseUrl);
+}
+
 QNetworkRequest ResumableUpload::authorisedRequest(const QUrl &url) const
 {
     QNetworkRequest request(url);
-    request.setRawHeader("Authorization", "Bearer " + m_accessToken.toUtf8());
+    // Checked again here so that no path can hand the token to another host.
+    if (mayCarryToken(url))
+        request.setRawHeader("Authorization", "Bearer " + m_accessToken.toUtf8());
     request.setTransferTimeout(int(m_transferTimeout.count()));
     // A session URI is never followed elsewhere: the answer is read as it comes.
     request.setAttribute(QNetworkRequest::RedirectPolicyAttribute, QNetworkRequest::ManualRedirectPolicy);
@@ -247,7 +266,16 @@ void ResumableUpload::handleInitiation(QNetworkReply *reply, int status)
             fail(UploadMalformedAnswerError, QStringLiteral("The upload was accepted without a session address"));
             return;
         }
-        m_sessionUrl = reply->url().resolved(location);
+        const QUrl session = reply->url().resolved(location);
+        if (!mayCarryToken(session)) {
+            // The session address would get the access token: only the service (or the configured
+            // base) may have it.
+            fail(UploadUntrustedSessionError,
+                 QStringLiteral("The upload session address %1 is not on the service's host; nothing was sent there")
+                     .arg(session.toString(QUrl::RemoveUserInfo | QUrl::RemoveQuery).left(kMaxServerMessageLength)));
+            return;
+        }
+        m_sessionUrl = session;
         m_offset = 0;
         m_retries = 0;
         zaf::log::info(lcPublishing(), QStringLiteral("Upload session %1").arg(m_sessionUrl.toString()));
@@ -270,10 +298,20 @@ void ResumableUpload::handleUploadAnswer(QNetworkReply *reply, int status)
     }
     if (status == 308) {
         const qint64 before = m_offset;
+        const QByteArray range = reply->rawHeader("Range").left(100);
         if (!resumeFromRange(reply))
             return;
-        // Bytes confirmed by a chunk, or a status query that moves us forward, end a run of failures.
-        if (m_step == Step::SendChunk || m_offset > before)
+        if (m_step == Step::SendChunk && m_offset <= before) {
+            // The server took a chunk and kept none of it (no Range, or a Range that does not pass the
+            // chunk's start). Sending it again at once could go on for ever: this is a failed attempt,
+            // retried after a wait like a lost connection, within the same bound.
+            m_offset = before;
+            retryLater(reply, 0, QStringLiteral("HTTP 308 without progress (Range \"%1\" for a chunk at %2)")
+                                     .arg(QString::fromLatin1(range)).arg(before));
+            return;
+        }
+        // Bytes that move us forward end a run of failures.
+        if (m_offset > before)
             m_retries = 0;
         Q_EMIT progress(m_offset, m_total);
         sendChunk();

@@ -9,7 +9,10 @@
 //   1. POST {base}/upload/youtube/v3/videos?uploadType=resumable&part=snippet,status with the
 //      metadata; the 200 answer's Location is the session URI.
 //   2. PUT the file chunk by chunk ("Content-Range: bytes a-b/TOTAL"); each 308 says how far the
-//      server got ("Range: bytes=0-N", resume at N+1; no Range means from 0).
+//      server got ("Range: bytes=0-N", resume at N+1; no Range means from 0). A 308 to a chunk that
+//      kept none of it counts as a failed attempt (step 3), so a server stuck at 308 ends the upload.
+//      The session address must be on the service's host (or the configured base): the access
+//      token is sent nowhere else, and another address ends the upload.
 //   3. A lost connection or a 500/502/503/504 waits (exponential backoff from 1 s, capped, or the
 //      answer's Retry-After), then asks "Content-Range: bytes */TOTAL" and continues from its Range.
 //      A 404 on the session starts again at step 1, a bounded number of times.
@@ -44,7 +47,12 @@ enum UploadErrorCode {
     UploadMalformedAnswerError = -5,
     UploadInvalidMetadataError = -6,
     UploadNetworkError = -7,
+    UploadUntrustedSessionError = -8,
 };
+
+// The service's host: the access token goes only to https URLs on it, or to the configured base
+// (scheme, host and port), which tests point at a local server.
+inline constexpr const char *kServiceApiHost = "www.googleapis.com";
 
 struct UploadResult {
     QString videoId;
@@ -114,6 +122,8 @@ private:
     void succeed(const QByteArray &body);
     void fail(int code, const QString &message);
     void scheduleAfter(std::chrono::milliseconds delay, void (ResumableUpload::*step)());
+    // Whether `url` may receive the access token (see kServiceApiHost).
+    bool mayCarryToken(const QUrl &url) const;
     QNetworkRequest authorisedRequest(const QUrl &url) const;
 
     QNetworkAccessManager *m_network;

@@ -22,14 +22,16 @@ bool UploadChunkDevice::openChunk()
     return QIODevice::open(QIODevice::ReadOnly | QIODevice::Unbuffered);
 }
 
-qint64 UploadChunkDevice::bytesAvailable() const
+bool UploadChunkDevice::seek(qint64 pos)
 {
-    return (m_length - m_read) + QIODevice::bytesAvailable();
-}
-
-bool UploadChunkDevice::atEnd() const
-{
-    return m_read >= m_length && QIODevice::bytesAvailable() == 0;
+    if (!isOpen() || pos < 0 || pos > m_length)
+        return false;
+    if (!m_file.seek(m_offset + pos)) {
+        setErrorString(m_file.errorString());
+        return false;
+    }
+    m_read = pos;
+    return QIODevice::seek(pos);
 }
 
 void UploadChunkDevice::close()
@@ -42,7 +44,7 @@ qint64 UploadChunkDevice::readData(char *data, qint64 maxSize)
 {
     const qint64 wanted = qMin(maxSize, m_length - m_read);
     if (wanted <= 0)
-        return m_read >= m_length ? -1 : 0;
+        return 0; // the end of the chunk
     const qint64 got = m_file.read(data, wanted);
     if (got < 0) {
         setErrorString(m_file.errorString());
