@@ -123,6 +123,9 @@ public:
 
     // --- Trimming ---
     QUrl trimFileURL() const;
+    // trimFileURL, or when that names an existing file or the movie being trimmed, the same name
+    // with the first free counter after it ("-2", "-3", ...).
+    QUrl freeTrimFileURL() const;
     void trimVideo();
     Q_INVOKABLE void undoAction();
     void movieScrubberValueDidChange(zaf::ui::MovieScrubber *scrubber, double value) override;

@@ -10,6 +10,8 @@
 #include "tempstore/temp_directory.h"
 #include "tempstore/temp_store.h"
 
+#include <QFileInfo>
+
 using namespace zaf::media;
 using namespace zaf::ui;
 
@@ -17,6 +19,26 @@ QUrl ZafVideoEditorViewController::trimFileURL() const
 {
     const QString stem = ZafTempStore::defaultStore()._srTempPath() + QLatin1Char('/') + m_applicationName + QLatin1Char('_');
     return QUrl::fromLocalFile(ZafTempMovieFileName(stem));
+}
+
+QUrl ZafVideoEditorViewController::freeTrimFileURL() const
+{
+    // Names have a resolution of one second, so a trim applied within the second of the previous
+    // one gets the name of the movie it reads, and an export never overwrites a file: it would
+    // fail. A name that is taken gets a counter: "Recorder_1000000000-2.mp4".
+    const QUrl url = trimFileURL();
+    const QString path = url.toLocalFile();
+    auto taken = [this](const QString &candidate) {
+        return QUrl::fromLocalFile(candidate) == m_videoURL || QFileInfo::exists(candidate);
+    };
+    if (!taken(path))
+        return url;
+    const QString stem = path.chopped(4); // ".mp4"
+    for (int counter = 2;; ++counter) {
+        const QString candidate = stem + QLatin1Char('-') + QString::number(counter) + QStringLiteral(".mp4");
+        if (!taken(candidate))
+            return QUrl::fromLocalFile(candidate);
+    }
 }
 
 void ZafVideoEditorViewController::trimVideo()
@@ -30,7 +52,7 @@ void ZafVideoEditorViewController::trimVideo()
     m_exporting = true;
     const std::shared_ptr<MediaAsset> asset = MediaAsset::assetWithURL(m_videoURL);
     m_exportSession = ExportSession::exportSessionWithAsset(asset, QLatin1String(kExportPresetHighestQuality));
-    m_trimFilePath = trimFileURL();
+    m_trimFilePath = freeTrimFileURL();
     if (!m_exportSession) {
         zaf::log::notice(lcEditor(), QStringLiteral("ZavVideoEditorViewController: Export Trim Video Failed, due to error: %1")
                                          .arg(int(kMediaErrorInvalidArgument)));

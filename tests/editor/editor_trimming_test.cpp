@@ -5,6 +5,10 @@
 #include <QFileInfo>
 #include <QRegularExpression>
 
+#include "tempstore/temp_directory.h"
+
+#include <ctime>
+
 namespace zaf::test {
 namespace {
 
@@ -68,7 +72,7 @@ TEST_F(EditorTest, CancelledTrimKeepsTheHandleValuesAndTouchesNoFile)
     EXPECT_EQ(itemNames(*e, e->topToolBar()), words("done flex title flex save"));
 }
 
-TEST_F(EditorTest, SecondTrimOfTheTrimmedMovieWorksAndRetiresTheFirstFile)
+TEST_F(EditorTest, SecondTrimWithinTheSameSecondGetsAFreeNameAndRetiresTheFirstFile)
 {
     auto e = ready(movie(10));
     selectRange(*e, 2, 7);
@@ -76,12 +80,27 @@ TEST_F(EditorTest, SecondTrimOfTheTrimmedMovieWorksAndRetiresTheFirstFile)
     ASSERT_TRUE(waitUntilReady(*e));
     const QString first = e->videoURL().toLocalFile();
 
-    // Names have a resolution of one second: the second trim gets a new name in the next second.
-    spin(1100);
+    // Names have a resolution of one second. The second trim comes at once, and the names of the
+    // next seconds are taken too, so it always finds its plain name taken (by the movie it reads
+    // or by another file, which must survive).
+    const qint64 now = std::time(nullptr);
+    QStringList taken;
+    for (qint64 second = now; second <= now + 3; ++second) {
+        taken << ZafTempMovieFileNameAt(ZafTempStore::defaultStore()._srTempPath() + "/Recorder_", double(second));
+        QFile other(taken.last());
+        if (taken.last() != first)
+            ASSERT_TRUE(other.open(QIODevice::WriteOnly) && other.write("not the movie") > 0);
+    }
     selectRange(*e, 1, 3);
     ASSERT_TRUE(applyTrim(*e));
     const QString second = e->videoURL().toLocalFile();
     EXPECT_NE(first, second);
+    EXPECT_TRUE(QRegularExpression(QStringLiteral("^Recorder_\\d+-2\\.mp4$")).match(QFileInfo(second).fileName()).hasMatch()) << second.toStdString();
+    for (const QString &other : taken) {
+        QFile file(other);
+        if (other != first)
+            EXPECT_TRUE(file.open(QIODevice::ReadOnly) && file.readAll() == "not the movie") << other.toStdString();
+    }
     const QList<int> frames = readFrameNumbers(second);
     ASSERT_EQ(frames.size(), 60);
     EXPECT_EQ(frames.first(), 90);
