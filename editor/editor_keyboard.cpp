@@ -71,19 +71,8 @@ void ZafVideoEditorViewController::setTrimPointAtPlayhead(bool start)
         m_mvTrimmer->setEditing(true, true);
         movieScrubberDidBeginEditing(m_mvTrimmer);
     }
-    const double playhead = std::clamp(m_mvTrimmer->value(), 0.0, duration);
-    double rangeStart = m_mvTrimmer->editingStartValue();
-    double rangeEnd = m_mvTrimmer->editingEndValue();
-    if (start) {
-        rangeStart = std::min(playhead, duration - zaf::editor::kMinimumTrimLength);
-        rangeEnd = std::max(rangeEnd, rangeStart + zaf::editor::kMinimumTrimLength);
-    } else {
-        rangeEnd = std::max(playhead, zaf::editor::kMinimumTrimLength);
-        rangeStart = std::min(rangeStart, rangeEnd - zaf::editor::kMinimumTrimLength);
-    }
-    m_mvTrimmer->setEditingRange(rangeStart, rangeEnd);
-    if (start)
-        movieScrubberEditingStartValueDidChange(m_mvTrimmer, rangeStart);
-    else
-        movieScrubberEditingEndValueDidChange(m_mvTrimmer, rangeEnd);
+    // The timeline moves the handle, and the other one too when the minimum length needs it, and
+    // calls back for each, so the editor's range always matches the handles.
+    m_mvTrimmer->moveEditingHandleTo(start ? MovieScrubberHandle::Start : MovieScrubberHandle::End,
+                                     std::clamp(m_mvTrimmer->value(), 0.0, duration));
 }

@@ -610,6 +610,32 @@ void MovieScrubber::setEditingRange(double start, double end)
     update();
 }
 
+void MovieScrubber::moveEditingHandleTo(MovieScrubberHandle handle, double seconds)
+{
+    if (!d->hasDuration() || handle == MovieScrubberHandle::Playhead || std::isnan(seconds))
+        return;
+    const double oldStart = d->start, oldEnd = d->end;
+    const double minimum = std::min(d->minimumTrimLength, d->duration);
+    const double t = std::clamp(seconds, 0.0, d->duration);
+    if (handle == MovieScrubberHandle::Start) {
+        d->start = std::min(t, d->duration - minimum);
+        d->end = std::max(d->end, d->start + minimum);
+    } else {
+        d->end = std::max(t, minimum);
+        d->start = std::min(d->start, d->end - minimum);
+    }
+    d->constrainRange();
+    update();
+    if (!d->delegate)
+        return;
+    // The delegate may change the range from its callback; each call reports the value it moved to.
+    const double start = d->start, end = d->end;
+    if (start != oldStart)
+        d->delegate->movieScrubberEditingStartValueDidChange(this, start);
+    if (end != oldEnd)
+        d->delegate->movieScrubberEditingEndValueDidChange(this, end);
+}
+
 bool MovieScrubber::isEditing() const { return d->editing; }
 
 void MovieScrubber::setEditing(bool editing, bool animated)

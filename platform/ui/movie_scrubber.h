@@ -107,6 +107,11 @@ public:
     double editingStartValue() const;
     double editingEndValue() const;
     void setEditingRange(double start, double end);
+    // Puts one trim handle at a time as the user would (the keyboard's trim keys): the other
+    // handle makes way when the minimum trim length needs it, and the delegate hears of every
+    // handle that moved, the start's change before the end's. Nothing before the duration is
+    // known, for the playhead, or for NaN.
+    void moveEditingHandleTo(MovieScrubberHandle handle, double seconds);
     // Editing shows the handles highlighted and dims the movie outside the range. Entering or
     // leaving it through these calls never calls the delegate; leaving keeps the range.
     bool isEditing() const;
