@@ -1,4 +1,5 @@
 #include "platform/media/export_video_encoder.h"
+#include "platform/media/frame_converter.h"
 
 extern "C" {
 #include <libavutil/opt.h>
@@ -28,13 +29,22 @@ bool encoderSupports(const AVCodec *codec, AVPixelFormat format)
     return false;
 }
 
+// The encoder's format for a source format it cannot take: 4:2:0 loses nothing of a subsampled
+// source, but needs even sides, and would halve the colour of an RGB or 4:4:4 source.
+AVPixelFormat fallbackFormat(AVPixelFormat source, int width, int height)
+{
+    const AVPixFmtDescriptor *descriptor = av_pix_fmt_desc_get(source);
+    const bool fullChroma = descriptor && descriptor->log2_chroma_w == 0 && descriptor->log2_chroma_h == 0;
+    return fullChroma || width % 2 || height % 2 ? AV_PIX_FMT_YUV444P : AV_PIX_FMT_YUV420P;
+}
+
 } // namespace
 
 struct ExportVideoEncoder::Private {
     const AVStream *input = nullptr;
     ff::CodecContextPtr decoder;
     ff::CodecContextPtr encoder;
-    ff::SwsContextPtr scaler;
+    FrameConverter converter;
     ff::AVFramePtr decoded = ff::makeFrame();
     ff::AVFramePtr pending = ff::makeFrame();   // the latest frame before the cut's start
     ff::AVFramePtr converted;
@@ -105,7 +115,7 @@ std::unique_ptr<ExportVideoEncoder> ExportVideoEncoder::create(const Options &op
         return failed(stageError(kMediaErrorUnknown, QStringLiteral("out of memory")));
     AVCodecContext *enc = p.encoder.get();
     const AVPixelFormat sourceFormat = AVPixelFormat(par->format);
-    enc->pix_fmt = sourceFormat != AV_PIX_FMT_NONE && encoderSupports(codec, sourceFormat) ? sourceFormat : AV_PIX_FMT_YUV420P;
+    enc->pix_fmt = sourceFormat != AV_PIX_FMT_NONE && encoderSupports(codec, sourceFormat) ? sourceFormat : fallbackFormat(sourceFormat, par->width, par->height);
     enc->width = par->width;
     enc->height = par->height;
     enc->sample_aspect_ratio = par->sample_aspect_ratio;
@@ -113,6 +123,11 @@ std::unique_ptr<ExportVideoEncoder> ExportVideoEncoder::create(const Options &op
     enc->color_primaries = par->color_primaries;
     enc->color_trc = par->color_trc;
     enc->colorspace = par->color_space;
+    if (enc->pix_fmt != sourceFormat && isRgbFormat(sourceFormat)) {
+        // Converted to YUV on the way in: the stream says which matrix made it.
+        enc->colorspace = kYuvFromRgbColorspace;
+        enc->color_range = kYuvFromRgbRange;
+    }
     enc->chroma_sample_location = par->chroma_location;
     enc->time_base = in->time_base;
     AVRational rate = in->avg_frame_rate.num > 0 && in->avg_frame_rate.den > 0 ? in->avg_frame_rate : in->r_frame_rate;
@@ -188,21 +203,11 @@ StageResult ExportVideoEncoder::Private::emit(AVFrame *frame, std::int64_t sourc
         return std::nullopt; // a repeated or out-of-order timestamp: the frame cannot be placed
     AVFrame *toEncode = frame;
     if (frame->format != encoder->pix_fmt || frame->width != encoder->width || frame->height != encoder->height) {
-        scaler.reset(sws_getCachedContext(scaler.release(), frame->width, frame->height, AVPixelFormat(frame->format),
-                                          encoder->width, encoder->height, encoder->pix_fmt, SWS_BICUBIC,
-                                          nullptr, nullptr, nullptr));
-        if (!scaler)
-            return stageError(kMediaErrorEncodeFailed, QStringLiteral("no conversion from pixel format %1")
+        converted = converter.convert(frame, QSize(encoder->width, encoder->height), encoder->pix_fmt, SWS_BICUBIC);
+        if (!converted)
+            return stageError(kMediaErrorEncodeFailed, QStringLiteral("no conversion of a %1x%2 picture from pixel format %3")
+                                                          .arg(frame->width).arg(frame->height)
                                                           .arg(QString::fromLatin1(av_get_pix_fmt_name(AVPixelFormat(frame->format)))));
-        converted = ff::makeFrame();
-        converted->format = encoder->pix_fmt;
-        converted->width = encoder->width;
-        converted->height = encoder->height;
-        int rc = av_frame_get_buffer(converted.get(), 0);
-        if (rc < 0)
-            return stageError(kMediaErrorUnknown, QStringLiteral("out of memory"), rc);
-        sws_scale(scaler.get(), frame->data, frame->linesize, 0, frame->height, converted->data, converted->linesize);
-        av_frame_copy_props(converted.get(), frame);
         toEncode = converted.get();
     }
     toEncode->pts = pts;

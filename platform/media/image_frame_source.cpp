@@ -393,25 +393,12 @@ ImageFrameSource::Answer ImageFrameSource::deliver(const AVFrame *frame, const R
     const int scaledWidth = quarterTurn ? outHeight : outWidth;
     const int scaledHeight = quarterTurn ? outWidth : outHeight;
     const int flags = scaledWidth * 2 < w ? SWS_AREA : SWS_BILINEAR;
-    SwsContext *scaler = sws_getCachedContext(m_scaler.release(), w, h, AVPixelFormat(frame->format), scaledWidth, scaledHeight,
-                                              AV_PIX_FMT_RGB32, flags, nullptr, nullptr, nullptr);
-    m_scaler.reset(scaler);
-    if (!scaler) {
-        answer.error = sourceError(kMediaErrorDecodeFailed, QStringLiteral("cannot convert a %1x%2 picture of %3").arg(w).arg(h).arg(m_path));
-        return answer;
-    }
-    const int colorspace = frame->colorspace == AVCOL_SPC_UNSPECIFIED || frame->colorspace == AVCOL_SPC_RGB ? SWS_CS_DEFAULT : frame->colorspace;
-    const int *coefficients = sws_getCoefficients(colorspace);
-    sws_setColorspaceDetails(scaler, coefficients, frame->color_range == AVCOL_RANGE_JPEG ? 1 : 0, sws_getCoefficients(SWS_CS_DEFAULT), 1,
-                             0, 1 << 16, 1 << 16);
-    QImage image(scaledWidth, scaledHeight, QImage::Format_RGB32);
+    QImage image = m_converter.toImage(frame, QSize(scaledWidth, scaledHeight), flags);
     if (image.isNull()) {
-        answer.error = sourceError(kMediaErrorUnknown, QStringLiteral("out of memory for a %1x%2 picture").arg(scaledWidth).arg(scaledHeight));
+        answer.error = sourceError(kMediaErrorDecodeFailed, QStringLiteral("cannot convert a %1x%2 picture of %3 to %4x%5")
+                                                                .arg(w).arg(h).arg(m_path).arg(scaledWidth).arg(scaledHeight));
         return answer;
     }
-    uint8_t *dst[4] = {image.bits(), nullptr, nullptr, nullptr};
-    const int dstStride[4] = {int(image.bytesPerLine()), 0, 0, 0};
-    sws_scale(scaler, frame->data, frame->linesize, 0, h, dst, dstStride);
     if (rotation != 0)
         image = image.transformed(QTransform().rotate(rotation));
     answer.image = std::move(image);

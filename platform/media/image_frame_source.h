@@ -9,6 +9,7 @@
 
 #include "platform/error.h"
 #include "platform/media/ffmpeg_ptr.h"
+#include "platform/media/frame_converter.h"
 #include "platform/media/media_asset.h"
 #include "platform/media/media_time.h"
 
@@ -67,7 +68,7 @@ private:
     ff::AVPacketPtr m_packet;
     ff::AVFramePtr m_frame;
     ff::AVFramePtr m_last;           // the last frame decoded, while the decoder is positioned after it
-    ff::SwsContextPtr m_scaler;
+    FrameConverter m_converter;
     AVStream *m_stream = nullptr;
     std::int64_t m_startTicks = 0;
     std::int64_t m_nominalDuration = 1;

@@ -3,6 +3,7 @@
 
 #include "platform/log.h"
 #include "platform/media/ffmpeg_ptr.h"
+#include "platform/media/frame_converter.h"
 #include "platform/media/media_asset.h"
 
 extern "C" {
@@ -81,7 +82,7 @@ struct VideoTrack {
     ff::CodecContextPtr encoder;
     AVStream *stream = nullptr;
     ff::AVFramePtr frame;
-    ff::SwsContextPtr scaler;
+    FrameConverter converter;
     std::int64_t nextPts = 0;
 };
 
@@ -373,19 +374,8 @@ OptionalError MovieWriter::appendVideoFrame(const QImage &image)
             std::memset(frame->data[2] + y * frame->linesize[2], 128, w / 2);
         }
     } else {
-        QImage source = image;
-        const QImage::Format f = source.format();
-        if (f != QImage::Format_RGB32 && f != QImage::Format_ARGB32 && f != QImage::Format_ARGB32_Premultiplied)
-            source = source.convertToFormat(QImage::Format_RGB32);
-        SwsContext *scaler = sws_getCachedContext(video.scaler.release(), source.width(), source.height(), AV_PIX_FMT_RGB32,
-                                                  frame->width, frame->height, AV_PIX_FMT_YUV420P,
-                                                  SWS_BICUBIC, nullptr, nullptr, nullptr);
-        video.scaler.reset(scaler);
-        if (!scaler)
-            return d->fail(writerError(kMediaErrorEncodeFailed, QStringLiteral("cannot convert a %1x%2 picture").arg(source.width()).arg(source.height())));
-        const uint8_t *srcData[4] = {source.constBits(), nullptr, nullptr, nullptr};
-        const int srcStride[4] = {int(source.bytesPerLine()), 0, 0, 0};
-        sws_scale(scaler, srcData, srcStride, 0, source.height(), frame->data, frame->linesize);
+        if (!video.converter.convertImageInto(image, frame, SWS_BICUBIC))
+            return d->fail(writerError(kMediaErrorEncodeFailed, QStringLiteral("cannot convert a %1x%2 picture").arg(image.width()).arg(image.height())));
     }
     frame->pts = video.nextPts++;
     return d->encode(video.encoder.get(), video.stream, frame);

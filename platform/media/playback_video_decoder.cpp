@@ -1,10 +1,12 @@
 #include "platform/media/playback_video_decoder.h"
 
 #include "platform/log.h"
+#include "platform/media/frame_converter.h"
 #include "platform/media/playback_input.h"
 #include "platform/media/playback_log.h"
 
 #include <cmath>
+#include <utility>
 
 namespace zaf::media::playback {
 
@@ -14,42 +16,6 @@ namespace {
 constexpr int kMaxConsecutiveReadRetries = 1000;
 // A stream that keeps failing to decode is given up after this many errors in a row.
 constexpr int kMaxConsecutiveDecodeErrors = 200;
-
-// Converts decoded pictures of any pixel format to 32-bit RGB images.
-class ImageConverter {
-public:
-    QImage convert(const AVFrame *frame)
-    {
-        if (frame->width <= 0 || frame->height <= 0)
-            return {};
-        if (!m_sws || frame->width != m_width || frame->height != m_height || frame->format != m_format) {
-            m_sws.reset(sws_getContext(frame->width, frame->height, AVPixelFormat(frame->format), frame->width,
-                frame->height, AV_PIX_FMT_RGB32, SWS_BILINEAR, nullptr, nullptr, nullptr));
-            m_width = frame->width;
-            m_height = frame->height;
-            m_format = frame->format;
-            if (!m_sws)
-                return {};
-            const int space = frame->colorspace == AVCOL_SPC_BT709 ? SWS_CS_ITU709 : SWS_CS_DEFAULT;
-            const int srcRange = frame->color_range == AVCOL_RANGE_JPEG ? 1 : 0;
-            sws_setColorspaceDetails(m_sws.get(), sws_getCoefficients(space), srcRange,
-                sws_getCoefficients(SWS_CS_DEFAULT), 1, 0, 1 << 16, 1 << 16);
-        }
-        QImage image(frame->width, frame->height, QImage::Format_RGB32);
-        if (image.isNull())
-            return {};
-        uint8_t *dst[4] = {image.bits(), nullptr, nullptr, nullptr};
-        int dstStride[4] = {int(image.bytesPerLine()), 0, 0, 0};
-        sws_scale(m_sws.get(), frame->data, frame->linesize, 0, frame->height, dst, dstStride);
-        return image;
-    }
-
-private:
-    ff::SwsContextPtr m_sws;
-    int m_width = 0;
-    int m_height = 0;
-    int m_format = -1;
-};
 
 } // namespace
 
@@ -123,7 +89,8 @@ void VideoDecoder::run()
         m_failed(QStringLiteral("out of memory"));
         return;
     }
-    ImageConverter converter;
+    FrameConverter converter;
+    bool conversionFailed = false;
 
     enum class Mode { Idle, Seeking, Running };
     Mode mode = Mode::Idle;
@@ -144,9 +111,14 @@ void VideoDecoder::run()
         return lastPtsNs;
     };
     auto deliver = [&](const AVFrame *f, std::int64_t ptsNs, bool seekResult) {
-        QImage image = converter.convert(f);
-        if (image.isNull())
+        QImage image = converter.toImage(f, QSize(f->width, f->height), SWS_BILINEAR);
+        if (image.isNull()) {
+            // Skipped; said once, not for every frame of a stream that cannot be shown.
+            if (!std::exchange(conversionFailed, true))
+                zaf::log::error(lcPlayback(), QStringLiteral("cannot convert a %1x%2 picture of %3 for display")
+                                                  .arg(f->width).arg(f->height).arg(m_path));
             return true;
+        }
         VideoFrame out{std::move(image), ptsNs, current.generation, seekResult};
         if (!m_queue->push(std::move(out), [this] { return m_stop.load() || hasNewerRequest(); }))
             return false;

@@ -10,6 +10,8 @@
 
 #include <gtest/gtest.h>
 
+#include <cmath>
+
 namespace zaf::test {
 namespace {
 
@@ -99,6 +101,35 @@ TEST(ZafMediaJobs, TrimMixAndThumbnailsWriteWhatTheySay)
         EXPECT_TRUE(number >= 0 && number <= i * 30) << i << ": " << number;
     }
 }
+
+// thumbnails of movies with tiny and odd sizes, at heights down to one pixel, write every picture
+// at the height asked (never above the movie's own) with the movie's aspect.
+class ZafMediaTinyThumbnails : public ::testing::TestWithParam<QSize> {};
+
+TEST_P(ZafMediaTinyThumbnails, WriteEveryPictureAtBoundedHeight)
+{
+    const QSize size = GetParam();
+    ScratchDir scratch;
+    for (int height : {38, 2, 1}) {
+        SCOPED_TRACE(height);
+        const QDir thumbs(scratch.file(QStringLiteral("h%1").arg(height)));
+        const ToolRun r = zafMedia(QStringList{QStringLiteral("thumbnails"), sharedFlatColourMovie(size), QStringLiteral("--count"),
+                                               QStringLiteral("3"), QStringLiteral("--height"), QString::number(height),
+                                               QStringLiteral("--out"), thumbs.path()});
+        ASSERT_TRUE(r.ok()) << "exit " << r.exitCode << ": " << r.err.toStdString();
+        const QStringList pngs = thumbs.entryList({QStringLiteral("*.png")}, QDir::Files, QDir::Name);
+        ASSERT_EQ(pngs.size(), 3);
+        const int expectedHeight = std::min(height, size.height());
+        for (const QString &png : pngs) {
+            const QImage image(thumbs.filePath(png));
+            EXPECT_EQ(image.height(), expectedHeight);
+            EXPECT_EQ(image.width(), std::max(1, int(std::lround(double(size.width()) * expectedHeight / size.height()))));
+        }
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Sizes, ZafMediaTinyThumbnails,
+                         ::testing::Values(QSize(2, 2), QSize(3, 3), QSize(4, 4), QSize(6, 4), QSize(15, 15), QSize(16, 16), QSize(641, 361)));
 
 TEST(ZafMediaJobs, FailuresExitNonZeroWithAMessageAndLeaveNoOutput)
 {

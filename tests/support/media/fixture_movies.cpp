@@ -13,6 +13,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <atomic>
 #include <cmath>
 #include <cstring>
@@ -117,6 +118,46 @@ QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape)
                                 shape.rotation, shape.gop);
     const auto found = made.find(key);
     return found != made.end() ? found->second : made[key] = makeFixtureMovie(dir.path(), shape);
+}
+
+QString sharedFlatColourMovie(QSize size, const QString &codec)
+{
+    static QTemporaryDir dir;
+    static std::map<std::tuple<int, int, QString>, QString> made;
+    const auto key = std::tuple(size.width(), size.height(), codec);
+    if (const auto found = made.find(key); found != made.end())
+        return found->second;
+    const QString path = dir.filePath(QStringLiteral("flat-%1x%2-%3.mp4").arg(size.width()).arg(size.height()).arg(codec));
+    const bool even = size.width() % 2 == 0 && size.height() % 2 == 0;
+    const QString format = codec == QLatin1String("libx264rgb") ? QStringLiteral("gbrp") : even ? QStringLiteral("yuv420p") : QStringLiteral("yuv444p");
+    // The colour source only makes even sizes: crop a larger picture down to the size asked for.
+    const QString video = QStringLiteral("color=c=0x%1:size=%2x%3:rate=30,crop=%4:%5:0:0,format=%6")
+                              .arg(kFlatColour & 0xffffff, 6, 16, QLatin1Char('0'))
+                              .arg(size.width() + 2 - size.width() % 2)
+                              .arg(size.height() + 2 - size.height() % 2)
+                              .arg(size.width())
+                              .arg(size.height())
+                              .arg(format);
+    if (!ffmpeg(QStringList{QStringLiteral("-f"), QStringLiteral("lavfi"), QStringLiteral("-i"), video}
+                + words("-f lavfi -i sine=frequency=440:sample_rate=48000 -t 1 -map 0:v -map 1:a -c:a aac -c:v")
+                << codec << path))
+        return {};
+    return made[key] = path;
+}
+
+int largestColourDistance(const QImage &image, QRgb colour)
+{
+    if (image.isNull())
+        return 256;
+    int largest = 0;
+    for (int y = 0; y < image.height(); ++y) {
+        for (int x = 0; x < image.width(); ++x) {
+            const QRgb p = image.pixel(x, y);
+            largest = std::max({largest, std::abs(qRed(p) - qRed(colour)), std::abs(qGreen(p) - qGreen(colour)),
+                                std::abs(qBlue(p) - qBlue(colour))});
+        }
+    }
+    return largest;
 }
 
 QList<int> readFrameNumbers(const QString &moviePath)

@@ -10,6 +10,7 @@
 #include "tools/fixture/fixture_movie.h"
 
 #include <QImage>
+#include <QSize>
 #include <QJsonObject>
 #include <QList>
 #include <QString>
@@ -23,6 +24,17 @@ namespace zaf::test {
 QString makeFixtureMovie(const QString &dir, const zaf::fixture::FixtureSpec &shape = {});
 // A fixture movie made once per process for `shape` and shared by every test that asks for it.
 QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape);
+
+// The colour of every pixel of a flat-colour movie.
+inline constexpr QRgb kFlatColour = 0xff3366cc;
+// A 1 s, 30 fps movie of one flat colour and any size, odd and tiny ones included (our writer and
+// the fixture tool need even sides), with one audio tone, made by the ffmpeg tool once per process
+// per shape. "libx264" stores 4:2:0 when both sides are even and 4:4:4 otherwise; "libx264rgb"
+// stores planar RGB, a format that has to be converted for our H.264 encoder.
+QString sharedFlatColourMovie(QSize size, const QString &codec = QStringLiteral("libx264"));
+// The largest difference of any colour channel between any pixel of `image` and `colour`
+// (256 for a null image).
+int largestColourDistance(const QImage &image, QRgb colour);
 
 // The number shown by every frame of the first video stream, in presentation order, as displayed
 // (the display rotation applied). -1 for a frame without a readable number.

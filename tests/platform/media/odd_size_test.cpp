@@ -1,0 +1,160 @@
+// Movies with tiny and odd picture sizes through every place that converts or scales pictures:
+// thumbnails at any height (rotation included), the player's first picture and its layer, and trim
+// and mix exports. Each must keep the size and colour of the movie and never write past a picture.
+#include "platform/media/export_session.h"
+#include "platform/media/image_generator.h"
+#include "platform/media/player.h"
+#include "platform/media/player_layer.h"
+#include "tests/support/media/fixture_movies.h"
+#include "tests/support/temp_dir.h"
+#include "tests/support/wait_until.h"
+
+#include <QUrl>
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <condition_variable>
+#include <mutex>
+
+namespace zaf::media {
+namespace {
+
+using namespace zaf::test;
+
+// Flat-colour pictures come back within this distance per channel (YUV rounding).
+constexpr int kColourTolerance = 12;
+
+struct OddShape {
+    QSize size;                 // coded
+    int rotation = 0;           // non-zero: written by our fixture writer, which stores rotations
+    const char *codec = "libx264";
+};
+
+void PrintTo(const OddShape &shape, std::ostream *os)
+{
+    *os << shape.size.width() << "x" << shape.size.height() << " " << shape.codec << " r" << shape.rotation;
+}
+
+class OddSizeMovieTest : public ::testing::TestWithParam<OddShape> {
+protected:
+    bool flat() const { return GetParam().rotation == 0; }
+    QString movie() const
+    {
+        const OddShape &shape = GetParam();
+        if (flat())
+            return sharedFlatColourMovie(shape.size, QString::fromLatin1(shape.codec));
+        return sharedFixtureMovie({.seconds = 1, .width = shape.size.width(), .height = shape.size.height(), .rotation = shape.rotation});
+    }
+    std::shared_ptr<MediaAsset> asset(const QString &path) const { return MediaAsset::assetWithURL(QUrl::fromLocalFile(path)); }
+
+    // Runs an export of the movie to its end; the output's path, "" when it did not complete.
+    QString exported(const QString &name, const std::function<void(ExportSession &)> &configure)
+    {
+        auto session = ExportSession::exportSessionWithAsset(asset(movie()), QString::fromLatin1(kExportPresetHighestQuality));
+        const QString output = m_scratch.file(name);
+        session->setOutputURL(QUrl::fromLocalFile(output));
+        session->setOutputFileType(QString::fromLatin1(kFileTypeMPEG4));
+        configure(*session);
+        std::mutex mutex;
+        std::condition_variable done;
+        bool finished = false;
+        session->exportAsynchronously([&] {
+            std::lock_guard lock(mutex);
+            finished = true;
+            done.notify_all();
+        });
+        std::unique_lock lock(mutex);
+        EXPECT_TRUE(done.wait_for(lock, std::chrono::seconds(120), [&] { return finished; }));
+        EXPECT_EQ(session->status(), ExportStatus::Completed) << (session->error() ? qPrintable(session->error()->description()) : "");
+        return session->status() == ExportStatus::Completed ? output : QString();
+    }
+
+    ScratchDir m_scratch;
+};
+
+// Thumbnails keep the upright aspect at every maximum height down to one pixel, never scale up,
+// and show the movie's colour; without the transform they come at the coded size.
+TEST_P(OddSizeMovieTest, ThumbnailsAtAnyHeightHaveTheBoundedUprightSizeAndTheColour)
+{
+    const OddShape &shape = GetParam();
+    auto generator = ImageGenerator::imageGeneratorWithAsset(asset(movie()));
+    const QSize upright = shape.rotation % 180 ? shape.size.transposed() : shape.size;
+    for (int height : {0, 38, 76, 2, 1}) {
+        SCOPED_TRACE(height);
+        generator->setMaximumSize(QSize(0, height));
+        const double scale = height > 0 ? std::min(1.0, double(height) / upright.height()) : 1.0;
+        const QSize expected(std::max(1, int(std::lround(upright.width() * scale))), std::max(1, int(std::lround(upright.height() * scale))));
+        zaf::OptionalError error;
+        const QImage image = generator->copyImageAtTime(MediaTime::make(1, 2), nullptr, &error);
+        ASSERT_FALSE(error) << qPrintable(error->description());
+        EXPECT_EQ(image.size(), expected);
+        if (flat()) {
+            EXPECT_LE(largestColourDistance(image, kFlatColour), kColourTolerance);
+        }
+    }
+    generator->setMaximumSize(QSize());
+    generator->setAppliesPreferredTrackTransform(false);
+    EXPECT_EQ(generator->copyImageAtTime(MediaTime::zero(), nullptr, nullptr).size(), shape.size);
+}
+
+// The player shows the first picture at its coded size and colour, and its layer paints it.
+TEST_P(OddSizeMovieTest, PlayerShowsFirstPictureAndLayerPaintsIt)
+{
+    auto item = std::make_shared<PlayerItem>(asset(movie()));
+    Player player(item);
+    player.setTimeSource(std::make_shared<ManualTimeSource>());
+    PlayerLayer layer;
+    layer.resize(120, 90);
+    layer.setPlayer(&player);
+    ASSERT_TRUE(waitUntil([&] { return !player.currentVideoFrame().isNull(); }));
+    const QImage picture = player.currentVideoFrame();
+    EXPECT_EQ(picture.size(), GetParam().size);
+    if (flat()) {
+        EXPECT_LE(largestColourDistance(picture, kFlatColour), kColourTolerance);
+    }
+    EXPECT_FALSE(layer.videoRect().isEmpty());
+    const QImage shot = layer.grab().toImage().convertToFormat(QImage::Format_RGB32);
+    if (flat()) {
+        const QPointF centre = layer.videoRect().center() * shot.devicePixelRatio();
+        EXPECT_LE(largestColourDistance(shot.copy(QRect(centre.toPoint(), QSize(1, 1))), kFlatColour), kColourTolerance);
+    }
+}
+
+// A trim (cut frames re-encoded, converted where the encoder needs another format) and a mix keep
+// the coded size, the rotation and the colour.
+TEST_P(OddSizeMovieTest, TrimAndMixKeepSizeRotationAndColour)
+{
+    const OddShape &shape = GetParam();
+    const QString trimmed = exported(QStringLiteral("trim.mp4"), [](ExportSession &session) {
+        session.setTimeRange(MediaTimeRange{MediaTime::make(1, 5), MediaTime::make(3, 5)});
+    });
+    const QString mixed = exported(QStringLiteral("mix.mp4"), [&](ExportSession &session) {
+        AudioMix mix;
+        for (const AssetTrack &track : asset(movie())->tracksWithMediaType(MediaType::Audio))
+            mix.inputParameters.append(AudioMixInputParameters{track.trackID});
+        session.setAudioMix(mix);
+    });
+    for (const QString &output : {trimmed, mixed}) {
+        SCOPED_TRACE(output.toStdString());
+        const QList<QJsonObject> video = probeStreams(output, QStringLiteral("video"));
+        ASSERT_EQ(video.size(), 1);
+        EXPECT_EQ(QSize(video[0]["width"].toInt(), video[0]["height"].toInt()), shape.size);
+        EXPECT_EQ(probeRotation(video[0]), shape.rotation);
+        EXPECT_EQ(probeStreams(output, QStringLiteral("audio")).size(), 1);
+        if (flat()) {
+            auto generator = ImageGenerator::imageGeneratorWithAsset(asset(output));
+            EXPECT_LE(largestColourDistance(generator->copyImageAtTime(MediaTime::zero(), nullptr, nullptr), kFlatColour), kColourTolerance);
+        }
+    }
+    EXPECT_NEAR(countVideoFrames(trimmed), 18, 1);
+}
+
+INSTANTIATE_TEST_SUITE_P(TinyAndOddSizes, OddSizeMovieTest,
+                         ::testing::Values(OddShape{{2, 2}}, OddShape{{3, 3}}, OddShape{{4, 4}}, OddShape{{6, 4}}, OddShape{{14, 14}},
+                                           OddShape{{15, 15}}, OddShape{{16, 16}}, OddShape{{641, 361}},
+                                           OddShape{{4, 4}, 0, "libx264rgb"}, OddShape{{15, 15}, 0, "libx264rgb"},
+                                           OddShape{{4, 4}, 90}, OddShape{{6, 2}, 270}, OddShape{{2, 2}, 90}));
+
+} // namespace
+} // namespace zaf::media
