@@ -13,7 +13,7 @@
 #include "platform/ui/backdrop_view.h"
 #include "platform/ui/bar_button_item.h"
 #include "platform/ui/layout_rules.h"
-#include "platform/ui/screen.h"
+#include "platform/ui/autoresizing.h"
 #include "platform/ui/tap_gesture_recognizer.h"
 #include "platform/ui/toolbar.h"
 #include "platform/ui/view_animation.h"
@@ -95,14 +95,17 @@ ZafVideoEditorViewController::ZafVideoEditorViewController(const QString &bundle
     auto *tap = new TapGestureRecognizer(this, "handleSingleTap", this);
     tap->attachToView(m_videoOverlay);
 
-    // The large play button keeps its size and is centred on the screen, not on the editor's view.
+    // The large play button keeps its size and sits in the middle of the editor's view. On a desktop
+    // the window is the screen the editor has: centred on the monitor, the button would land off
+    // the video, or outside a small window. Flexible margins keep it in the middle as the window is
+    // resized, whichever variant the factory chose.
     m_videoOverlayPlayButton = ZafVideoOverlayButtonFactory::_srVideoOverlayButtonWithStyle(kOverlayPlayButtonStyle);
     QWidget *overlayButton = m_videoOverlayPlayButton->widget();
     overlayButton->setParent(root);
-    const QRectF screen = Screen::mainScreenBounds();
-    overlayButton->move(QPointF(screen.width() * 0.5 - overlayButton->width() * 0.5,
-                                screen.height() * 0.5 - overlayButton->height() * 0.5)
+    overlayButton->move(QPointF(root->width() * 0.5 - overlayButton->width() * 0.5,
+                                root->height() * 0.5 - overlayButton->height() * 0.5)
                             .toPoint());
+    zaf::ui::setAutoresizingMask(overlayButton, zaf::ui::kFlexibleMargins);
     m_videoOverlayPlayButton->setTargetAction(this, "playAction");
     overlayButton->setToolTip(tr("Play (Space)"));
 

@@ -3,6 +3,7 @@
 #include "overlay/overlay_image_button.h"
 #include "overlay/overlay_images.h"
 #include "overlay/video_overlay_constants.h"
+#include "platform/ui/autoresizing.h"
 #include "platform/ui/backdrop_view.h"
 
 #include <QCoreApplication>
@@ -46,6 +47,9 @@ ZafHighFidelityVideoOverlayButton::ZafHighFidelityVideoOverlayButton(std::int64_
     connect(_button, &zaf::overlay::OverlayImageButton::touchDragOutside, this,
             &ZafHighFidelityVideoOverlayButton::_playButtonDeactivate);
     setAttribute(Qt::WA_NoMousePropagation);
+
+    // The size stays; the position follows the container.
+    zaf::ui::setAutoresizingMask(this, zaf::ui::kFlexibleMargins);
 
     if (style == 0) {
         const QImage background = zaf::overlay::imageNamed(QLatin1String(ZafVideoOverlayBackgroundMaskImageName));

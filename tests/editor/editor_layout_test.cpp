@@ -4,7 +4,6 @@
 
 #include "overlay/video_overlay_button.h"
 #include "platform/ui/backdrop_view.h"
-#include "platform/ui/screen.h"
 #include "platform/ui/view_animation.h"
 
 namespace zaf::test {
@@ -75,14 +74,27 @@ TEST_F(EditorTest, RotationMovesTheTimelineAndRebuildsTheItemsForTheNewLayout)
     EXPECT_EQ(itemNames(*editor, editor->bottomToolBar()), words("flex play flex"));
 }
 
-TEST_F(EditorTest, OverlayPlayButtonIsCentredOnTheScreenNotTheView)
+// On a desktop the editor's window is its screen: the button sits in the middle of the view,
+// whatever the monitor's size, and stays there as the window is resized.
+TEST_F(EditorTest, OverlayPlayButtonIsCentredInTheViewAndStaysCentredOnResize)
 {
-    auto editor = makeEditor(noMovie(), QRectF(0, 0, 300, 200));
-    const QRectF screen = ui::Screen::mainScreenBounds();
+    auto editor = makeEditor(noMovie(), QRectF(0, 0, 1280, 720));
+    editor->view()->show();
     QWidget *button = editor->videoOverlayPlayButton()->widget();
-    EXPECT_EQ(button->pos(), QPointF(screen.width() * 0.5 - button->width() * 0.5,
-                                     screen.height() * 0.5 - button->height() * 0.5).toPoint());
     EXPECT_EQ(button->parentWidget(), editor->view());
+    auto expectCentred = [&](int width, int height) {
+        EXPECT_NEAR(button->geometry().center().x(), width / 2, 1) << width << "x" << height;
+        EXPECT_NEAR(button->geometry().center().y(), height / 2, 1) << width << "x" << height;
+    };
+    expectCentred(1280, 720);
+    editor->view()->resize(1000, 500);
+    expectCentred(1000, 500);
+    rotate(*editor, 400, 700);
+    expectCentred(400, 700);
+    for (int i = 0; i < 20; ++i)
+        editor->view()->resize(401 + i * 37, 301 + i * 23);
+    editor->view()->resize(1280, 720);
+    expectCentred(1280, 720);
 }
 
 TEST_F(EditorTest, ShortInitializerLeavesTheFrameAndTintGoesToTheTopToolbarOnly)

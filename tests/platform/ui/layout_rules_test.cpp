@@ -1,5 +1,7 @@
 // LayoutRules: the timeline container's two arrangements (above the bottom toolbar, or on the view's
 // bottom edge), switching between them, retiring rules and rules whose second item left the view.
+// Autoresizing: how a view follows its container's size changes.
+#include "platform/ui/autoresizing.h"
 #include "platform/ui/layout_rules.h"
 #include "platform/ui/view_animation.h"
 
@@ -154,6 +156,57 @@ TEST(LayoutRulesTest, ItemInsideANestedParentIsPlacedInViewCoordinates)
                      {item, A::Height, nullptr, A::Leading, 1, 10, {}}});
     rules->layoutIfNeeded();
     EXPECT_EQ(item->geometry(), QRect(10, 20, 10, 10));
+}
+
+// A 40x20 view at (30, 40) in a 200x100 container, which then becomes 300x200.
+struct AutoresizingCase {
+    const char *name;
+    AutoresizingMask mask;
+    QRect after;
+};
+
+class AutoresizingTest : public ::testing::TestWithParam<AutoresizingCase> {};
+
+TEST_P(AutoresizingTest, FlexiblePartsShareTheContainersChangeInProportion)
+{
+    QWidget container;
+    container.resize(200, 100);
+    auto *view = new QWidget;
+    view->setGeometry(30, 40, 40, 20);
+    setAutoresizingMask(view, GetParam().mask);
+    view->setParent(&container); // follows the container it is put in afterwards
+    container.show();
+    container.resize(300, 200);
+    EXPECT_EQ(view->geometry(), GetParam().after);
+    EXPECT_EQ(autoresizingMask(view), GetParam().mask);
+}
+
+using R = Autoresizing;
+INSTANTIATE_TEST_SUITE_P(Masks, AutoresizingTest, ::testing::Values(
+    AutoresizingCase{"None", R::None, QRect(30, 40, 40, 20)},
+    // Margins 30 and 130 share +100 as 30:130; 40 and 40 share +100 equally.
+    AutoresizingCase{"FlexibleMargins", kFlexibleMargins, QRect(49, 90, 40, 20)},
+    AutoresizingCase{"FlexibleWidthAlone", R::FlexibleWidth, QRect(30, 40, 140, 20)},
+    AutoresizingCase{"FlexibleLeftAndHeight", R::FlexibleLeftMargin | R::FlexibleHeight, QRect(130, 40, 40, 120)},
+    AutoresizingCase{"FlexibleRightAndBottom", R::FlexibleRightMargin | R::FlexibleBottomMargin, QRect(30, 40, 40, 20)}),
+    [](const ::testing::TestParamInfo<AutoresizingCase> &info) { return std::string(info.param.name); });
+
+TEST(AutoresizingTest, ACentredViewStaysCentredOverManyResizesAndAfterItsOwnerMovesIt)
+{
+    QWidget container;
+    container.resize(201, 101);
+    auto *view = new QWidget(&container);
+    view->setGeometry(80, 40, 41, 21);
+    setAutoresizingMask(view, kFlexibleMargins);
+    container.show();
+    for (int i = 0; i < 50; ++i)
+        container.resize(203 + i * 17 % 400, 97 + i * 13 % 300);
+    container.resize(1001, 601);
+    EXPECT_EQ(view->geometry().center(), QPoint(500, 300));
+
+    view->move(0, 0); // its owner's word counts from now on
+    container.resize(2001, 601);
+    EXPECT_EQ(view->geometry().topLeft(), QPoint(0, 0));
 }
 
 } // namespace
