@@ -4,7 +4,9 @@
 #include "platform/ui/activity_indicator.h"
 #include "platform/ui/view_animation.h"
 
+#include <QDialogButtonBox>
 #include <QLabel>
+#include <QPushButton>
 #include <QPainter>
 #include <QPalette>
 #include <QProgressBar>
@@ -77,6 +79,8 @@ void ZafYouTubeActivityProgressOverlay::setupOverlayAnimated(bool)
     zaf::ui::addSubview(this, dimming);
     m_dimmingView = dimming;
 
+    createCancelButton();
+
     zaf::ui::setAlpha(this, 0.0);
     QPointer<ZafYouTubeActivityProgressOverlay> self(this);
     fadeTo(1.0, [self] {
@@ -87,6 +91,7 @@ void ZafYouTubeActivityProgressOverlay::setupOverlayAnimated(bool)
 
 void ZafYouTubeActivityProgressOverlay::tearDownOverlayAnimated(bool)
 {
+    hideCancelButton();
     if (m_activityIndicator)
         zaf::ui::removeFromSuperview(m_activityIndicator);
     QPointer<ZafYouTubeActivityProgressOverlay> self(this);
@@ -98,8 +103,34 @@ void ZafYouTubeActivityProgressOverlay::tearDownOverlayAnimated(bool)
 
 void ZafYouTubeActivityProgressOverlay::stopActivity()
 {
+    // Publishing has ended: what follows is the result alert's to decide.
+    hideCancelButton();
     if (m_activityIndicator)
         zaf::ui::removeFromSuperview(m_activityIndicator);
+}
+
+void ZafYouTubeActivityProgressOverlay::createCancelButton()
+{
+    if (m_cancelButton) {
+        m_cancelButton->show();
+        m_cancelButton->raise();
+        return;
+    }
+    // Qt's standard Cancel button, with its translated text.
+    QDialogButtonBox standard(QDialogButtonBox::Cancel);
+    auto *button = new QPushButton(standard.button(QDialogButtonBox::Cancel)->text(), this);
+    button->setObjectName(QStringLiteral("progressOverlayCancel"));
+    button->adjustSize();
+    button->move(int(std::lround(width() / 2.0 - button->width() / 2.0)), height() / 2 + kCancelButtonOffset);
+    connect(button, &QPushButton::clicked, this, &ZafYouTubeActivityProgressOverlay::cancelRequested);
+    zaf::ui::addSubview(this, button);
+    m_cancelButton = button;
+}
+
+void ZafYouTubeActivityProgressOverlay::hideCancelButton()
+{
+    if (m_cancelButton)
+        m_cancelButton->hide();
 }
 
 void ZafYouTubeActivityProgressOverlay::fadeTo(double alpha, std::function<void()> completion)
@@ -159,13 +190,17 @@ void ZafYouTubeActivityProgressOverlay::createActivityIndicator()
     }
     const int panelWidth = std::max(indicator->width(), kProgressBarWidth) + 2 * kProgressPanelPadding;
     const int panelTop = indicator->geometry().top() - kProgressPanelPadding;
-    const int panelBottom = m_progressLabel->geometry().bottom() + 1 + kProgressPanelPadding / 2;
+    int panelBottom = m_progressLabel->geometry().bottom() + 1 + kProgressPanelPadding / 2;
+    if (m_cancelButton)
+        panelBottom = std::max(panelBottom, m_cancelButton->geometry().bottom() + 1 + kProgressPanelPadding / 2);
     m_progressPanel->setGeometry(int(std::lround(centre.x() - panelWidth / 2.0)), panelTop, panelWidth,
                                  panelBottom - panelTop);
     zaf::ui::addSubview(this, m_progressPanel);
     zaf::ui::addSubview(this, m_progressBar);
     zaf::ui::addSubview(this, m_progressLabel);
     m_progressPanel->stackUnder(indicator);
+    if (m_cancelButton)
+        m_cancelButton->raise();
     applyProgress();
 
     // The fade-in was cut short by hiding: the indicator exists, but hiding asked for it to be gone.

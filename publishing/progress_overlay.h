@@ -10,9 +10,14 @@
 // Hiding takes the indicator away, fades the overlay out and then removes the overlay from its
 // parent. The dimming layer takes the overlay's size at set-up; the indicator and the progress
 // display are centred on the overlay's bounds when they are created. Main thread only.
+//
+// The overlay covers the form's own Cancel, so it carries a Cancel button of its own, under the
+// progress, from set-up until stopActivity() or hiding: pressing it emits cancelRequested(), and
+// the publishing flow cancels as the form's Cancel does.
 
 #include "platform/ui/activity_indicator.h"
 
+#include <QAbstractButton>
 #include <QLabel>
 #include <QPointer>
 #include <QProgressBar>
@@ -58,6 +63,14 @@ public:
 
     // The dimming child made at set-up; null before.
     QWidget *dimmingView() const { return m_dimmingView; }
+    // The Cancel button made at set-up (null before); hidden once the activity stops.
+    QAbstractButton *cancelButton() const { return m_cancelButton; }
+
+Q_SIGNALS:
+    // Main thread: the overlay's Cancel was pressed.
+    void cancelRequested();
+
+public:
 
     static constexpr double kFadeSeconds = 0.2;
     static constexpr double kDimmingAlpha = 0.5;
@@ -66,6 +79,8 @@ public:
     static constexpr int kProgressBarWidth = 120;
     static constexpr int kProgressBarHeight = 4;
     static constexpr int kProgressPanelPadding = 16;
+    // From the overlay's centre down to the top of the Cancel button, in points.
+    static constexpr int kCancelButtonOffset = 64;
 
 private:
     // Fades the overlay to `alpha` over kFadeSeconds, then runs `completion`. A fade started while
@@ -73,6 +88,8 @@ private:
     void fadeTo(double alpha, std::function<void()> completion);
     void finishPendingFade();
     void createActivityIndicator();
+    void createCancelButton();
+    void hideCancelButton();
     void applyProgress();
 
     bool m_isShowing = false;
@@ -82,6 +99,7 @@ private:
     QPointer<QWidget> m_progressPanel;   // the rounded backing behind indicator, bar and text
     QPointer<QProgressBar> m_progressBar;
     QPointer<QLabel> m_progressLabel;
+    QPointer<QAbstractButton> m_cancelButton;
     QTimer m_fadeTimer;
     std::function<void()> m_fadeCompletion;
 };

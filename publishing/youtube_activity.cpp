@@ -484,10 +484,24 @@ void ZafYouTubeActivity::showProgressOverlay()
         return;
     }
     auto *overlay = new ZafYouTubeActivityProgressOverlay(host->rect(), host);
+    // The overlay covers the form's Cancel: its own Cancel does the same.
+    connect(overlay, &ZafYouTubeActivityProgressOverlay::cancelRequested, this, &ZafYouTubeActivity::cancelFromOverlay);
     overlay->raise();
     overlay->show();
     m_progressOverlay = overlay;
     overlay->setShowingAnimated(true, true);
+}
+
+void ZafYouTubeActivity::cancelFromOverlay()
+{
+    ZafPublishingAgent *agent = m_publishingAgent.get();
+    if (!agent)
+        return;
+    // The agent's Cancel stops its sign-in or upload and then reports the Cancel to us.
+    if (!QMetaObject::invokeMethod(agent, "cancelAction")) {
+        zaf::log::error(lcYouTubeActivity(), QStringLiteral("ZafYouTubeActivity: the publishing agent has no cancelAction"));
+        publishingAgentCancelButtonClicked(agent);
+    }
 }
 
 void ZafYouTubeActivity::removeMovieCopy() const

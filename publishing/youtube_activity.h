@@ -24,7 +24,9 @@
 // delegate: Cancel ends the action as not completed; publishing covers the form with the progress
 // overlay and ends with a result alert; both remove the copy. The Publish button is routed through
 // the activity so that an upload never starts before the copy's export has finished: while the
-// export runs the overlay is shown, and a failed export ends with the failure alert.
+// export runs the overlay is shown, and a failed export ends with the failure alert. The overlay's
+// own Cancel (the form's is under it) cancels through the agent: during the wait for the copy, the
+// sign-in and the upload.
 
 #include "platform/error.h"
 #include "platform/ui/share_activity.h"
@@ -129,6 +131,8 @@ private:
     void exportDidEnd(const zaf::media::ExportSession *session);
     void startPublishing();
     void showProgressOverlay();
+    // The overlay's Cancel: cancels through the agent, as the form's Cancel does.
+    void cancelFromOverlay();
     void removeMovieCopy() const;
 
     // The movie among the items (see the header comment), or an empty URL.

@@ -11,6 +11,7 @@
 #include <QOAuth2AuthorizationCodeFlow>
 #include <QOAuthHttpServerReplyHandler>
 #include <QPushButton>
+#include <QTimer>
 #include <QVBoxLayout>
 
 namespace {
@@ -18,7 +19,7 @@ namespace {
 Q_LOGGING_CATEGORY(lcPublishingAgent, "zaf.publishing.agent")
 
 constexpr const char *kAgentErrorDomain = "zaf.publishing.agent";
-enum AgentErrorCode { NoClientIdError = 1, AuthorizationError = 2, NoMediaError = 3 };
+enum AgentErrorCode { NoClientIdError = 1, AuthorizationError = 2, NoMediaError = 3, SignInTimeoutError = 4 };
 
 constexpr const char *kDefaultApiBase = "https://www.googleapis.com";
 constexpr const char *kAuthorizationUrl = "https://accounts.google.com/o/oauth2/auth";
@@ -68,8 +69,11 @@ ZafYouTubePublishingAgent::ZafYouTubePublishingAgent(QObject *parent)
     : ZafPublishingAgent(parent),
       m_navigation(new ZafYouTubeNavigationController(this)),
       m_form(new ZafYouTubePublishingForm(this)),
-      m_network(new QNetworkAccessManager(this))
+      m_network(new QNetworkAccessManager(this)),
+      m_signInTimer(new QTimer(this))
 {
+    m_signInTimer->setSingleShot(true);
+    connect(m_signInTimer, &QTimer::timeout, this, &ZafYouTubePublishingAgent::signInTimedOut);
     m_navigation->addChildViewController(m_form);
     m_navigation->didMoveToParentViewController(m_navigation);
 
@@ -106,8 +110,15 @@ zaf::ui::ViewController *ZafYouTubePublishingAgent::navigationController()
 
 void ZafYouTubePublishingAgent::cancelAction()
 {
+    // Publishing ends here, quietly: the delegate hears the Cancel, not an end of publishing.
+    const bool wasPublishing = m_publishing || m_awaitingDelegate;
+    m_publishing = false;
+    m_awaitingDelegate = false;
+    abandonSignIn();
     if (m_upload && m_upload->isRunning())
         m_upload->cancel();
+    if (wasPublishing)
+        m_publishItem->setEnabled(true);
     if (m_delegate)
         m_delegate->publishingAgentCancelButtonClicked(this);
 }
@@ -188,6 +199,7 @@ void ZafYouTubePublishingAgent::authorizeAndUpload()
                 zaf::log::error(lcPublishingAgent(), QStringLiteral("Could not open the browser for authorization"));
         });
         connect(m_oauth, &QOAuth2AuthorizationCodeFlow::granted, this, [this] {
+            m_signInTimer->stop();
             if (m_publishing && !(m_upload && m_upload->isRunning()))
                 startUpload(m_oauth->token());
         });
@@ -195,16 +207,43 @@ void ZafYouTubePublishingAgent::authorizeAndUpload()
                 [this](const QString &error, const QString &description, const QUrl &) {
                     if (!m_publishing || (m_upload && m_upload->isRunning()))
                         return;
+                    abandonSignIn();
                     finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), AuthorizationError,
                                                 QStringLiteral("Authorization failed: %1 %2").arg(error, description)});
                 });
         if (!replyHandler->isListening()) {
+            abandonSignIn();
             finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), AuthorizationError,
                                         QStringLiteral("Could not listen on 127.0.0.1 for the authorization reply.")});
             return;
         }
     }
+    m_signInTimer->start(m_signInTimeoutMs);
     m_oauth->grant();
+}
+
+void ZafYouTubePublishingAgent::abandonSignIn()
+{
+    m_signInTimer->stop();
+    // A flow that has its token is a finished sign-in, kept for the next upload.
+    if (!m_oauth || !m_oauth->token().isEmpty())
+        return;
+    // The loopback listener closes now; a browser that comes back later finds nobody there.
+    if (auto *handler = qobject_cast<QOAuthHttpServerReplyHandler *>(m_oauth->replyHandler()))
+        handler->close();
+    m_oauth->disconnect(this);
+    m_oauth->deleteLater();
+    m_oauth = nullptr;
+}
+
+void ZafYouTubePublishingAgent::signInTimedOut()
+{
+    if (!m_publishing || !m_oauth)
+        return;
+    abandonSignIn();
+    finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), SignInTimeoutError,
+                                QStringLiteral("The sign-in in the browser did not finish within %1 seconds.")
+                                    .arg(m_signInTimeoutMs / 1000.0)});
 }
 
 void ZafYouTubePublishingAgent::startUpload(const QString &accessToken)

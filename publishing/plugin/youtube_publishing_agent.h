@@ -9,6 +9,11 @@
 // id, publishing ends at once with an error. Tokens are kept in memory only. The service's base URL
 // is $ZAF_YOUTUBE_API_BASE (default https://www.googleapis.com).
 //
+// The browser sign-in is given signInTimeoutMs (five minutes unless set otherwise): a sign-in the
+// person abandons in the browser then ends publishing with an error, and its loopback listener is
+// closed. Cancel works at any time: during the sign-in and the upload it stops them, and the agent
+// reports only the Cancel (no end of publishing); a sign-in answer that arrives afterwards is ignored.
+//
 // Delegate callbacks, in order: WillBeDisplayed when the navigation view appears; Cancel/Done as the
 // buttons are pressed; DidBeginPublishing when Publish starts; DidEndPublishingError once when the
 // upload (or the authorization before it) ends. Main thread only.
@@ -22,6 +27,7 @@
 
 class QNetworkAccessManager;
 class QOAuth2AuthorizationCodeFlow;
+class QTimer;
 class ZafYouTubePublishingForm;
 
 namespace zaf::ui {
@@ -50,7 +56,11 @@ private:
 
 class ZafYouTubePublishingAgent : public ZafPublishingAgent {
     Q_OBJECT
+    // How long the browser sign-in may take, in milliseconds; set before publishing.
+    Q_PROPERTY(int signInTimeoutMs READ signInTimeoutMs WRITE setSignInTimeoutMs)
 public:
+    static constexpr int kDefaultSignInTimeoutMs = 5 * 60 * 1000;
+
     Q_INVOKABLE explicit ZafYouTubePublishingAgent(QObject *parent = nullptr);
     ~ZafYouTubePublishingAgent() override;
 
@@ -63,6 +73,8 @@ public:
     bool isPublishing() const { return m_publishing; }
     // The upload's chunk size (tests use small chunks).
     void setChunkSize(qint64 bytes) { m_chunkSize = bytes; }
+    int signInTimeoutMs() const { return m_signInTimeoutMs; }
+    void setSignInTimeoutMs(int milliseconds) { m_signInTimeoutMs = qMax(1, milliseconds); }
 
 public Q_SLOTS:
     void cancelAction();
@@ -74,6 +86,10 @@ private:
     void startUpload(const QString &accessToken);
     void authorizeAndUpload();
     void finishPublishing(const zaf::OptionalError &error);
+    // Drops a running browser sign-in: its flow, its loopback listener and its time limit.
+    void abandonSignIn();
+    // Runs on the main thread when the sign-in has not finished within signInTimeoutMs.
+    void signInTimedOut();
 
     ZafPublishingAgentDelegate *m_delegate = nullptr;
     QString m_mediaPath;
@@ -84,6 +100,8 @@ private:
     QNetworkAccessManager *m_network;
     zaf::publishing::ResumableUpload *m_upload = nullptr;
     QOAuth2AuthorizationCodeFlow *m_oauth = nullptr;
+    QTimer *m_signInTimer;
+    int m_signInTimeoutMs = kDefaultSignInTimeoutMs;
     qint64 m_chunkSize = zaf::publishing::ResumableUpload::kDefaultChunkSize;
     void beginPublishing();
     bool m_publishing = false;

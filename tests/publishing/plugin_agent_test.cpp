@@ -4,7 +4,9 @@
 #include "publishing/plugin_loader.h"
 #include "publishing/publishing_agent.h"
 #include "publishing/youtube_activity.h"
+#include "tests/publishing/sign_in_support.h"
 #include "tests/support/temp_dir.h"
+#include "tests/support/wait_until.h"
 
 #include <gtest/gtest.h>
 
@@ -185,6 +187,35 @@ TEST_F(PublishingAgentTest, WithoutTokenOrClientIdPublishingEndsAtOnceWithAnErro
     EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("begin"), QStringLiteral("end")}));
     ASSERT_TRUE(m_delegate.error.has_value());
     EXPECT_TRUE(m_delegate.error->message.contains(QLatin1String("ZAF_YOUTUBE_CLIENT_ID")));
+}
+
+// The browser sign-in: Cancel during it ends it quietly (no end of publishing, even after the time
+// limit, its loopback listener closed) and a new Publish signs in afresh; a sign-in abandoned in the
+// browser ends publishing with an error after the agent's limit and closes its listener too.
+TEST_F(PublishingAgentTest, CancelEndsASignInQuietlyAndAnAbandonedOneEndsAfterItsLimit)
+{
+    zaf::test::SignInEnvironment signIn;
+    m_agent->setMediaPath(QStringLiteral("/nonexistent/movie.mp4"));
+    EXPECT_TRUE(m_agent->setProperty("signInTimeoutMs", 100)) << "the limit can be set";
+
+    ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "publishAction"));
+    ASSERT_EQ(signIn.browser.opened.size(), 1);
+    EXPECT_EQ(signIn.browser.opened.first().host(), QStringLiteral("accounts.google.com"));
+    const quint16 cancelledPort = signIn.browser.redirectPort();
+    ASSERT_NE(cancelledPort, 0);
+    ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "cancelAction"));
+    EXPECT_FALSE(zaf::test::acceptsConnections(cancelledPort));
+    zaf::test::waitUntil([] { return false; }, 300);
+    EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("begin"), QStringLiteral("cancel")}));
+
+    ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "publishAction"));
+    ASSERT_EQ(signIn.browser.opened.size(), 2) << "a new sign-in";
+    const quint16 abandonedPort = signIn.browser.redirectPort();
+    ASSERT_TRUE(zaf::test::waitUntil([this] { return m_delegate.events.size() == 4; }, 5000));
+    EXPECT_EQ(m_delegate.events.mid(2), (QStringList{QStringLiteral("begin"), QStringLiteral("end")}));
+    ASSERT_TRUE(m_delegate.error.has_value());
+    EXPECT_TRUE(m_delegate.error->message.contains(QLatin1String("sign-in"))) << m_delegate.error->message.toStdString();
+    EXPECT_FALSE(zaf::test::acceptsConnections(abandonedPort));
 }
 
 } // namespace

@@ -5,6 +5,7 @@
 #include "platform/ui/activity_indicator.h"
 #include "platform/ui/view_animation.h"
 
+#include <QAbstractButton>
 #include <QEventLoop>
 #include <QLabel>
 #include <QLocale>
@@ -102,11 +103,21 @@ TEST_F(ProgressOverlayTest, StopActivityDuringFadeInDoesNothing)
     EXPECT_TRUE(m_overlay->activityIndicator()->isVisible());
 }
 
-// Afterwards it takes only the indicator off the screen; dimming, progress and overlay stay.
-TEST_F(ProgressOverlayTest, StopActivityRemovesOnlyTheIndicator)
+// From set-up on, the overlay's own Cancel is on top of it and asks for cancelling. Once the fade-in
+// is over, stopActivity takes the indicator and that Cancel off the screen; dimming, progress and
+// overlay stay.
+TEST_F(ProgressOverlayTest, StopActivityRemovesOnlyTheIndicatorAndTheCancel)
 {
     m_overlay->setShowingAnimated(true, true);
+    QAbstractButton *cancel = m_overlay->cancelButton();
+    ASSERT_NE(cancel, nullptr);
+    EXPECT_TRUE(cancel->isVisible()) << "reachable during the fade-in";
     waitMs();
+    EXPECT_EQ(m_overlay->childAt(cancel->geometry().center()), cancel);
+    int cancels = 0;
+    QObject::connect(m_overlay, &ZafYouTubeActivityProgressOverlay::cancelRequested, [&cancels] { ++cancels; });
+    cancel->click();
+    EXPECT_EQ(cancels, 1);
     ActivityIndicator *indicator = m_overlay->activityIndicator();
     ASSERT_NE(indicator, nullptr);
     m_overlay->stopActivity();
@@ -116,6 +127,7 @@ TEST_F(ProgressOverlayTest, StopActivityRemovesOnlyTheIndicator)
     EXPECT_TRUE(m_overlay->dimmingView()->isVisible());
     EXPECT_TRUE(m_overlay->progressBar()->isVisible());
     EXPECT_TRUE(m_overlay->isShowing());
+    EXPECT_FALSE(cancel->isVisible());
 }
 
 // Not animated, the fade still runs: the indicator is placed by the bounds at its end and stays

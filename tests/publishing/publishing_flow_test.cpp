@@ -6,6 +6,7 @@
 #include "platform/text/object_format.h"
 #include "platform/ui/view_controller.h"
 #include "publishing/youtube_activity.h"
+#include "tests/publishing/sign_in_support.h"
 #include "tests/publishing/upload_test_support.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/process_temp_directory.h"
@@ -55,6 +56,18 @@ QAbstractButton *buttonWithText(const Buttons &buttons, const QString &text)
     return it == buttons.end() ? nullptr : *it;
 }
 
+// A visible Cancel button in `view` that nothing covers (the topmost widget at its centre), or null.
+QAbstractButton *uncoveredCancel(QWidget *view)
+{
+    for (QAbstractButton *button : view->findChildren<QAbstractButton *>()) {
+        if (!button->isVisible() || button->text().remove(QLatin1Char('&')) != QLatin1String("Cancel"))
+            continue;
+        QWidget *top = view->childAt(button->mapTo(view, button->rect().center()));
+        if (top == button || button->isAncestorOf(top))
+            return button;
+    }
+    return nullptr;
+}
 
 // An activity prepared with the editor's usual items for a fresh fixture movie, its form presented.
 // At the end it waits for the copy's export and removes the copy: copies of one second share a name.
@@ -241,6 +254,60 @@ TEST(PublishingFlow, CancelEndsNotCompletedAndRemovesTheCopy)
     EXPECT_EQ(prepared.finishes, QList<bool>{false});
     EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
     EXPECT_EQ(prepared.activity->resultAlert(), nullptr);
+}
+
+// The overlay covers the form and its Cancel, yet a Cancel stays on top while the sign-in and the
+// upload run: it ends the action as not completed, without an alert, and removes the copy.
+TEST(PublishingFlow, CancelStaysReachableOverTheOverlayDuringSignInAndUpload)
+{
+    for (const bool signingIn : {true, false}) {
+        SCOPED_TRACE(signingIn ? "sign-in" : "upload");
+        UploadTestServer server(50, std::chrono::seconds(90));
+        ASSERT_TRUE(server.listen());
+        server.setResponseDelay(std::chrono::seconds(60)); // the upload is still running at the Cancel
+        ScopedUploadEnvironment environment(server.baseUrl());
+        std::optional<SignInEnvironment> signIn;
+        if (signingIn)
+            signIn.emplace();
+
+        PreparedActivity prepared;
+        ASSERT_TRUE(prepared.waitForExport());
+        QWidget *view = prepared.navigation->view();
+        view->resize(420, 640);
+        view->show();
+        prepared.publishButton()->click();
+        ASSERT_TRUE(waitUntil([&] { return signingIn ? !signIn->browser.opened.isEmpty() : !server.requests().isEmpty(); }, 10000));
+        ASSERT_NE(prepared.activity->progressOverlay(), nullptr);
+        waitUntil([] { return false; }, 300); // the overlay's fade-in is over
+
+        QAbstractButton *cancel = uncoveredCancel(view);
+        if (!cancel) {
+            ADD_FAILURE() << "every Cancel is under the overlay";
+            continue;
+        }
+        cancel->click();
+        EXPECT_EQ(prepared.finishes, QList<bool>{false});
+        EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
+        waitUntil([] { return false; }, 200);
+        EXPECT_EQ(prepared.activity->resultAlert(), nullptr);
+        EXPECT_EQ(prepared.finishes, QList<bool>{false});
+        view->hide();
+    }
+}
+
+// A sign-in abandoned in the browser ends after the agent's limit with the failure alert.
+TEST(PublishingFlow, AnAbandonedSignInEndsWithTheFailureAlert)
+{
+    SignInEnvironment signIn;
+    PreparedActivity prepared;
+    ASSERT_TRUE(prepared.waitForExport());
+    ASSERT_TRUE(prepared.activity->publishingAgent()->setProperty("signInTimeoutMs", 100));
+    prepared.publishButton()->click();
+    ASSERT_TRUE(waitUntil([&] { return prepared.activity->resultAlert() != nullptr; }, 10000));
+    EXPECT_EQ(signIn.browser.opened.size(), 1);
+    EXPECT_EQ(prepared.activity->resultAlert()->text(), tableText("FAILED_PUBLISH_VIDEO"));
+    prepared.activity->resultAlert()->buttons().first()->click();
+    EXPECT_EQ(prepared.finishes, QList<bool>{false});
 }
 
 } // namespace
