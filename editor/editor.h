@@ -19,7 +19,8 @@
 // The class is split by concern over several files: editor_construction.cpp (data model,
 // initializers, appearance, destruction), editor_playback.cpp, editor_modes.cpp,
 // editor_trimming.cpp, editor_thumbnails.cpp, editor_layout.cpp, editor_save.cpp,
-// editor_share.cpp and editor_keyboard.cpp (desktop shortcuts).
+// editor_share.cpp, editor_keyboard.cpp (desktop shortcuts) and editor_unplayable_movie.cpp (a
+// movie that cannot be played).
 
 #include "platform/media/media_time.h"
 #include "platform/media/player.h"
@@ -109,6 +110,12 @@ public:
     Q_INVOKABLE void playAction();
     Q_INVOKABLE void pauseAction();
     void reloadMvLayerWithURL(const QUrl &url);
+    // The current item failed to load, or holds no picture (unplayable movie file).
+    bool currentItemIsUnplayable() const;
+    // Says in the video area that the movie cannot be played, and why; leaves only Cancel.
+    void showUnplayableMovieMessage();
+    // The message, once shown (null before).
+    QLabel *unplayableMovieMessage() const;
     double getPlayerDuration() const;
     QSizeF getVideoSize() const;
 
@@ -264,6 +271,7 @@ private:
     void finishWithDelegate();
     void presentShareSheet(const QVariantList &items, const QUrl &movieURL);
     void installKeyboardShortcuts();
+    QRect unplayableMessageFrame();
     void setTrimPointAtPlayhead(bool start);
 
     QUrl m_videoURL;
@@ -301,6 +309,8 @@ private:
     ZafVideoOverlayButton *m_videoOverlayPlayButton = nullptr;
     QWidget *m_videoOverlay = nullptr;
     QLabel *m_titleLabel = nullptr;
+    QPointer<QLabel> m_unplayableMessageLabel;
+    bool m_movieUnplayable = false;
     double m_editStartTime = 0;
     double m_editEndTime = 0;
     QUrl m_trimFilePath;

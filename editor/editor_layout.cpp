@@ -12,6 +12,7 @@
 #include "platform/ui/transition_coordinator.h"
 #include "platform/ui/view_animation.h"
 
+#include <QLabel>
 #include <QWidget>
 
 using namespace zaf::ui;
@@ -118,6 +119,8 @@ void ZafVideoEditorViewController::viewDidLayoutSubviews()
     const QRect bounds(QPoint(0, 0), view()->size());
     m_mvPlayerLayer->setGeometry(bounds);
     m_videoOverlay->setGeometry(bounds);
+    if (m_unplayableMessageLabel)
+        m_unplayableMessageLabel->setGeometry(unplayableMessageFrame());
 }
 
 void ZafVideoEditorViewController::refreshMvRotation()

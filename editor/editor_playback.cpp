@@ -59,6 +59,10 @@ void ZafVideoEditorViewController::observeValueForKeyPathOfObjectChangeContext(c
     const std::shared_ptr<PlayerItem> current = m_mvPlayer ? m_mvPlayer->currentItem() : nullptr;
     if (!current || object != current.get() || keyPath != QLatin1String("status"))
         return;
+    if (currentItemIsUnplayable()) {
+        showUnplayableMovieMessage();
+        return;
+    }
     if (current->status() != PlayerItem::Status::ReadyToPlay)
         return;
     m_thumbnailGenerator.reset();
@@ -72,6 +76,8 @@ void ZafVideoEditorViewController::observeValueForKeyPathOfObjectChangeContext(c
 
 void ZafVideoEditorViewController::playAction()
 {
+    if (m_movieUnplayable)
+        return;
     if (m_trimming) {
         m_mvPlayer->seekToTime(mediaTimeFromSeconds(m_editStartTime));
         // Playback stops at the end of the range. Earlier boundary observers are removed first, so

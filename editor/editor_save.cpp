@@ -12,7 +12,8 @@ using namespace zaf::photos;
 
 void ZafVideoEditorViewController::saveAction()
 {
-    if (m_shareSheetUp)
+    // Nothing to save of a movie that cannot be played (the Save item is disabled; this is Ctrl+S).
+    if (m_shareSheetUp || m_movieUnplayable)
         return;
     zaf::log::notice(lcEditor(), QStringLiteral("saveAction"));
     m_activityTypes.append(QString::fromLatin1(ZafActivityTypeSaveToPhotoLibrary));

@@ -3,11 +3,15 @@
 
 #include "editor/date_extensions.h"
 #include "overlay/video_overlay_button.h"
+#include "platform/ui/bar_button_item.h"
 #include "platform/ui/view_animation.h"
 
+#include <QFileInfo>
+#include <QLabel>
 #include <QLocale>
 
 #include <cmath>
+#include <functional>
 
 namespace zaf::test {
 namespace {
@@ -94,16 +98,55 @@ TEST_F(EditorPlaybackTest, VideoSizeAndThumbnailAspectFollowTheRotation)
     }
 }
 
-TEST_F(EditorPlaybackTest, UnreadableMovieLeavesTheTimelineInert)
+// Files the editor cannot play: it says so in the video area with the file's name and a plain
+// reason, leaves only Cancel (nothing to play, trim, save or share), and Cancel reports nothing.
+struct UnplayableMovie {
+    const char *name;
+    std::function<QString(const ScratchDir &)> make;
+    const char *reason;
+};
+
+class EditorUnplayableMovieTest : public EditorPlaybackTest, public ::testing::WithParamInterface<UnplayableMovie> {};
+
+TEST_P(EditorUnplayableMovieTest, SaysWhyInTheVideoAreaAndLeavesOnlyCancel)
 {
-    auto e = makeEditor(scratch.write(QStringLiteral("garbage.mp4"), 3000));
-    spin(300);
+    const QString path = GetParam().make(scratch);
+    auto e = makeEditor(path);
+    RecordingDelegate delegate;
+    e->setDelegate(&delegate);
+    ASSERT_TRUE(waitUntil([&] { return e->unplayableMovieMessage() != nullptr; }, 10000));
+    const QString message = e->unplayableMovieMessage()->text();
+    EXPECT_TRUE(message.contains(QFileInfo(path).fileName())) << message.toStdString();
+    EXPECT_TRUE(message.contains(GetParam().reason)) << message.toStdString();
+    EXPECT_TRUE(e->unplayableMovieMessage()->isVisibleTo(e->view()));
+
     EXPECT_EQ(e->mvTrimmer()->delegate(), nullptr);
-    EXPECT_TRUE(std::isnan(e->getPlayerDuration()));
-    EXPECT_EQ(e->getVideoSize(), QSizeF(0, 0));
-    e->playAction();   // no crash, toolbars still change
-    EXPECT_TRUE(e->bottomToolBar()->items().contains(e->pauseButton()));
+    EXPECT_EQ(ui::superview(e->videoOverlayPlayButton()->widget()), nullptr);
+    for (ui::BarButtonItem *item : {e->saveButton(), e->shareButton(), e->playButton()})
+        EXPECT_FALSE(item->isEnabled());
+    EXPECT_TRUE(e->cancelButton()->isEnabled());
+    e->playAction(); // Space
+    e->saveAction(); // Ctrl+S
+    EXPECT_EQ(e->mvPlayer()->rate(), 0);
+    EXPECT_TRUE(e->activityTypes().isEmpty());
+
+    e->cancelButton()->trigger();
+    ASSERT_EQ(delegate.reports.size(), 1);
+    EXPECT_TRUE(delegate.reports.first().isEmpty());
 }
+
+const char *const kNotAMovie = "This file is not a movie this editor can play.";
+
+INSTANTIATE_TEST_SUITE_P(Files, EditorUnplayableMovieTest, ::testing::Values(
+    UnplayableMovie{"Missing", [](const ScratchDir &t) { return t.file("gone.mp4"); }, "This file could not be found."},
+    UnplayableMovie{"Empty", [](const ScratchDir &t) { return t.write("empty.mp4", 0); }, kNotAMovie},
+    UnplayableMovie{"Garbage", [](const ScratchDir &t) { return t.write("garbage.mp4", 3000); }, kNotAMovie},
+    UnplayableMovie{"SoundOnly", [](const ScratchDir &t) {
+        const QString path = t.file("sound.mp4");
+        ffmpeg(words("-f lavfi -i sine=frequency=440:duration=1 -c:a aac") << path);
+        return path;
+    }, kNotAMovie}),
+    [](const ::testing::TestParamInfo<UnplayableMovie> &info) { return std::string(info.param.name); });
 
 TEST(EditorTitle, DateLineShowsMonthDayAndTwelveHourTime)
 {
