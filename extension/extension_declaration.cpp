@@ -19,11 +19,10 @@ zaf::extensionkit::ExtensionDeclaration ZafVideoEditorExtensionDeclaration()
     };
     d.windowTitle = QStringLiteral("Zafrel Video Editor");
     d.windowSize = QSize(1280, 720);
-    // Closing the editor's window is Cancel.
+    // Closing the editor's window is Cancel, with an editor or without one.
     d.onWindowClosed = [](zaf::ui::ViewController *principal) {
-        auto *controller = qobject_cast<ZafVideoEditorExtensionViewController *>(principal);
-        if (controller && controller->videoEditorViewController())
-            controller->videoEditorViewController()->doneAction();
+        if (auto *controller = qobject_cast<ZafVideoEditorExtensionViewController *>(principal))
+            controller->cancel();
     };
     return d;
 }

@@ -72,7 +72,23 @@ ZafVideoEditorExtensionViewController::~ZafVideoEditorExtensionViewController()
 void ZafVideoEditorExtensionViewController::viewDidLoad()
 {
     ViewController::viewDidLoad();
+    m_escapeWithoutEditor = new QShortcut(QKeySequence(Qt::Key_Escape), view());
+    m_escapeWithoutEditor->setContext(Qt::WindowShortcut);
+    connect(m_escapeWithoutEditor, &QShortcut::activated, this, &ZafVideoEditorExtensionViewController::cancel);
     setupChildViewControllers();
+}
+
+void ZafVideoEditorExtensionViewController::cancel()
+{
+    if (m_videoEditorViewController) {
+        m_videoEditorViewController->doneAction();
+        return;
+    }
+    if (m_reportedWithoutEditor)
+        return;
+    m_reportedWithoutEditor = true;
+    zaf::log::notice(lcExtension(), QStringLiteral("cancelled before an editor was built; reporting no activity"));
+    videoEditorDidFinishWithActivityTypes(nullptr, {});
 }
 
 void ZafVideoEditorExtensionViewController::setupChildViewControllers()
@@ -181,6 +197,9 @@ void ZafVideoEditorExtensionViewController::setupVideoEditorController()
     addChildViewController(editor);
     zaf::ui::addSubview(view(), editor->view());
     editor->didMoveToParentViewController(this);
+    // Two Escape shortcuts in one window would cancel each other out as ambiguous.
+    if (m_escapeWithoutEditor)
+        m_escapeWithoutEditor->setEnabled(false);
 }
 
 void ZafVideoEditorExtensionViewController::viewWillAppear(bool animated)
@@ -226,4 +245,6 @@ void ZafVideoEditorExtensionViewController::tearDownChildViewControllers()
     editor->removeFromParentViewController();
     // Dropping the editor removes its observers and empties the temporary directory.
     m_videoEditorViewController.reset();
+    if (m_escapeWithoutEditor)
+        m_escapeWithoutEditor->setEnabled(true);
 }

@@ -15,6 +15,8 @@
 #include "platform/ui/view_controller.h"
 
 #include <QColor>
+#include <QPointer>
+#include <QShortcut>
 #include <QString>
 #include <QUrl>
 
@@ -38,6 +40,10 @@ public:
     ~ZafVideoEditorExtensionViewController() override;
 
     void viewDidLoad() override;
+    // Cancel at the extension's level (closing the window, or Escape before there is an editor):
+    // the editor's doneAction, or, when the host's items never made an editor, an empty report to
+    // the host, once, so that the host can remove the view and the window goes.
+    void cancel();
     void viewWillAppear(bool animated) override;
     void viewDidDisappear(bool animated) override;
     void viewDidLayoutSubviews() override;
@@ -71,6 +77,9 @@ private:
     bool hasRequiredValues() const;
 
     std::unique_ptr<ZafVideoEditorViewController> m_videoEditorViewController;
+    // Escape while there is no editor (the editor has its own while it is there).
+    QPointer<QShortcut> m_escapeWithoutEditor;
+    bool m_reportedWithoutEditor = false;
     QString m_bundleIdentifier;
     QString m_appName;
     QUrl m_movieURL;

@@ -7,6 +7,7 @@
 #include "platform/extensionkit/extension_runtime.h"
 #include "platform/extensionkit/json_rpc.h"
 #include "platform/ui/toolbar.h"
+#include "platform/ui/window_host.h"
 #include "tempstore/temp_store.h"
 #include "tests/platform/extensionkit/socket_pair.h"
 #include "tests/support/log_capture.h"
@@ -14,7 +15,9 @@
 #include "tests/support/process_temp_directory.h"
 #include "tests/support/temp_dir.h"
 
+#include <QApplication>
 #include <QDir>
+#include <QTest>
 #include <QFile>
 #include <QJsonArray>
 #include <gtest/gtest.h>
@@ -181,6 +184,30 @@ TEST_F(ExtensionTest, RemovalBeforeTheUserFinishedTearsDownWithoutReportAndEmpti
     EXPECT_TRUE(tempEntries().isEmpty());
     EXPECT_FALSE(reportedTypes(300).has_value());
 }
+
+// The host's items made no editor: the window must still close. Closing it, or Escape, is Cancel:
+// one empty report, so that the host removes the view.
+class ExtensionWithoutEditorTest : public ExtensionTest, public ::testing::WithParamInterface<bool> {};
+
+TEST_P(ExtensionWithoutEditorTest, ClosingTheWindowOrEscapeReportsAnEmptyArrayOnce)
+{
+    beginWith({text(ZafVideoEditorExtensionAppNameKey, "Recorder")});
+    ASSERT_EQ(editor(), nullptr);
+    ui::WindowHost *window = runtime->window();
+    ASSERT_NE(window, nullptr);
+    QApplication::setActiveWindow(window);
+    ASSERT_TRUE(QTest::qWaitForWindowActive(window));
+    for (int i = 0; i < 2; ++i) {
+        if (GetParam())
+            window->close();
+        else
+            QTest::keyClick(window, Qt::Key_Escape);
+    }
+    EXPECT_EQ(reportedTypes(), QStringList());
+    EXPECT_FALSE(reportedTypes(300).has_value()) << "reported once";
+}
+
+INSTANTIATE_TEST_SUITE_P(CloseOrEscape, ExtensionWithoutEditorTest, ::testing::Bool());
 
 TEST_F(ExtensionTest, RemovalWithNoEditorOnlyLogs)
 {
