@@ -134,6 +134,9 @@ protected:
                 if (!isEnabled())
                     tint.setAlphaF(tint.alphaF() * 0.35f);
                 pixmap = tinted(pixmap, tint);
+            } else if (!isEnabled()) {
+                // The style's disabled pixmap of a dark glyph on a light bar reads as enabled.
+                painter.setOpacity(0.35);
             }
             const QSizeF size = pixmap.deviceIndependentSize();
             const QPointF centre = QRectF(iconArea()).center();
