@@ -1,9 +1,11 @@
 #include "platform/extensionkit/json_rpc.h"
 
+#include <QJsonArray>
 #include <QJsonDocument>
 #include <QJsonParseError>
 #include <QStringDecoder>
 
+#include <algorithm>
 #include <cmath>
 
 namespace zaf::extensionkit::jsonrpc {
@@ -33,12 +35,102 @@ QString typeName(const QJsonValue &value)
     return QStringLiteral("absent");
 }
 
+QJsonValue idOrNull(const QJsonValue &id)
+{
+    return isValidId(id) ? id : QJsonValue(QJsonValue::Null);
+}
+
 bool isValidUtf8(const QByteArray &bytes)
 {
     QStringDecoder decoder(QStringDecoder::Utf8, QStringDecoder::Flag::Stateless);
     const QString text = decoder.decode(bytes);
     Q_UNUSED(text);
     return !decoder.hasError();
+}
+
+// The deepest nesting of arrays and objects in `text` (a top-level object counts 1), read in one
+// pass without recursion; strings are skipped. Stops counting once `limit` is passed.
+int nestingDepth(const QByteArray &text, int limit)
+{
+    int depth = 0, deepest = 0;
+    bool inString = false, escaped = false;
+    for (const char c : text) {
+        if (inString) {
+            if (escaped)
+                escaped = false;
+            else if (c == '\\')
+                escaped = true;
+            else if (c == '"')
+                inString = false;
+        } else if (c == '"') {
+            inString = true;
+        } else if (c == '{' || c == '[') {
+            deepest = std::max(deepest, ++depth);
+            if (deepest > limit)
+                break;
+        } else if ((c == '}' || c == ']') && depth > 0) {
+            --depth;
+        }
+    }
+    return deepest;
+}
+
+// `text` with every array or object inside the top-level value replaced by null: the envelope of
+// a message (its id and method) without its contents, which can be read however deep they go.
+QByteArray envelopeOf(const QByteArray &text)
+{
+    QByteArray out;
+    out.reserve(text.size());
+    int depth = 0;
+    bool inString = false, escaped = false;
+    for (const char c : text) {
+        const int before = depth;
+        if (inString) {
+            if (escaped)
+                escaped = false;
+            else if (c == '\\')
+                escaped = true;
+            else if (c == '"')
+                inString = false;
+        } else if (c == '"') {
+            inString = true;
+        } else if (c == '{' || c == '[') {
+            ++depth;
+        } else if ((c == '}' || c == ']') && depth > 0) {
+            --depth;
+        }
+        if (before <= 1 && depth <= 1)
+            out.append(c);
+        else if (before == 1 && depth == 2)
+            out.append("null");
+    }
+    return out;
+}
+
+// Whether, and with which id, a refused object is answered. A request (a "method" with an "id")
+// is answered with its id, or null when the id has a wrong type. A notification (a "method"
+// without "id") is never answered, and neither is anything that looks like a response, so two
+// peers can never answer each other's errors back and forth. Whatever else cannot be told apart
+// is answered with a null id, as JSON-RPC 2.0 asks.
+std::optional<QJsonValue> answerIdFor(const QJsonObject &object)
+{
+    const bool hasId = object.contains(QLatin1String("id"));
+    if (object.contains(QLatin1String("method")))
+        return hasId ? std::optional<QJsonValue>(idOrNull(object.value(QLatin1String("id")))) : std::nullopt;
+    if (object.contains(QLatin1String("result")) || object.contains(QLatin1String("error")))
+        return std::nullopt;
+    return hasId ? idOrNull(object.value(QLatin1String("id"))) : QJsonValue(QJsonValue::Null);
+}
+
+// The answer id of a payload that is refused before it is parsed (bad UTF-8, too deep): read from
+// its envelope where that is a readable object; null otherwise.
+std::optional<QJsonValue> salvagedAnswerId(const QByteArray &utf8)
+{
+    QJsonParseError error;
+    const QJsonDocument envelope = QJsonDocument::fromJson(envelopeOf(utf8), &error);
+    if (error.error == QJsonParseError::NoError && envelope.isObject())
+        return answerIdFor(envelope.object());
+    return QJsonValue(QJsonValue::Null);
 }
 
 } // namespace
@@ -52,27 +144,38 @@ bool isValidId(const QJsonValue &id)
 
 ParseResult parseMessage(const QByteArray &payload)
 {
+    // Bad bytes cannot be parsed, but the id of a request is still read (the bad bytes replaced)
+    // so that the refusal reaches the request it refuses.
     if (!isValidUtf8(payload))
-        return failure(ParseError, QStringLiteral("message is not valid UTF-8"));
+        return failure(ParseError, QStringLiteral("message is not valid UTF-8"), salvagedAnswerId(QString::fromUtf8(payload).toUtf8()));
+    // Deep nesting is refused before the JSON parser, which recurses once per level, ever sees it.
+    if (nestingDepth(payload, kMaxNestingDepth) > kMaxNestingDepth)
+        return failure(ParseError, QStringLiteral("message nested deeper than %1 levels").arg(kMaxNestingDepth), salvagedAnswerId(payload));
 
     QJsonParseError parseError;
     const QJsonDocument document = QJsonDocument::fromJson(payload, &parseError);
-    if (parseError.error != QJsonParseError::NoError)
-        return failure(ParseError, QStringLiteral("invalid JSON at offset %1: %2").arg(parseError.offset).arg(parseError.errorString()));
+    if (parseError.error != QJsonParseError::NoError) {
+        // The parser takes only an object or an array at the top; a lone number or string is
+        // still valid JSON, just no request.
+        QJsonParseError wrappedError;
+        const QJsonDocument wrapped = QJsonDocument::fromJson('[' + payload + ']', &wrappedError);
+        if (wrappedError.error == QJsonParseError::NoError && wrapped.array().size() == 1)
+            return failure(InvalidRequest, QStringLiteral("message is not a JSON object"), QJsonValue(QJsonValue::Null));
+        return failure(ParseError, QStringLiteral("invalid JSON at offset %1: %2").arg(parseError.offset).arg(parseError.errorString()),
+                       QJsonValue(QJsonValue::Null));
+    }
+    // Batches are not supported: the host sends one message per frame and waits for each answer,
+    // so a batch is refused whole with one error, whatever it holds.
     if (document.isArray())
-        return failure(InvalidRequest, QStringLiteral("batch messages are not supported"));
+        return failure(InvalidRequest, QStringLiteral("batch messages are not supported"), QJsonValue(QJsonValue::Null));
     if (!document.isObject())
-        return failure(ParseError, QStringLiteral("message is not a JSON object"));
+        return failure(InvalidRequest, QStringLiteral("message is not a JSON object"), QJsonValue(QJsonValue::Null));
 
     const QJsonObject object = document.object();
     const bool hasId = object.contains(QLatin1String("id"));
     const QJsonValue id = object.value(QLatin1String("id"));
     const bool hasMethod = object.contains(QLatin1String("method"));
-    // Only something that looks like a request is answered; a broken response is only logged, so
-    // two peers can never answer each other's errors back and forth.
-    std::optional<QJsonValue> answerId;
-    if (hasId && hasMethod)
-        answerId = isValidId(id) ? id : QJsonValue(QJsonValue::Null);
+    const std::optional<QJsonValue> answerId = answerIdFor(object);
 
     const QJsonValue version = object.value(QLatin1String("jsonrpc"));
     if (version != QJsonValue(QStringLiteral("2.0")))
@@ -104,7 +207,8 @@ ParseResult parseMessage(const QByteArray &payload)
 
     if (hasResult == hasError)
         return failure(InvalidRequest, hasResult ? QStringLiteral("a response cannot carry both \"result\" and \"error\"")
-                                                 : QStringLiteral("message has neither \"method\" nor \"result\" nor \"error\""));
+                                                 : QStringLiteral("message has neither \"method\" nor \"result\" nor \"error\""),
+                       answerId);
     if (!hasId)
         return failure(InvalidRequest, QStringLiteral("a response must carry an \"id\""));
     if (!isValidId(id))

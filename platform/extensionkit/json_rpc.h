@@ -2,7 +2,7 @@
 
 // JSON-RPC 2.0 messages as the host channel carries them: parsing and validation of one payload
 // (a request, a notification, a response or an error response) and the making of the messages this
-// side sends. Batches are not part of the channel's protocol and are refused as invalid requests.
+// side sends. Batches are not part of the channel's protocol: one is refused whole, with one error.
 //
 // Threads: pure functions, callable from any thread.
 
@@ -23,6 +23,10 @@ enum ErrorCode : int {
     InvalidParams = -32602,
     InternalError = -32603,
 };
+
+// Messages nested deeper than this (arrays and objects; the message itself is level 1) are refused
+// unparsed. Real messages of the channel nest a handful of levels.
+inline constexpr int kMaxNestingDepth = 64;
 
 enum class MessageKind {
     Request,        // method and id: must be answered
@@ -50,13 +54,13 @@ struct Message {
 // The outcome of parsing one payload: a valid message, or the error to report.
 struct ParseResult {
     std::optional<Message> message;
-    // On failure: ParseError (not UTF-8, not JSON, not an object) or InvalidRequest (a JSON object
-    // that is no valid JSON-RPC 2.0 message), and a text saying why.
+    // On failure: ParseError (not UTF-8, not JSON, nested too deep) or InvalidRequest (a batch, or
+    // JSON that is no valid JSON-RPC 2.0 message), and a text saying why.
     int errorCode = 0;
     QString errorText;
-    // On failure: the id to answer with, when the payload was an object carrying an "id" member
-    // that looked like a request (a valid id is kept, an id of a wrong type becomes null).
-    // Absent: the failure is only logged, never answered.
+    // On failure: the id to answer with. A request's own id where it can be read (an id of a wrong
+    // type becomes null), null where no id can be read. Absent for a notification (a "method"
+    // without "id") and for anything that looks like a response: those are only logged.
     std::optional<QJsonValue> answerId;
 
     bool ok() const { return message.has_value(); }

@@ -15,6 +15,7 @@
 #include <atomic>
 #include <cerrno>
 #include <csignal>
+#include <optional>
 #include <random>
 #include <thread>
 
@@ -124,25 +125,51 @@ TEST(ChannelStream, TruncatedOrOversizedFrameIsOneProtocolErrorThenClosedAfterWh
     }
 }
 
-TEST_F(ChannelTest, MalformedAndRandomFramesAreReportedAnsweredWhenTheyHadAnIdAndReadingGoesOn)
+// Every malformed frame is logged, reported and answered as JSON-RPC 2.0 asks (with the request's
+// id where it can be read, null where not, never for notifications and responses), and the next
+// request still comes through; random bytes never stop the reading.
+TEST_F(ChannelTest, MalformedFramesAreAnsweredWithTheirIdOrNullAndTheNextRequestComesThrough)
 {
+    struct Case {
+        const char *name;
+        QByteArray payload;
+        std::optional<std::pair<QJsonValue, int>> answer; // id and code; none: not answered
+    };
+    const QJsonValue null(QJsonValue::Null);
+    const auto nested = [](int levels) { return QByteArray(levels, '[') + QByteArray(levels, ']'); };
+    const QList<Case> cases{
+        {"not JSON", "not json", {{null, rpc::ParseError}}},
+        {"invalid UTF-8 in a notification", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xff\"}"), std::nullopt},
+        {"invalid UTF-8 in a request", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":7,\"method\":\"m\xff\"}"), {{7, rpc::ParseError}}},
+        {"method a number", R"({"jsonrpc":"2.0","id":5,"method":42})", {{5, rpc::InvalidRequest}}},
+        {"no method", R"({"jsonrpc":"2.0","id":"a"})", {{"a", rpc::InvalidRequest}}},
+        {"a batch", R"([{"jsonrpc":"2.0","id":9,"method":"m"}])", {{null, rpc::InvalidRequest}}},
+        {"request nested too deep", R"({"jsonrpc":"2.0","id":11,"method":"m","params":)" + nested(200) + "}", {{11, rpc::ParseError}}},
+        {"array nested 20000 deep", nested(20000), {{null, rpc::ParseError}}},
+        {"notification nested too deep", R"({"jsonrpc":"2.0","method":"m","params":)" + nested(200) + "}", std::nullopt},
+        {"notification of version 1.0", R"({"jsonrpc":"1.0","method":"noId"})", std::nullopt},
+        {"a response with result and error", R"({"jsonrpc":"2.0","id":6,"result":1,"error":{"code":1,"message":"m"}})", std::nullopt},
+    };
     zaf::test::LogCapture logs;
-    pair.writeFrame("not json");
-    pair.writeFrame(QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xff\"}"));
-    pair.writeFrame(R"({"jsonrpc":"2.0","id":5,"method":42})");
-    pair.writeFrame(R"({"jsonrpc":"1.0","method":"noId"})");
-    pair.writeFrame(R"({"jsonrpc":"2.0","id":6,"result":1})"); // a response nobody asked for
-    pair.writeMessage(rpc::makeNotification("stillAlive"));
-    ASSERT_TRUE(waitUntil([&] { return lastNotification() == "stillAlive"; }));
-    EXPECT_EQ(notifications.size(), 1);
-    EXPECT_EQ(protocolErrors.size(), 4);
-    EXPECT_TRUE(requests.isEmpty());
-    const QList<QJsonObject> answers = pair.readMessages(1);
-    ASSERT_EQ(answers.size(), 1);
-    EXPECT_EQ(answers[0].value("id"), QJsonValue(5));
-    EXPECT_EQ(answers[0].value("error").toObject().value("code"), QJsonValue(rpc::InvalidRequest));
-    EXPECT_TRUE(pair.nothingToRead());
-    EXPECT_GE(logs.messages("zaf.extensionkit").filter("protocol error").size(), 4);
+    for (qsizetype i = 0; i < cases.size(); ++i) {
+        const Case &c = cases[i];
+        SCOPED_TRACE(c.name);
+        const qsizetype errorsBefore = protocolErrors.size();
+        pair.writeFrame(c.payload);
+        pair.writeMessage(rpc::makeRequest(int(i), "next"));
+        ASSERT_TRUE(waitUntil([&] { return requests.size() == i + 1; }));
+        EXPECT_EQ(requests.last(), std::make_pair(QJsonValue(int(i)), QString("next")));
+        EXPECT_EQ(protocolErrors.size(), errorsBefore + 1);
+        if (c.answer) {
+            const QList<QJsonObject> answers = pair.readMessages(1);
+            ASSERT_EQ(answers.size(), 1);
+            EXPECT_EQ(answers[0].value("id"), c.answer->first);
+            EXPECT_EQ(answers[0].value("error").toObject().value("code"), QJsonValue(c.answer->second));
+        }
+        EXPECT_TRUE(pair.nothingToRead());
+    }
+    EXPECT_TRUE(notifications.isEmpty());
+    EXPECT_GE(logs.messages("zaf.extensionkit").filter("protocol error").size(), cases.size());
 
     std::mt19937 random(4242);
     for (int i = 0; i < 200; ++i) {
@@ -154,7 +181,7 @@ TEST_F(ChannelTest, MalformedAndRandomFramesAreReportedAnsweredWhenTheyHadAnIdAn
     pair.writeMessage(rpc::makeNotification("end"));
     ASSERT_TRUE(waitUntil([&] { return lastNotification() == "end"; }));
     EXPECT_TRUE(channel->isOpen());
-    EXPECT_GE(protocolErrors.size(), 4 + 190);
+    EXPECT_GE(protocolErrors.size(), cases.size() + 190);
     EXPECT_TRUE(closes.isEmpty());
 }
 

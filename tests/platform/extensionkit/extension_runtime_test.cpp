@@ -191,11 +191,13 @@ TEST_F(RuntimeTest, GarbageAndBadRequestsAreLoggedOrAnsweredAndTheRuntimeCarries
     pair.writeMessage(rpc::makeRequest(5, "removeExtensionView"));
     pair.writeMessage(rpc::makeNotification("unknownNotification"));
     pair.writeMessage(rpc::makeNotification("beginExtensionRequest", QJsonObject{{"inputItems", QJsonArray{}}}));
-    const QList<QJsonObject> answers = pair.readMessages(6);
-    ASSERT_EQ(answers.size(), 6);
-    // Only the unreadable frame that carried an id is answered, with a null id.
-    const QList<std::pair<QJsonValue, int>> expected{{QJsonValue::Null, rpc::InvalidRequest}, {1, rpc::InvalidParams}, {2, rpc::InvalidParams},
-                                                     {3, rpc::InvalidParams}, {4, rpc::MethodNotFound}, {5, rpc::InvalidRequest}};
+    const QList<QJsonObject> answers = pair.readMessages(8);
+    ASSERT_EQ(answers.size(), 8);
+    // Frames whose id cannot be read are answered with a null id; notifications are not answered.
+    const QList<std::pair<QJsonValue, int>> expected{{QJsonValue::Null, rpc::ParseError},     {QJsonValue::Null, rpc::ParseError},
+                                                     {QJsonValue::Null, rpc::InvalidRequest}, {1, rpc::InvalidParams},
+                                                     {2, rpc::InvalidParams},                 {3, rpc::InvalidParams},
+                                                     {4, rpc::MethodNotFound},                {5, rpc::InvalidRequest}};
     for (qsizetype i = 0; i < answers.size(); ++i) {
         EXPECT_EQ(answers[i].value("id"), expected[i].first) << i;
         EXPECT_EQ(answers[i].value("error").toObject().value("code"), QJsonValue(expected[i].second)) << i;

@@ -1,5 +1,5 @@
-// JSON-RPC 2.0 parsing and validation: what is accepted, what is refused with which code, and which
-// refusals may be answered (only those that carried a request id).
+// JSON-RPC 2.0 parsing and validation: what is accepted, what is refused with which code, and with
+// which id each refusal is answered (a request's own, null, or none for notifications and responses).
 
 #include "platform/extensionkit/json_rpc.h"
 
@@ -50,6 +50,14 @@ TEST(JsonRpc, ParsesEachKindOfMessageWithItsMembers)
     EXPECT_EQ(error.errorData, QJsonValue(QJsonArray{1}));
 }
 
+TEST(JsonRpc, NestingUpToTheLimitParsesAndBracketsInStringsDoNotCount)
+{
+    const QByteArray atLimit = QByteArray(rpc::kMaxNestingDepth - 1, '[') + QByteArray(rpc::kMaxNestingDepth - 1, ']');
+    EXPECT_EQ(parsed(R"({"jsonrpc":"2.0","id":1,"method":"m","params":)" + atLimit + "}").kind, rpc::MessageKind::Request);
+    const QByteArray brackets = "\"" + QByteArray(1000, '[') + "\\\"{\"";
+    EXPECT_EQ(parsed(R"({"jsonrpc":"2.0","method":"m","params":[)" + brackets + "]}").params, QJsonValue(QJsonArray{QString(QByteArray(1000, '[') + "\"{")}));
+}
+
 TEST(JsonRpc, MadeMessagesParseBackAsTheSameKind)
 {
     const rpc::Message request = parsed(rpc::serialize(rpc::makeRequest(5, "doIt", QJsonArray{1})));
@@ -80,17 +88,28 @@ TEST(JsonRpc, RefusesMalformedMessagesWithTheRightCodeAndAnswerability)
         std::optional<QJsonValue> answerId;
     };
     const QJsonValue null(QJsonValue::Null);
+    const auto nested = [](int levels, const char *inside = "") { return QByteArray(levels, '[') + inside + QByteArray(levels, ']'); };
     const QList<Case> cases{
-        {"empty payload", "", rpc::ParseError, std::nullopt},
-        {"truncated JSON", R"({"jsonrpc":"2.0","id":1,"meth)", rpc::ParseError, std::nullopt},
-        {"invalid UTF-8 in a string", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"m\xff\xfe\"}"), rpc::ParseError, std::nullopt},
+        {"empty payload", "", rpc::ParseError, null},
+        {"truncated JSON", R"({"jsonrpc":"2.0","id":1,"meth)", rpc::ParseError, null},
+        {"invalid UTF-8 in a notification", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"m\xff\xfe\"}"), rpc::ParseError, std::nullopt},
+        {"invalid UTF-8 in a request", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":8,\"method\":\"m\xff\xfe\"}"), rpc::ParseError, QJsonValue(8)},
+        {"invalid UTF-8 in a response", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":8,\"result\":\"\xff\"}"), rpc::ParseError, std::nullopt},
+        {"invalid UTF-8 and JSON", QByteArray("\xff\xfe{"), rpc::ParseError, null},
         {"overlong UTF-8 encoding", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xc0\xaf\"}"), rpc::ParseError, std::nullopt},
-        {"lone surrogate in UTF-8", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xed\xa0\x80\"}"), rpc::ParseError, std::nullopt},
-        {"trailing garbage", R"({"jsonrpc":"2.0","method":"m"} x)", rpc::ParseError, std::nullopt},
-        {"a number", "42", rpc::ParseError, std::nullopt},
-        {"a string", R"("hello")", rpc::ParseError, std::nullopt},
-        {"a batch", R"([{"jsonrpc":"2.0","method":"m"}])", rpc::InvalidRequest, std::nullopt},
-        {"empty batch", "[]", rpc::InvalidRequest, std::nullopt},
+        {"lone surrogate in UTF-8", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":\"s\",\"method\":\"\xed\xa0\x80\"}"), rpc::ParseError, QJsonValue("s")},
+        {"trailing garbage", R"({"jsonrpc":"2.0","method":"m"} x)", rpc::ParseError, null},
+        {"a number", "42", rpc::InvalidRequest, null},
+        {"a string", R"("hello")", rpc::InvalidRequest, null},
+        {"a batch", R"([{"jsonrpc":"2.0","id":1,"method":"m"}])", rpc::InvalidRequest, null},
+        {"empty batch", "[]", rpc::InvalidRequest, null},
+        {"request nested one level too deep", R"({"jsonrpc":"2.0","id":"d","method":"m","params":)" + nested(rpc::kMaxNestingDepth) + "}",
+         rpc::ParseError, QJsonValue("d")},
+        {"deep request with a bad id", R"({"jsonrpc":"2.0","id":[],"method":"m","params":)" + nested(500) + "}", rpc::ParseError, null},
+        {"notification nested too deep", R"({"jsonrpc":"2.0","method":"m","params":)" + nested(100000) + "}", rpc::ParseError, std::nullopt},
+        {"batch nested too deep", nested(100000), rpc::ParseError, null},
+        {"deep and invalid UTF-8", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":2,\"method\":\"\xff\",\"params\":") + nested(70) + "}",
+         rpc::ParseError, QJsonValue(2)},
         {"missing version", R"({"id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
         {"version 1.0", R"({"jsonrpc":"1.0","id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
         {"numeric version", R"({"jsonrpc":2.0,"id":"x","method":"m"})", rpc::InvalidRequest, QJsonValue("x")},
@@ -105,7 +124,10 @@ TEST(JsonRpc, RefusesMalformedMessagesWithTheRightCodeAndAnswerability)
         {"params a number", R"({"jsonrpc":"2.0","method":"m","params":5})", rpc::InvalidRequest, std::nullopt},
         {"params null", R"({"jsonrpc":"2.0","id":4,"method":"m","params":null})", rpc::InvalidRequest, QJsonValue(4)},
         {"method and result", R"({"jsonrpc":"2.0","id":4,"method":"m","result":1})", rpc::InvalidRequest, QJsonValue(4)},
-        {"neither method nor result", R"({"jsonrpc":"2.0","id":4})", rpc::InvalidRequest, std::nullopt},
+        {"no method, with an id", R"({"jsonrpc":"2.0","id":4})", rpc::InvalidRequest, QJsonValue(4)},
+        {"no method, with a bad id", R"({"jsonrpc":"2.0","id":{"a":1}})", rpc::InvalidRequest, null},
+        {"no method and no id", R"({"jsonrpc":"2.0"})", rpc::InvalidRequest, null},
+        {"empty object", "{}", rpc::InvalidRequest, null},
         {"result and error", R"({"jsonrpc":"2.0","id":4,"result":1,"error":{"code":1,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
         {"result without id", R"({"jsonrpc":"2.0","result":1})", rpc::InvalidRequest, std::nullopt},
         {"result for a null id", R"({"jsonrpc":"2.0","id":null,"result":1})", rpc::InvalidRequest, std::nullopt},
