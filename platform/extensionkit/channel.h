@@ -11,7 +11,7 @@
 //
 // Incoming messages: valid requests and notifications are emitted; responses are logged (this side
 // never asks the host anything). A malformed message is logged and emitted as protocolError(), and
-// answered with a JSON-RPC error when it carried a request id. A frame length above the cap, a
+// answered with a JSON-RPC error unless it is a notification or a response (see json_rpc.h). A frame length above the cap, a
 // failed read or the peer's end of stream closes the channel: closed() is emitted once, the socket
 // is closed and later sends fail with EPIPE.
 //
