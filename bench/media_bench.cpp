@@ -1,11 +1,20 @@
-// media_bench: times our media engine and the ffmpeg command-line tool doing the same jobs on the
-// same 60 s 1080p30 recording with two audio tracks, and prints the ratios (ours / ffmpeg).
+// media_bench: times our media engine and the ffmpeg command-line tool doing the same jobs in the
+// same run, and prints the ratios (ours / ffmpeg).
 //
 //   media_bench [--movie PATH] [--runs N] [--work DIR]
 //
-// Jobs: trim 12.5 s to 47.3 s (frame-accurate re-encode at the same x264 preset and quality), mix
-// the two audio tracks into one with the video copied, and 16 thumbnails 90 px high. Without
-// --movie, the recording is generated with the fixture generator (once, kept in the work directory).
+// The recording is 60 s of 1080p30 with two audio tracks, H.264 with B-frames and 2 s groups of
+// pictures, as screen recorders write it. Without --movie it is generated (once, kept in the work
+// directory): the fixture generator's numbered frames, re-encoded by the ffmpeg tool with B-frames.
+//
+// Jobs:
+// - trim 12.5 s to 47.3 s, against ffmpeg's frame-accurate re-encode (x264 preset medium, crf 18) and
+//   against its stream copy of the same range (which is not frame-accurate: it starts at a keyframe);
+// - trim of a 5-minute recording: 250 s kept against 10 s kept (a trim should cost about a copy, not
+//   grow with the kept length);
+// - mix the two audio tracks into one with the video copied, against ffmpeg doing the same;
+// - the save's mix of a one-track movie, against ffmpeg's stream copy (nothing to mix);
+// - 16 thumbnails 90 px high, against 16 ffmpeg seeks.
 #include "media/audio_mix_utility.h"
 #include "platform/log.h"
 #include "platform/media/export_session.h"
@@ -35,8 +44,8 @@ constexpr double kTrimEnd = 47.3;
 constexpr int kThumbnails = 16;
 constexpr int kThumbnailHeight = 90;
 
-// Keep in step with the export engine's re-encode settings so both sides do the same work.
-const QString kX264Preset = QStringLiteral("veryfast");
+// ffmpeg's frame-accurate re-encode, the reference a trim is measured against.
+const QString kX264Preset = QStringLiteral("medium");
 const QString kX264Crf = QStringLiteral("18");
 // The export's audio: AAC at 256 kb/s, 48 kHz; the mix sums at unity gain and limits.
 const QString kAudioBitRate = QStringLiteral("256k");
@@ -93,15 +102,15 @@ bool runExport(const std::shared_ptr<ExportSession> &session)
     return session->status() == ExportStatus::Completed;
 }
 
-bool ourTrim(const QString &in, const QString &out)
+bool ourTrim(const QString &in, const QString &out, double start = kTrimStart, double end = kTrimEnd)
 {
     QFile::remove(out);
     auto session = ExportSession::exportSessionWithAsset(MediaAsset::assetWithURL(QUrl::fromLocalFile(in)),
                                                          QLatin1String(kExportPresetHighestQuality));
     session->setOutputURL(QUrl::fromLocalFile(out));
     session->setOutputFileType(QLatin1String(kFileTypeMPEG4));
-    session->setTimeRange(MediaTimeRange::fromStartEnd(MediaTime::fromSeconds(kTrimStart, 1000000000),
-                                                       MediaTime::fromSeconds(kTrimEnd, 1000000000)));
+    session->setTimeRange(MediaTimeRange::fromStartEnd(MediaTime::fromSeconds(start, 1000000000),
+                                                       MediaTime::fromSeconds(end, 1000000000)));
     return runExport(session);
 }
 
@@ -147,6 +156,37 @@ bool ffmpegThumbnails(const QString &in, const QString &dir, double duration)
     return true;
 }
 
+// A recording as screen recorders write it: the fixture's numbered frames with `audioTracks` tones,
+// re-encoded by the ffmpeg tool with B-frames and 2 s groups of pictures, audio copied. Made once.
+QString recording(const QString &work, int seconds, int audioTracks)
+{
+    const QString path = QDir(work).filePath(QStringLiteral("recording-%1s-1080p30-%2audio-bframes.mp4").arg(seconds).arg(audioTracks));
+    if (QFile::exists(path))
+        return path;
+    std::printf("generating %s ...\n", qPrintable(path));
+    std::fflush(stdout);
+    const QString plain = path + QStringLiteral(".plain.mp4");
+    QFile::remove(plain);
+    zaf::fixture::FixtureSpec spec;
+    spec.seconds = seconds;
+    spec.width = 1920;
+    spec.height = 1080;
+    spec.fps = 30;
+    spec.audioTracks = audioTracks;
+    if (const zaf::OptionalError e = zaf::fixture::writeFixtureMovie(plain, spec)) {
+        std::fprintf(stderr, "media_bench: %s\n", qPrintable(e->message));
+        std::exit(1);
+    }
+    const bool ok = ffmpeg({QStringLiteral("-i"), plain, QStringLiteral("-map"), QStringLiteral("0"), QStringLiteral("-c:v"),
+                            QStringLiteral("libx264"), QStringLiteral("-preset"), QStringLiteral("veryfast"), QStringLiteral("-bf"),
+                            QStringLiteral("3"), QStringLiteral("-g"), QStringLiteral("60"), QStringLiteral("-crf"), QStringLiteral("20"),
+                            QStringLiteral("-c:a"), QStringLiteral("copy"), path});
+    QFile::remove(plain);
+    if (!ok)
+        std::exit(1);
+    return path;
+}
+
 void report(const char *job, double ours, double theirs, const char *goal)
 {
     std::printf("%-12s ours %8.3f s   ffmpeg %8.3f s   ratio %5.2fx   (%s)\n", job, ours, theirs, ours / theirs, goal);
@@ -171,37 +211,34 @@ int main(int argc, char **argv)
             work = args[i + 1];
     }
     QDir().mkpath(work);
-    if (movie.isEmpty()) {
-        movie = QDir(work).filePath(QStringLiteral("recording-60s-1080p30-2audio.mp4"));
-        if (!QFile::exists(movie)) {
-            std::printf("generating %s ...\n", qPrintable(movie));
-            zaf::fixture::FixtureSpec spec;
-            spec.seconds = 60;
-            spec.width = 1920;
-            spec.height = 1080;
-            spec.fps = 30;
-            spec.audioTracks = 2;
-            if (const zaf::OptionalError e = zaf::fixture::writeFixtureMovie(movie, spec)) {
-                std::fprintf(stderr, "media_bench: %s\n", qPrintable(e->message));
-                return 1;
-            }
-        }
-    }
+    if (movie.isEmpty())
+        movie = recording(work, 60, 2);
     const double duration = MediaAsset::assetWithURL(QUrl::fromLocalFile(movie))->duration().seconds();
     std::printf("movie %s (%.2f s), %d run(s) each, median times\n", qPrintable(movie), duration, runs);
 
     const QString out = QDir(work).filePath(QStringLiteral("out.mp4"));
     const QString ffOut = QDir(work).filePath(QStringLiteral("ff-out.mp4"));
 
+    auto ffmpegTrim = [&](const QStringList &codecs) {
+        return ffmpeg(QStringList{QStringLiteral("-ss"), QString::number(kTrimStart), QStringLiteral("-to"), QString::number(kTrimEnd),
+                                  QStringLiteral("-i"), movie, QStringLiteral("-map"), QStringLiteral("0")}
+                      + codecs + QStringList{ffOut});
+    };
     const double trimOurs = timeIt(runs, [&] { return ourTrim(movie, out); });
     const double trimFF = timeIt(runs, [&] {
-        return ffmpeg({QStringLiteral("-ss"), QString::number(kTrimStart), QStringLiteral("-to"), QString::number(kTrimEnd),
-                       QStringLiteral("-i"), movie, QStringLiteral("-map"), QStringLiteral("0"), QStringLiteral("-c:v"),
-                       QStringLiteral("libx264"), QStringLiteral("-preset"), kX264Preset, QStringLiteral("-crf"), kX264Crf,
-                       QStringLiteral("-c:a"), QStringLiteral("aac"), QStringLiteral("-b:a"), kAudioBitRate,
-                       QStringLiteral("-ar"), QStringLiteral("48000"), ffOut});
+        return ffmpegTrim({QStringLiteral("-c:v"), QStringLiteral("libx264"), QStringLiteral("-preset"), kX264Preset,
+                           QStringLiteral("-crf"), kX264Crf, QStringLiteral("-c:a"), QStringLiteral("aac"),
+                           QStringLiteral("-b:a"), kAudioBitRate, QStringLiteral("-ar"), QStringLiteral("48000")});
     });
-    report("trim", trimOurs, trimFF, "goal: no slower than ffmpeg");
+    report("trim", trimOurs, trimFF, "vs frame-accurate re-encode; goal: <= 0.05x");
+    const double copyFF = timeIt(runs, [&] { return ffmpegTrim({QStringLiteral("-c"), QStringLiteral("copy")}); });
+    report("trim", trimOurs, copyFF, "vs keyframe-inexact stream copy; goal: <= 30x");
+
+    const QString longMovie = recording(work, 300, 2);
+    const double longKept = timeIt(runs, [&] { return ourTrim(longMovie, out, 20, 270); });
+    const double shortKept = timeIt(runs, [&] { return ourTrim(longMovie, out, 20, 30); });
+    std::printf("%-12s 250 s kept %8.3f s   10 s kept %8.3f s   ratio %5.2fx   (goal: < 3x)\n", "long trim", longKept, shortKept,
+                longKept / shortKept);
 
     const double mixOurs = timeIt(runs, [&] { return ourMix(movie, out); });
     const double mixFF = timeIt(runs, [&] {
@@ -211,6 +248,14 @@ int main(int argc, char **argv)
                        QStringLiteral("-b:a"), kAudioBitRate, QStringLiteral("-ar"), QStringLiteral("48000"), ffOut});
     });
     report("mix", mixOurs, mixFF, "goal: within 1.2x");
+
+    const QString oneTrack = recording(work, 60, 1);
+    const double oneOurs = timeIt(runs, [&] { return ourMix(oneTrack, out); });
+    const double oneFF = timeIt(runs, [&] {
+        return ffmpeg({QStringLiteral("-i"), oneTrack, QStringLiteral("-map"), QStringLiteral("0"), QStringLiteral("-c"),
+                       QStringLiteral("copy"), ffOut});
+    });
+    report("mix 1 track", oneOurs, oneFF, "vs stream copy; goal: about a copy");
 
     const double thumbsOurs = timeIt(runs, [&] { return ourThumbnails(movie); });
     const double thumbsFF = timeIt(runs, [&] { return ffmpegThumbnails(movie, work, duration); });
