@@ -1,5 +1,6 @@
 #include "platform/media/export_session.h"
 
+#include "platform/dispatch.h"
 #include "platform/log.h"
 #include "platform/media/export_common.h"
 #include "platform/media/export_output_file.h"
@@ -7,14 +8,19 @@
 
 #include <algorithm>
 #include <atomic>
+#include <condition_variable>
 #include <mutex>
-#include <thread>
 
 namespace zaf::media {
 
 using namespace exportpipe;
 
+namespace {
+std::atomic<std::uint64_t> g_lastSessionID{0};
+} // namespace
+
 struct ExportSession::Private {
+    const std::uint64_t id = g_lastSessionID.fetch_add(1) + 1;
     std::shared_ptr<MediaAsset> asset;
     QString preset;
 
@@ -30,7 +36,23 @@ struct ExportSession::Private {
     std::atomic<bool> started{false};
     CancelFlag cancel;
 
+    // Whether an export is queued or writing; waitUntilFinished() waits for it to turn false.
+    mutable std::mutex runningMutex;
+    mutable std::condition_variable stoppedRunning;
+    bool running = false;
+
+    void setRunning(bool value)
+    {
+        {
+            std::lock_guard lock(runningMutex);
+            running = value;
+        }
+        if (!value)
+            stoppedRunning.notify_all();
+    }
+
     // Sets the final status; the error first, so that a reader that sees the status sees the error.
+    // Called once the output is committed or discarded: the export writes nothing after it.
     void finish(ExportStatus final, OptionalError finalError)
     {
         {
@@ -40,6 +62,7 @@ struct ExportSession::Private {
         if (final == ExportStatus::Completed)
             progress.store(1.0f);
         status.store(int(final));
+        setRunning(false);
     }
 };
 
@@ -132,33 +155,54 @@ float ExportSession::progress() const
     return d->progress.load();
 }
 
+std::uint64_t ExportSession::sessionID() const
+{
+    return d->id;
+}
+
 void ExportSession::cancelExport()
 {
     d->cancel.cancelled.store(true);
-    // An export that has not started ends here; a running one notices the flag in its loops.
-    int expected = int(ExportStatus::Unknown);
-    if (d->status.compare_exchange_strong(expected, int(ExportStatus::Cancelled))) {
-        std::lock_guard lock(d->mutex);
-        d->error = makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
+    // An export that has not started, or waits for a pool thread, ends here: it will write nothing
+    // (its run ends at once, with the completion). A running one notices the flag in its loops.
+    for (ExportStatus before : {ExportStatus::Unknown, ExportStatus::Waiting}) {
+        int expected = int(before);
+        if (d->status.compare_exchange_strong(expected, int(ExportStatus::Cancelled))) {
+            {
+                std::lock_guard lock(d->mutex);
+                d->error = makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
+            }
+            d->setRunning(false);
+            return;
+        }
     }
+}
+
+bool ExportSession::waitUntilFinished(std::chrono::milliseconds timeout) const
+{
+    std::unique_lock lock(d->runningMutex);
+    return d->stoppedRunning.wait_for(lock, timeout, [this] { return !d->running; });
 }
 
 void ExportSession::exportAsynchronously(std::function<void()> completion)
 {
     if (d->started.exchange(true)) {
         zaf::log::error(lcExport(), QStringLiteral("ExportSession: the session has already exported; nothing new starts"));
-        std::thread([completion = std::move(completion)] {
+        zaf::dispatch::async(zaf::dispatch::Priority::Default, [completion = std::move(completion)] {
             if (completion)
                 completion();
-        }).detach();
+        });
         return;
     }
+    // Running before Waiting: a cancel that sees Waiting is the one that clears it.
+    d->setRunning(true);
     int expected = int(ExportStatus::Unknown);
-    d->status.compare_exchange_strong(expected, int(ExportStatus::Waiting));
-    // The thread holds the session until the completion has run.
-    std::thread([self = shared_from_this(), completion = std::move(completion)]() mutable {
+    if (!d->status.compare_exchange_strong(expected, int(ExportStatus::Waiting)))
+        d->setRunning(false); // cancelled before the start: nothing will be written
+    // The task holds the session until the completion has run.
+    zaf::dispatch::async(zaf::dispatch::Priority::Default, [self = shared_from_this(), completion = std::move(completion)]() mutable {
         self->run(std::move(completion));
-    }).detach();
+    });
 }
 
 namespace {

@@ -4,10 +4,19 @@
 // audio tracks kept one by one or mixed into one track.
 //
 // Threads: the session is configured on any thread (normally the main thread) before
-// exportAsynchronously(). The export then runs on a worker thread of its own; status(), progress(),
-// error() and cancelExport() may be called from any thread at any time.
-// Callbacks, in order: exactly one completion, on the export's worker thread (never the main thread),
-// after status() holds its final value (Completed, Failed or Cancelled). Nothing runs after it.
+// exportAsynchronously(). The export then runs on a thread of the default-priority global queue;
+// status(), progress(), error(), cancelExport() and waitUntilFinished() may be called from any
+// thread at any time.
+// Callbacks, in order: exactly one completion, on the export's pool thread (never the main thread),
+// after status() holds its final value (Completed, Failed or Cancelled) and the export has stopped
+// writing. Nothing runs after it.
+//
+// Owners that must know the export no longer writes (before they empty its output's directory)
+// cancel it and then call waitUntilFinished(): it returns once the output is committed or removed,
+// without waiting for the completion, so an owner on the main thread can wait even when the
+// completion is about to hop to the main thread. Each session has a process-unique sessionID(),
+// by which a completion tells its own export from a newer one (addresses of ended sessions are
+// reused).
 //
 // Output rules: the file is written under a temporary name in the output's directory and renamed
 // into place without replacing anything; a failed or cancelled export leaves no file behind.
@@ -24,6 +33,8 @@
 #include <QString>
 #include <QUrl>
 
+#include <chrono>
+#include <cstdint>
 #include <functional>
 #include <memory>
 #include <optional>
@@ -56,11 +67,20 @@ public:
     void setAudioMix(std::optional<AudioMix> mix);
     std::optional<AudioMix> audioMix() const;
 
-    // Starts the export on a worker thread and returns at once. The completion runs exactly once,
-    // on that worker thread (never the main thread), after status() has its final value. The session
+    // Process-unique, increasing with each session made; never 0.
+    std::uint64_t sessionID() const;
+
+    // Starts the export on a pool thread and returns at once. The completion runs exactly once,
+    // on that thread (never the main thread), after status() has its final value. The session
     // keeps itself alive until then. A session exports once: a second call runs its completion on a
-    // worker thread without exporting again.
+    // pool thread without exporting again.
     void exportAsynchronously(std::function<void()> completion);
+    // Any thread, including the main thread while the completion waits for it. Blocks until the
+    // export has stopped writing (its output is in place or removed, status() is final) or the
+    // timeout has passed; true when it has stopped. True at once for a session that was never
+    // started or whose waiting export was cancelled before it began. The completion may still be
+    // running or about to run when this returns.
+    bool waitUntilFinished(std::chrono::milliseconds timeout) const;
 
     ExportStatus status() const;
     OptionalError error() const;   // domain "zaf.media", code from MediaErrorCode

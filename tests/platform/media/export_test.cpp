@@ -337,6 +337,10 @@ protected:
 
 TEST_F(ExportFailureTest, SessionCreationFailsForNullAssetOrUnknownPreset)
 {
+    // Sessions that do get made carry distinct, increasing ids.
+    const auto first = makeSession(source, output), second = makeSession(source, output);
+    EXPECT_NE(first->sessionID(), 0u);
+    EXPECT_GT(second->sessionID(), first->sessionID());
     EXPECT_EQ(ExportSession::exportSessionWithAsset(nullptr, QString::fromLatin1(kExportPresetHighestQuality)), nullptr);
     EXPECT_EQ(ExportSession::exportSessionWithAsset(MediaAsset::assetWithURL(QUrl::fromLocalFile(source)), QStringLiteral("LowQuality")),
               nullptr);
@@ -408,25 +412,37 @@ TEST_F(ExportFailureTest, ExportOfMissingEmptyTruncatedOrNonMovieInputFails)
     }
 }
 
-// Cancelling a running export ends it Cancelled, with one completion off the main thread and no output.
-TEST_F(ExportFailureTest, CancelledExportReportsCancelledAndLeavesNoOutput)
+// Cancelling a running export ends it Cancelled, with one completion off the main thread and no
+// output. The wait after the cancel returns within its bound once nothing is written any more, even
+// while the completion is held up (as the editor's is by its hop to the main thread).
+TEST_F(ExportFailureTest, CancelledExportStopsWritingWithinTheWaitAndLeavesNoOutput)
 {
     auto session = makeSession(sharedFixtureMovie({.seconds = 20, .width = 640, .height = 480, .audioTracks = 2}), output);
     session->setTimeRange(MediaTimeRange{MediaTime::zero(), MediaTime::make(20, 1)});
+    EXPECT_TRUE(session->waitUntilFinished(std::chrono::milliseconds(0))) << "a session not started writes nothing";
     ExportWaiter waiter;
-    session->exportAsynchronously(waiter.completion(session));
+    std::mutex gate;
+    std::unique_lock held(gate);
+    session->exportAsynchronously([&, completion = waiter.completion(session)] {
+        std::lock_guard wait(gate);
+        completion();
+    });
     // Cancel once the export has really started writing.
     for (int i = 0; i < 2000 && session->progress() <= 0.0f && session->status() != ExportStatus::Failed; ++i)
         std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    EXPECT_FALSE(session->waitUntilFinished(std::chrono::milliseconds(1))) << "the export is still writing";
     session->cancelExport();
+    EXPECT_TRUE(session->waitUntilFinished(std::chrono::seconds(10)));
+    EXPECT_EQ(session->status(), ExportStatus::Cancelled);
+    EXPECT_FALSE(QFile::exists(output));
+    expectNoPartialFiles();
+    held.unlock();
     const ExportOutcome outcome = waiter.wait();
     EXPECT_EQ(outcome.completions, 1);
     EXPECT_FALSE(outcome.ranOnMainThread);
     EXPECT_EQ(outcome.statusInCompletion, ExportStatus::Cancelled);
     ASSERT_TRUE(session->error().has_value());
     EXPECT_EQ(session->error()->code, kMediaErrorCancelled);
-    EXPECT_FALSE(QFile::exists(output));
-    expectNoPartialFiles();
 }
 
 // Cancelling before the start ends the export Cancelled; a session exports once, so starting it
@@ -436,6 +452,7 @@ TEST_F(ExportFailureTest, CancelBeforeStartEndsCancelledWithOneCompletion)
     auto session = makeSession(source, output);
     session->cancelExport();
     EXPECT_EQ(session->status(), ExportStatus::Cancelled);
+    EXPECT_TRUE(session->waitUntilFinished(std::chrono::milliseconds(0)));
     EXPECT_EQ(runToEnd(session), ExportStatus::Cancelled);
     EXPECT_EQ(runToEnd(session), ExportStatus::Cancelled);
     EXPECT_FALSE(QFile::exists(output));
