@@ -101,4 +101,57 @@ bool isMainThread()
     return app && QThread::currentThread() == app->thread();
 }
 
+std::shared_ptr<MainGate> MainGate::create()
+{
+    return std::shared_ptr<MainGate>(new MainGate);
+}
+
+bool MainGate::runSync(std::function<void()> fn)
+{
+    if (isMainThread()) {
+        // close() runs on this thread too, so the gate cannot close while fn runs.
+        if (isClosed())
+            return false;
+        fn();
+        return true;
+    }
+    if (!QCoreApplication::instance())
+        return false;
+    // What became of this one hop; guarded by the gate's mutex.
+    struct Hop {
+        bool ran = false;
+        bool over = false;
+    };
+    auto hop = std::make_shared<Hop>();
+    main([self = shared_from_this(), hop, fn = std::move(fn)] {
+        if (self->isClosed()) {
+            std::lock_guard lock(self->m_mutex);
+            hop->over = true;
+        } else {
+            fn();
+            std::lock_guard lock(self->m_mutex);
+            hop->ran = hop->over = true;
+        }
+        self->m_changed.notify_all();
+    });
+    std::unique_lock lock(m_mutex);
+    m_changed.wait(lock, [&] { return hop->over || m_closed; });
+    return hop->ran;
+}
+
+void MainGate::close()
+{
+    {
+        std::lock_guard lock(m_mutex);
+        m_closed = true;
+    }
+    m_changed.notify_all();
+}
+
+bool MainGate::isClosed() const
+{
+    std::lock_guard lock(m_mutex);
+    return m_closed;
+}
+
 } // namespace zaf::dispatch

@@ -6,7 +6,10 @@
 // that loop. The global queues are two thread pools that run submitted work concurrently, one at
 // background priority and one at default priority. Neither keeps an order between two submissions.
 
+#include <condition_variable>
 #include <functional>
+#include <memory>
+#include <mutex>
 
 class QThreadPool;
 
@@ -32,5 +35,29 @@ void waitForGlobalQueue(Priority priority);
 
 // True on the thread that runs the Qt event loop of the application (the main thread).
 bool isMainThread();
+
+// A synchronous hop to the main thread that its owner can call off. An object of the main thread
+// whose workers hop to it with mainSync cannot wait for those workers (the worker may be blocked
+// in its hop while the main thread waits for it). Workers hop through the object's gate instead;
+// the object closes the gate as it goes away. From then on no hop runs its work, and a worker
+// waiting for its hop returns at once, so the owner may then wait for its workers.
+class MainGate : public std::enable_shared_from_this<MainGate> {
+public:
+    static std::shared_ptr<MainGate> create();
+
+    // Any thread. Runs fn on the main thread and waits until it has run (inline on the main
+    // thread), unless the gate is closed first. True when fn ran, false when the gate was closed
+    // before it could (fn then never runs) or there is no application.
+    bool runSync(std::function<void()> fn);
+    // Main thread. Calls off every hop that has not run yet and every later one.
+    void close();
+    bool isClosed() const;
+
+private:
+    MainGate() = default;
+    mutable std::mutex m_mutex;
+    std::condition_variable m_changed;
+    bool m_closed = false;
+};
 
 } // namespace zaf::dispatch

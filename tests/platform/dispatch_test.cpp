@@ -48,5 +48,41 @@ TEST(Dispatch, GlobalQueuesRunConcurrentlyOffTheMainThread)
     EXPECT_NE(&globalQueue(Priority::Background), &globalQueue(Priority::Default));
 }
 
+// A worker blocked in its hop returns when the main thread closes the gate instead of reaching
+// its event loop, and the work never runs; an open gate runs the work on the main thread.
+TEST(Dispatch, MainGateRunsHopsUntilClosedAndReleasesAWaitingWorker)
+{
+    auto gate = MainGate::create();
+    EXPECT_TRUE(gate->runSync([] {}));
+    std::atomic<int> ranOnMain{0}, result{-1};
+    std::atomic<bool> workerDone{false};
+    async(Priority::Default, [&] {
+        result = gate->runSync([&] { ranOnMain += isMainThread(); }) ? 1 : 0;
+        workerDone = true;
+    });
+    while (!workerDone)
+        QCoreApplication::processEvents(QEventLoop::AllEvents, 10);
+    EXPECT_EQ(result.load(), 1);
+    EXPECT_EQ(ranOnMain.load(), 1);
+
+    std::atomic<bool> ran{false};
+    workerDone = false;
+    async(Priority::Default, [&] {
+        result = gate->runSync([&] { ran = true; }) ? 1 : 0;
+        workerDone = true;
+    });
+    QThread::msleep(50); // the worker now waits for a main thread that does not come
+    gate->close();
+    // The main thread waits for the worker without handling events, as an owner's destructor does.
+    for (int i = 0; i < 500 && !workerDone; ++i)
+        QThread::msleep(10);
+    EXPECT_TRUE(workerDone);
+    EXPECT_EQ(result.load(), 0);
+    QCoreApplication::processEvents();
+    EXPECT_FALSE(ran);
+    EXPECT_FALSE(gate->runSync([&] { ran = true; }));
+    EXPECT_FALSE(ran);
+}
+
 } // namespace
 } // namespace zaf::dispatch
