@@ -1,10 +1,11 @@
 #include "platform/files/file_manager.h"
 
+#include "platform/files/atomic_file.h"
+
 #include <QByteArray>
 #include <QFile>
 
 #include <cerrno>
-#include <cstdio>
 #include <dirent.h>
 #include <fcntl.h>
 #include <filesystem>
@@ -48,7 +49,7 @@ auto retrying(F f)
     return r;
 }
 
-OptionalError copyFileData(int in, int out, const QString &from)
+OptionalError copyFileData(int in, int out, const QString &from, const QString &to)
 {
     char buffer[1 << 16];
     for (;;) {
@@ -61,7 +62,7 @@ OptionalError copyFileData(int in, int out, const QString &from)
         while (written < n) {
             const ssize_t w = retrying([&] { return ::write(out, buffer + written, size_t(n - written)); });
             if (w < 0)
-                return Error::fromErrno(errno);
+                return Error::fromErrno(errno, to);
             written += w;
         }
     }
@@ -157,20 +158,9 @@ OptionalError FileManager::removeItemAtPath(const QString &path) const
 
 OptionalError FileManager::moveItemAtPath(const QString &from, const QString &to) const
 {
-    const QByteArray src = encoded(from), dst = encoded(to);
-    if (::renameat2(AT_FDCWD, src.constData(), AT_FDCWD, dst.constData(), RENAME_NOREPLACE) == 0)
-        return std::nullopt;
-    const int err = errno;
-    if (err == EINVAL || err == ENOSYS) {
-        // The file system cannot refuse to replace atomically; check, then rename.
-        if (fileExistsAtPath(to))
-            return Error::fromErrno(EEXIST, to);
-        if (::rename(src.constData(), dst.constData()) == 0)
-            return std::nullopt;
-        return Error::fromErrno(errno, from);
-    }
-    if (err != EXDEV)
-        return Error::fromErrno(err, err == EEXIST ? to : from);
+    OptionalError moved = moveWithoutReplacing(from, to);
+    if (!moved || moved->code != EXDEV)
+        return moved;
     // Another file system: copy safely, then remove the source.
     if (OptionalError e = copyItemAtPath(from, to))
         return e;
@@ -188,52 +178,15 @@ OptionalError FileManager::copyItemAtPath(const QString &from, const QString &to
         ::close(in);
         return Error::fromErrno(statError, from);
     }
-
-    // An unnamed file in the destination directory, linked in only when complete: a crash or a full
-    // disk never leaves a partial file under the destination's name.
-    const int slash = to.lastIndexOf(QLatin1Char('/'));
-    const QString dir = slash > 0 ? to.left(slash) : QStringLiteral(".");
-    QString tempPath;
-    int out = retrying([&] { return ::open(encoded(dir).constData(), O_TMPFILE | O_WRONLY | O_CLOEXEC, 0644); });
-    if (out < 0) {
-        // No O_TMPFILE on this file system: a hidden temporary name instead.
-        QByteArray pattern = encoded(dir + QStringLiteral("/.zaf-copy-XXXXXX"));
-        out = ::mkostemp(pattern.data(), O_CLOEXEC);
-        if (out < 0) {
-            const int err = errno;
-            ::close(in);
-            return Error::fromErrno(err, to);
-        }
-        tempPath = QFile::decodeName(pattern);
+    Result<std::unique_ptr<AtomicFile>> out = AtomicFile::create(to);
+    if (!out.ok()) {
+        ::close(in);
+        return out.error;
     }
-
-    OptionalError failure = copyFileData(in, out, from);
+    OptionalError failure = copyFileData(in, (*out.value)->descriptor(), from, to);
     ::close(in);
-    if (!failure && ::fsync(out) != 0)
-        failure = Error::fromErrno(errno, to);
-    if (!failure) {
-        int rc;
-        if (tempPath.isEmpty()) {
-            const QByteArray procPath = "/proc/self/fd/" + QByteArray::number(out);
-            rc = ::linkat(AT_FDCWD, procPath.constData(), AT_FDCWD, encoded(to).constData(), AT_SYMLINK_FOLLOW);
-        } else {
-            rc = ::link(encoded(tempPath).constData(), encoded(to).constData());
-        }
-        if (rc != 0)
-            failure = Error::fromErrno(errno, to);
-    }
-    ::close(out);
-    if (!tempPath.isEmpty())
-        ::unlink(encoded(tempPath).constData());
-    if (!failure) {
-        // Make the new directory entry durable too.
-        const int d = ::open(encoded(dir).constData(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-        if (d >= 0) {
-            ::fsync(d);
-            ::close(d);
-        }
-    }
-    return failure;
+    // On failure the temporary goes with the AtomicFile.
+    return failure ? failure : (*out.value)->commit();
 }
 
 Result<FileSystemAttributes> FileManager::attributesOfFileSystemForPath(const QString &path) const

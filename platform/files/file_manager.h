@@ -57,12 +57,13 @@ public:
     // Removes the item at the path; a directory goes with its contents. Nothing there is an error.
     virtual OptionalError removeItemAtPath(const QString &path) const;
 
-    // Moves an item. Fails with EEXIST when the destination exists; never overwrites. Across file
-    // systems the data is copied under a temporary name, flushed, then put in place.
+    // Moves an item. Fails with EEXIST when the destination exists; never overwrites (see
+    // moveWithoutReplacing). Across file systems a file is copied as copyItemAtPath does, then the
+    // source is removed.
     virtual OptionalError moveItemAtPath(const QString &from, const QString &to) const;
 
-    // Copies a regular file to a destination that must not exist: written under a temporary name in
-    // the destination's directory, flushed to disk, then linked into place. A failure leaves nothing.
+    // Copies a regular file to a destination that must not exist, through an AtomicFile: the
+    // destination appears only complete and flushed to disk, and a failure leaves nothing.
     virtual OptionalError copyItemAtPath(const QString &from, const QString &to) const;
 
     // Attributes of the file system that holds the path.

@@ -1,6 +1,7 @@
 #include "platform/media/movie_writer.h"
 #include "platform/media/media_log.h"
 
+#include "platform/files/atomic_file.h"
 #include "platform/log.h"
 #include "platform/media/ffmpeg_ptr.h"
 #include "platform/media/frame_converter.h"
@@ -12,7 +13,6 @@ extern "C" {
 #include <libavutil/opt.h>
 }
 
-#include <QDir>
 #include <QFile>
 #include <QFileInfo>
 #include <QLoggingCategory>
@@ -20,11 +20,7 @@ extern "C" {
 #include <algorithm>
 #include <cerrno>
 #include <cmath>
-#include <cstdio>
 #include <cstring>
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
 #include <vector>
 
 namespace zaf::media {
@@ -45,37 +41,13 @@ int writeErrorCode(int averror)
     return averror == AVERROR(ENOSPC) ? kMediaErrorDiskFull : kMediaErrorWriteFailed;
 }
 
-// Moves `from` to `to` without ever replacing an existing `to`.
-int renameNoReplace(const QString &from, const QString &to)
+// A file error in the POSIX domain, told as the writer's error.
+Error fileError(const Error &posix, const QString &what)
 {
-    const QByteArray src = QFile::encodeName(from);
-    const QByteArray dst = QFile::encodeName(to);
-    if (::renameat2(AT_FDCWD, src.constData(), AT_FDCWD, dst.constData(), RENAME_NOREPLACE) == 0)
-        return 0;
-    if (errno != EINVAL && errno != ENOSYS)
-        return errno;
-    // File systems without RENAME_NOREPLACE: a hard link is just as exclusive.
-    if (::link(src.constData(), dst.constData()) == 0) {
-        ::unlink(src.constData());
-        return 0;
-    }
-    if (errno == EEXIST)
-        return EEXIST;
-    // No hard links either (FAT and friends): check, then rename.
-    if (QFileInfo::exists(to))
-        return EEXIST;
-    return ::rename(src.constData(), dst.constData()) == 0 ? 0 : errno;
-}
-
-int fsyncPath(const QString &path)
-{
-    const int fd = ::open(QFile::encodeName(path).constData(), O_RDONLY | O_CLOEXEC);
-    if (fd < 0)
-        return errno;
-    int result = ::fsync(fd) == 0 ? 0 : errno;
-    ::fchmod(fd, 0644);
-    ::close(fd);
-    return result;
+    const int code = posix.code == EEXIST ? kMediaErrorOutputExists
+        : (posix.code == ENOSPC || posix.code == EDQUOT) ? kMediaErrorDiskFull
+                                                          : kMediaErrorWriteFailed;
+    return writerError(code, QStringLiteral("%1: %2").arg(what, posix.message));
 }
 
 struct VideoTrack {
@@ -99,7 +71,8 @@ struct AudioTrack {
 struct MovieWriter::Private {
     Settings settings;
     QString finalPath;
-    QString tempPath;
+    std::unique_ptr<AtomicFile> file;   // the movie under its temporary name until finish()
+    QString tempPath;                   // file's temporary path, for messages
     ff::OutputFormatContextPtr output;
     VideoTrack video;
     std::vector<AudioTrack> audio;
@@ -110,9 +83,9 @@ struct MovieWriter::Private {
 
     ~Private()
     {
+        // The muxer lets go of the temporary file before the file discards it.
         output.reset();
-        if (!tempPath.isEmpty())
-            QFile::remove(tempPath);
+        file.reset();
     }
 
     OptionalError fail(Error error)
@@ -304,8 +277,6 @@ Result<std::unique_ptr<MovieWriter>> MovieWriter::create(const QString &path, co
         return R::failure(writerError(kMediaErrorInvalidArgument, QStringLiteral("unsupported quality settings")));
 
     const QFileInfo target(path);
-    if (target.exists() || target.isSymLink())
-        return R::failure(writerError(kMediaErrorOutputExists, QStringLiteral("%1 already exists").arg(path)));
 
     const AVCodec *videoCodec = avcodec_find_encoder_by_name("libx264");
     const AVCodec *audioCodec = avcodec_find_encoder(AV_CODEC_ID_AAC);
@@ -317,16 +288,13 @@ Result<std::unique_ptr<MovieWriter>> MovieWriter::create(const QString &path, co
     d.settings = settings;
     d.finalPath = target.absoluteFilePath();
 
-    // Reserve a unique temporary name beside the target, so the final rename stays on one file system.
-    QByteArray pattern = QFile::encodeName(target.absolutePath() + QStringLiteral("/.") + target.fileName() + QStringLiteral(".writing-XXXXXX"));
-    const int fd = ::mkstemp(pattern.data());
-    if (fd < 0) {
-        const int err = errno;
-        return R::failure(writerError(err == ENOSPC ? kMediaErrorDiskFull : kMediaErrorWriteFailed,
-                                      QStringLiteral("cannot create a file in %1: %2").arg(target.absolutePath(), QString::fromLocal8Bit(std::strerror(err)))));
-    }
-    ::close(fd);
-    d.tempPath = QFile::decodeName(pattern);
+    // The movie is written under a temporary name beside the target and put in place by finish().
+    Result<std::unique_ptr<AtomicFile>> file = AtomicFile::create(d.finalPath);
+    if (!file.ok())
+        return R::failure(fileError(*file.error, QStringLiteral("cannot create the movie")));
+    d.file = std::move(*file.value);
+    d.tempPath = d.file->temporaryPath();
+    const QByteArray pattern = QFile::encodeName(d.tempPath);
 
     AVFormatContext *raw = nullptr;
     int rc = avformat_alloc_output_context2(&raw, nullptr, "mp4", pattern.constData());
@@ -439,13 +407,8 @@ OptionalError MovieWriter::finish()
         return d->fail(writerError(writeErrorCode(rc), QStringLiteral("cannot close %1: %2").arg(d->tempPath, ff::errorString(rc))));
     d->output.reset();
 
-    if (const int err = fsyncPath(d->tempPath))
-        return d->fail(writerError(err == ENOSPC ? kMediaErrorDiskFull : kMediaErrorWriteFailed,
-                                   QStringLiteral("cannot flush %1: %2").arg(d->tempPath, QString::fromLocal8Bit(std::strerror(err)))));
-    if (const int err = renameNoReplace(d->tempPath, d->finalPath))
-        return d->fail(writerError(err == EEXIST ? kMediaErrorOutputExists : kMediaErrorWriteFailed,
-                                   QStringLiteral("cannot move the movie to %1: %2").arg(d->finalPath, QString::fromLocal8Bit(std::strerror(err)))));
-    d->tempPath.clear();
+    if (OptionalError e = d->file->commit())
+        return d->fail(fileError(*e, QStringLiteral("cannot put the movie in place")));
     d->done = true;
     zaf::log::info(lcMedia(), QStringLiteral("MovieWriter: finished %1 (%2 frames)").arg(d->finalPath).arg(d->video.nextPts));
     return std::nullopt;
