@@ -202,7 +202,7 @@ TEST(MovieWriterTest, AppendVideoFrameScalesAndConvertsPicturesOfAnyFormat)
 }
 
 // The movie is written under a hidden temporary name and appears under its own name only when
-// finished; an abandoned writer leaves nothing behind.
+// finished, never over a file that took the name meanwhile; an abandoned writer leaves nothing.
 TEST(MovieWriterTest, MovieAppearsUnderFinalNameOnlyAfterFinishAndNeverWhenAbandoned)
 {
     zaf::test::ScratchDir dir;
@@ -223,6 +223,17 @@ TEST(MovieWriterTest, MovieAppearsUnderFinalNameOnlyAfterFinishAndNeverWhenAband
     appendNumberedFrames(*writer, 5);
     writer.reset();
     EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"late.mp4"}));
+
+    // A file that takes the name while the movie is written is kept; the movie goes.
+    writer = createWriter(dir.file(QStringLiteral("raced.mp4")), MovieWriter::Settings{QSize(128, 96)});
+    ASSERT_TRUE(writer);
+    appendNumberedFrames(*writer, 5);
+    const QString raced = dir.write(QStringLiteral("raced.mp4"), 77);
+    const zaf::OptionalError refused = writer->finish();
+    ASSERT_TRUE(refused);
+    EXPECT_EQ(refused->code, zaf::media::kMediaErrorOutputExists);
+    EXPECT_EQ(QFileInfo(raced).size(), 77);
+    EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"late.mp4", "raced.mp4"}));
 }
 
 // Creation fails, leaving no file and an existing one untouched, for an existing path, an
