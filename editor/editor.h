@@ -9,6 +9,11 @@
 // elsewhere comes back to the main thread before it touches the editor: the trim export's
 // completion (synchronously, so the export's thread waits for the reload), the thumbnail
 // generator's answers (stored into the cache on the main thread), and the end of a save.
+// The trim export's synchronous hop goes through the editor's main gate, which the destructor
+// closes first: a completion waiting in its hop then returns without the reload, so the destructor
+// can cancel the trim export and the save's mix and wait until they have stopped writing before it
+// empties the temporary directory. A completion acts only for the export whose session id is the
+// current one; an older export's completion is ignored.
 //
 // Order of events for one movie: construction loads the movie (status unknown); the item's status
 // change to ready makes the editor the timeline's delegate and data source and reloads it; the
@@ -53,6 +58,10 @@ class MediaAsset;
 class PlayerItem;
 class PlayerLayer;
 } // namespace zaf::media
+
+namespace zaf::dispatch {
+class MainGate;
+} // namespace zaf::dispatch
 
 namespace zaf::ui {
 class BackdropView;
@@ -273,6 +282,9 @@ private:
     void installKeyboardShortcuts();
     QRect unplayableMessageFrame();
     void setTrimPointAtPlayhead(bool start);
+    // Whether sessionID names the trim export the editor holds now (an older export's completion
+    // changes nothing).
+    bool isCurrentTrimExport(std::uint64_t sessionID) const;
 
     QUrl m_videoURL;
     std::unique_ptr<zaf::media::Player> m_mvPlayer;
@@ -316,6 +328,10 @@ private:
     QUrl m_trimFilePath;
     QUrl m_originalVideoURL;
     std::shared_ptr<zaf::media::ExportSession> m_exportSession;
+    // The export of the running save's mix (none before a save).
+    std::shared_ptr<zaf::media::ExportSession> m_mixSession;
+    // Closed by the destructor; the trim completion's hop to the main thread goes through it.
+    std::shared_ptr<zaf::dispatch::MainGate> m_mainGate;
     zaf::ui::MovieScrubber *m_mvTrimmer = nullptr;
     std::shared_ptr<zaf::media::ImageGenerator> m_thumbnailGenerator;
     std::optional<QHash<double, QImage>> m_cachedTimeStamps;

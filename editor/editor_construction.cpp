@@ -6,6 +6,7 @@
 #include "editor/date_extensions.h"
 #include "overlay/video_overlay_button.h"
 #include "platform/capability/capability_service.h"
+#include "platform/dispatch.h"
 #include "platform/media/export_session.h"
 #include "platform/media/media_asset.h"
 #include "platform/media/player_item.h"
@@ -75,7 +76,7 @@ ZafVideoEditorViewController::ZafVideoEditorViewController(const QString &bundle
                                                            const QString &applicationName,
                                                            const QColor &overrideTintColor, const QRectF &size,
                                                            QObject *parent)
-    : ViewController(parent)
+    : ViewController(parent), m_mainGate(zaf::dispatch::MainGate::create())
 {
     QWidget *root = view();
     if (!size.isEmpty())
@@ -297,8 +298,13 @@ ZafVideoEditorViewController::~ZafVideoEditorViewController()
     }
     if (m_mvPlayerLayer)
         m_mvPlayerLayer->setPlayer(nullptr);
-    if (m_exportSession)
-        m_exportSession->cancelExport();
+    // A trim completion waiting to reload returns without it: the main thread is busy here.
+    m_mainGate->close();
+    // Exports write into the temporary directory: it is emptied only once they have stopped.
+    for (const std::shared_ptr<ExportSession> &session : {m_exportSession, m_mixSession}) {
+        if (session)
+            session->cancelExportAndWait();
+    }
     // The temporary directory's contents belong to the running editor.
     ZafTempStore::defaultStore()._srDeleteAllTempFiles();
 }

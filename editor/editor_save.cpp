@@ -25,7 +25,9 @@ void ZafVideoEditorViewController::saveAction()
     QPointer<ZafVideoEditorViewController> weakSelf(this);
     const QUrl unmixed = m_videoURL;
     // Runs on the mix's export thread.
-    ZafAudioMixUtility::mixAudioForMovieWithCompletionHandler(unmixed, [weakSelf, unmixed](const QUrl &mixed,
+    // The editor keeps the mix's export so that its destructor can stop it before emptying the
+    // temporary directory the mix writes into.
+    m_mixSession = ZafAudioMixUtility::mixAudioForMovieWithCompletionHandler(unmixed, [weakSelf, unmixed](const QUrl &mixed,
                                                                                           const zaf::OptionalError &error) {
         QUrl toSave = mixed;
         if (error) {

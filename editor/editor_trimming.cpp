@@ -66,33 +66,34 @@ void ZafVideoEditorViewController::trimVideo()
     m_exportSession->setTimeRange(MediaTimeRange::fromStartEnd(start, end));
 
     const std::shared_ptr<ExportSession> session = m_exportSession;
+    const std::uint64_t sessionID = session->sessionID();
+    const std::shared_ptr<zaf::dispatch::MainGate> gate = m_mainGate;
     QPointer<ZafVideoEditorViewController> weakSelf(this);
     // Runs on the export's thread.
-    session->exportAsynchronously([session, weakSelf, previousTrimFile] {
+    session->exportAsynchronously([session, sessionID, gate, weakSelf, previousTrimFile] {
+        // The editor lets the user cancel the trim or try again after a failed or cancelled export.
+        auto endExporting = [weakSelf, sessionID] {
+            if (weakSelf && weakSelf->isCurrentTrimExport(sessionID))
+                weakSelf->m_exporting = false;
+        };
         switch (session->status()) {
         case ExportStatus::Failed: {
             const zaf::OptionalError error = session->error();
             zaf::log::notice(lcEditor(), QStringLiteral("ZavVideoEditorViewController: Export Trim Video Failed, due to error: %1")
                                              .arg(error ? error->code : 0));
-            // The user must be able to cancel the trim or try again.
-            zaf::dispatch::main([weakSelf] {
-                if (weakSelf)
-                    weakSelf->m_exporting = false;
-            });
+            zaf::dispatch::main(endExporting);
             break;
         }
         case ExportStatus::Cancelled:
             zaf::log::notice(lcEditor(), QStringLiteral("ZavVideoEditorViewController: Export Trim Video Cancelled"));
-            zaf::dispatch::main([weakSelf] {
-                if (weakSelf)
-                    weakSelf->m_exporting = false;
-            });
+            zaf::dispatch::main(endExporting);
             break;
         default:
-            // The export's thread waits until the new movie is loaded.
-            zaf::dispatch::mainSync([weakSelf, session, previousTrimFile] {
+            // The export's thread waits until the new movie is loaded, unless the editor goes away
+            // first (it closes the gate, and nothing is loaded).
+            gate->runSync([weakSelf, session, sessionID, previousTrimFile] {
                 ZafVideoEditorViewController *self = weakSelf.data();
-                if (!self)
+                if (!self || !self->isCurrentTrimExport(sessionID))
                     return;
                 self->m_exporting = false;
                 self->removeAllNotificationRegistrations();
@@ -104,6 +105,11 @@ void ZafVideoEditorViewController::trimVideo()
             break;
         }
     });
+}
+
+bool ZafVideoEditorViewController::isCurrentTrimExport(std::uint64_t sessionID) const
+{
+    return m_exportSession && m_exportSession->sessionID() == sessionID;
 }
 
 void ZafVideoEditorViewController::undoAction()

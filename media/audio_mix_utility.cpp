@@ -14,11 +14,12 @@ Q_LOGGING_CATEGORY(lcAudioMix, "zaf.audiomix")
 
 using namespace zaf::media;
 
-void ZafAudioMixUtility::mixAudioForMovieWithCompletionHandler(const QUrl &movieURL, CompletionHandler completion)
+std::shared_ptr<ExportSession> ZafAudioMixUtility::mixAudioForMovieWithCompletionHandler(const QUrl &movieURL,
+                                                                                         CompletionHandler completion)
 {
     if (movieURL.isEmpty()) {
         completion(QUrl(), ZafUserError::_zafUserErrorForCode(ZafUserErrorCodeNoMovie));
-        return;
+        return nullptr;
     }
 
     const std::shared_ptr<ExportSession> session = exportSessionForMixingAudio(movieURL, tempFileURL());
@@ -27,7 +28,7 @@ void ZafAudioMixUtility::mixAudioForMovieWithCompletionHandler(const QUrl &movie
         // reported like a failed export (from the calling thread, as nothing else runs).
         zaf::log::notice(lcAudioMix(), QStringLiteral("ZafAudioMixUtility: MvAssetExportSessionFailed"));
         completion(QUrl(), ZafUserError::_zafUserErrorForCode(ZafUserErrorCodeExportFailed));
-        return;
+        return nullptr;
     }
 
     // The completion holds the session and the caller's completion until the export ends.
@@ -46,6 +47,7 @@ void ZafAudioMixUtility::mixAudioForMovieWithCompletionHandler(const QUrl &movie
             break;
         }
     });
+    return session;
 }
 
 std::shared_ptr<ExportSession> ZafAudioMixUtility::exportSessionForMixingAudio(const QUrl &movieURL,

@@ -26,8 +26,11 @@ public:
     // was given, -5812 when the export failed, was cancelled or could not be set up.
     using CompletionHandler = std::function<void(const QUrl &outputURL, const zaf::OptionalError &error)>;
 
-    // Mixes the movie at movieURL (may be empty) and calls completion exactly once.
-    static void mixAudioForMovieWithCompletionHandler(const QUrl &movieURL, CompletionHandler completion);
+    // Mixes the movie at movieURL (may be empty) and calls completion exactly once. Returns the
+    // running export, so that an owner that goes away can cancel it and wait until it has stopped
+    // writing; none when no export started (the completion has then run already).
+    static std::shared_ptr<zaf::media::ExportSession> mixAudioForMovieWithCompletionHandler(const QUrl &movieURL,
+                                                                                           CompletionHandler completion);
 
     // "<temp dir>/ZafReplay_Final<seconds since 1970>.mp4" for now; the same URL within one second.
     static QUrl tempFileURL();

@@ -184,6 +184,17 @@ bool ExportSession::waitUntilFinished(std::chrono::milliseconds timeout) const
     return d->stoppedRunning.wait_for(lock, timeout, [this] { return !d->running; });
 }
 
+bool ExportSession::cancelExportAndWait(std::chrono::milliseconds timeout)
+{
+    cancelExport();
+    if (waitUntilFinished(timeout))
+        return true;
+    zaf::log::error(lcExport(), QStringLiteral("ExportSession: export to %1 still writing %2 ms after its cancel")
+                                    .arg(outputURL().toLocalFile())
+                                    .arg(qint64(timeout.count())));
+    return false;
+}
+
 void ExportSession::exportAsynchronously(std::function<void()> completion)
 {
     if (d->started.exchange(true)) {

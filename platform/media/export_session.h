@@ -47,6 +47,9 @@ enum class ExportStatus { Unknown = 0, Waiting = 1, Exporting = 2, Completed = 3
 // lossless quality, audio as AAC at 48 kHz.
 inline constexpr const char *kExportPresetHighestQuality = "HighestQuality";
 inline constexpr const char *kFileTypeMPEG4 = "public.mpeg-4";
+// How long an owner waits for a cancelled export to stop writing. A cancel is seen within one
+// packet or one blocked read, so this bound is only reached when the file system hangs.
+inline constexpr std::chrono::milliseconds kExportStopTimeout{10000};
 
 class ExportSession : public std::enable_shared_from_this<ExportSession> {
 public:
@@ -81,6 +84,9 @@ public:
     // started or whose waiting export was cancelled before it began. The completion may still be
     // running or about to run when this returns.
     bool waitUntilFinished(std::chrono::milliseconds timeout) const;
+    // Any thread: cancelExport(), then waitUntilFinished(timeout); an export still writing after the
+    // timeout is logged as an error. True when it has stopped writing.
+    bool cancelExportAndWait(std::chrono::milliseconds timeout = kExportStopTimeout);
 
     ExportStatus status() const;
     OptionalError error() const;   // domain "zaf.media", code from MediaErrorCode

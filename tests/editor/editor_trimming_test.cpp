@@ -4,7 +4,11 @@
 #include <QDir>
 #include <QFileInfo>
 #include <QRegularExpression>
+#include <QThread>
+#include <QThreadPool>
 
+#include "platform/dispatch.h"
+#include "platform/media/export_session.h"
 #include "tempstore/temp_directory.h"
 
 #include <ctime>
@@ -109,6 +113,67 @@ TEST_F(EditorTest, SecondTrimWithinTheSameSecondGetsAFreeNameAndRetiresTheFirstF
 
     e.reset();
     EXPECT_TRUE(tempEntries().isEmpty()) << "destroying the editor empties the temporary directory";
+}
+
+// Destroying the editor while its trim export writes, or while the finished export's completion
+// waits for the main thread to reload (the main thread handles no events here), stops the export
+// before the temporary directory is emptied and leaves the completion nothing to wait for.
+TEST_F(EditorTest, DestroyingTheEditorDuringItsTrimExportStopsItAndLeavesTheDirectoryEmpty)
+{
+    for (const bool finishing : {false, true}) {
+        SCOPED_TRACE(finishing ? "finishing" : "writing");
+        auto e = ready(movie(finishing ? 3 : 10, 640, 480));
+        selectRange(*e, 0.5, finishing ? 2.5 : 9.5);
+        e->trimButton()->trigger();
+        const auto session = e->exportSession();
+        ASSERT_TRUE(session);
+        const auto reached = [&] {
+            return finishing ? session->status() == media::ExportStatus::Completed : session->progress() > 0.0f;
+        };
+        for (int i = 0; i < 12000 && !reached() && session->status() != media::ExportStatus::Failed; ++i)
+            QThread::msleep(5);
+        ASSERT_TRUE(reached());
+        QThread::msleep(50); // a finished export's completion is now in its hop to the main thread
+        e.reset();
+        const media::ExportStatus status = session->status();
+        EXPECT_TRUE(status == media::ExportStatus::Cancelled || status == media::ExportStatus::Completed) << int(status);
+        EXPECT_TRUE(tempEntries().isEmpty());
+        EXPECT_TRUE(dispatch::globalQueue(dispatch::Priority::Default).waitForDone(10000))
+            << "the completion gave up its hop without the main thread";
+        spin(100);
+        EXPECT_TRUE(tempEntries().isEmpty()) << "nothing is written after the editor has gone";
+    }
+}
+
+// A completion of an older trim export that ends after a newer one began changes nothing: the
+// editor shows the newer trim.
+TEST_F(EditorTest, CompletionOfAnOlderTrimExportIsIgnoredOnceANewerOneBegan)
+{
+    auto e = ready(movie(10));
+    selectRange(*e, 0, 10);
+    // The two exports must not share a name (the older would fail): the older takes a counter.
+    const QString plainName = e->trimFileURL().toLocalFile();
+    QFile placeholder(plainName);
+    ASSERT_TRUE(placeholder.open(QIODevice::WriteOnly));
+    e->trimButton()->trigger();
+    const auto older = e->exportSession();
+    ASSERT_TRUE(placeholder.remove());
+    e->setExporting(false); // as if the older one had ended: a newer trim may start
+    selectRange(*e, 2, 3);
+    e->trimButton()->trigger();
+    const auto newer = e->exportSession();
+    ASSERT_TRUE(older && newer && older != newer);
+    ASSERT_NE(older->outputURL(), newer->outputURL());
+    const auto ended = [](const std::shared_ptr<media::ExportSession> &s) {
+        return s->status() == media::ExportStatus::Completed || s->status() == media::ExportStatus::Failed
+            || s->status() == media::ExportStatus::Cancelled;
+    };
+    ASSERT_TRUE(waitUntil([&] { return ended(older) && ended(newer) && !e->isExporting(); }, 60000));
+    spin(200);
+    EXPECT_EQ(older->status(), media::ExportStatus::Completed) << "the older export's completion was exercised";
+    EXPECT_EQ(e->videoURL(), newer->outputURL());
+    ASSERT_TRUE(waitUntilReady(*e));
+    EXPECT_NEAR(e->editEndTime(), 1.0, 0.05);
 }
 
 } // namespace
