@@ -4,6 +4,7 @@
 #include "media/audio_mix_utility.h"
 #include "platform/capability/capability_service.h"
 #include "platform/log.h"
+#include "platform/dispatch.h"
 #include "platform/media/export_session.h"
 #include "platform/media/media_asset.h"
 #include "platform/text/object_format.h"
@@ -264,15 +265,15 @@ void ZafYouTubeActivity::prepareWithActivityItems(const QVariantList &activityIt
             // The session keeps itself alive until its completion has run; the completion must not
             // keep it alive beyond that, so it looks at the session through a weak reference.
             // The end of the export also hops to the main thread, where a press of Publish may be
-            // waiting for the copy; the session's address tells a stale export from the current one.
+            // waiting for the copy; the session's id tells a stale export from the current one.
             const std::weak_ptr<zaf::media::ExportSession> weakSession = m_exportSession;
-            const zaf::media::ExportSession *sessionAddress = m_exportSession.get();
+            const std::uint64_t sessionID = m_exportSession->sessionID();
             const QPointer<ZafYouTubeActivity> self(this);
-            m_exportSession->exportAsynchronously([weakSession, sessionAddress, self] {
+            m_exportSession->exportAsynchronously([weakSession, sessionID, self] {
                 if (QCoreApplication *app = QCoreApplication::instance()) {
-                    QMetaObject::invokeMethod(app, [self, sessionAddress] {
+                    QMetaObject::invokeMethod(app, [self, sessionID] {
                         if (self)
-                            self->exportDidEnd(sessionAddress);
+                            self->exportDidEnd(sessionID);
                     }, Qt::QueuedConnection);
                 }
                 const std::shared_ptr<zaf::media::ExportSession> session = weakSession.lock();
@@ -453,9 +454,9 @@ void ZafYouTubeActivity::publishingAgentWillBeginPublishing(ZafPublishingAgent *
     startPublishing();
 }
 
-void ZafYouTubeActivity::exportDidEnd(const zaf::media::ExportSession *session)
+void ZafYouTubeActivity::exportDidEnd(std::uint64_t sessionID)
 {
-    if (!m_waitingForExport || !m_exportSession || m_exportSession.get() != session)
+    if (!m_waitingForExport || !m_exportSession || m_exportSession->sessionID() != sessionID)
         return;
     m_waitingForExport = false;
     if (m_exportSession->status() == zaf::media::ExportStatus::Completed) {
@@ -506,6 +507,16 @@ void ZafYouTubeActivity::cancelFromOverlay()
 
 void ZafYouTubeActivity::removeMovieCopy() const
 {
-    if (!m_movieURL.isEmpty())
-        ZafTempStore::defaultStore()._srRemoveFile(m_movieURL);
+    if (m_movieURL.isEmpty())
+        return;
+    // The copy's export may still be writing it (Cancel while it runs): it is cancelled, and the
+    // copy removed only once the export has stopped, or it would be written again after the
+    // removal. The wait runs off the main thread.
+    const std::shared_ptr<zaf::media::ExportSession> session = m_exportSession;
+    const QUrl copy = m_movieURL;
+    zaf::dispatch::async(zaf::dispatch::Priority::Background, [session, copy] {
+        if (session)
+            session->cancelExportAndWait();
+        ZafTempStore::defaultStore()._srRemoveFile(copy);
+    });
 }

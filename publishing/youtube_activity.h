@@ -15,14 +15,15 @@
 // an attachment is never published in the recording's place, even when it is a movie itself. No
 // position past the end of the list is ever read.
 //
-// Threads: main thread only. prepareWithActivityItems() returns at once; the export runs on its own
-// worker thread and its completion only logs. exportSession() gives the running export so that the
+// Threads: main thread only. prepareWithActivityItems() returns at once; the export runs on a pool
+// thread and its completion only logs. exportSession() gives the running export so that the
 // publishing flow can wait for the copy before uploading it.
 //
 // Publishing: activityViewController() answers with the publishing plug-in's navigation controller
 // holding the form (description filled, category "20" pre-selected). The activity is the agent's
 // delegate: Cancel ends the action as not completed; publishing covers the form with the progress
-// overlay and ends with a result alert; both remove the copy. The Publish button is routed through
+// overlay and ends with a result alert; both remove the copy (an export still writing it is
+// cancelled, and the copy removed once it has stopped). The Publish button is routed through
 // the activity so that an upload never starts before the copy's export has finished: while the
 // export runs the overlay is shown, and a failed export ends with the failure alert. The overlay's
 // own Cancel (the form's is under it) cancels through the agent: during the wait for the copy, the
@@ -40,6 +41,7 @@
 #include <QUrl>
 #include <QVariantList>
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 
@@ -128,7 +130,8 @@ public:
 
 private:
     // Runs on the main thread once the copy's export has ended.
-    void exportDidEnd(const zaf::media::ExportSession *session);
+    // sessionID names the export that ended; an export other than the current one is ignored.
+    void exportDidEnd(std::uint64_t sessionID);
     void startPublishing();
     void showProgressOverlay();
     // The overlay's Cancel: cancels through the agent, as the form's Cancel does.

@@ -1,6 +1,7 @@
 // The YouTube share activity: its identity, its capability gate, and its preparation (the copy with
 // mixed audio and the description text) for every shape of item list.
 #include "platform/capability/capability_service.h"
+#include "platform/dispatch.h"
 #include "platform/media/export_session.h"
 #include "publishing/youtube_activity.h"
 #include "tempstore/temp_store.h"
@@ -175,6 +176,25 @@ TEST(YouTubeActivity, PrepareHandlesEveryShapeOfItemList)
             EXPECT_GT(toneLevel(copy, 0, fixture::toneFrequency(track)), 0.3) << "track " << track;
         QFile::remove(copy); // the copies of one second share a name
     }
+}
+
+// Cancel while the copy is still being written stops its export and removes the copy only after
+// it has stopped, so no copy is written again after the removal.
+TEST(YouTubeActivity, CancelDuringTheCopysExportStopsItAndLeavesNoCopy)
+{
+    ScratchDir scratch;
+    const QString movie = makeFixtureMovie(scratch.path(), {.seconds = 30, .audioTracks = 2});
+    ZafYouTubeActivity activity;
+    activity.prepareWithActivityItems({QStringLiteral("T"), QString(), QUrl::fromLocalFile(movie)});
+    const auto session = activity.exportSession();
+    ASSERT_TRUE(session);
+    const QString copy = activity.movieURL().toLocalFile();
+    activity.publishingAgentCancelButtonClicked(nullptr);
+    ASSERT_TRUE(session->waitUntilFinished(std::chrono::seconds(60)));
+    EXPECT_EQ(session->status(), media::ExportStatus::Cancelled);
+    dispatch::waitForGlobalQueue(dispatch::Priority::Background); // the wait, then the removal it queues
+    dispatch::waitForGlobalQueue(dispatch::Priority::Background);
+    EXPECT_FALSE(QFileInfo::exists(copy));
 }
 
 // The copy's name is the temporary directory, the stem and the whole seconds.
