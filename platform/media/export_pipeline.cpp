@@ -166,6 +166,13 @@ private:
                     const QList<int> &mixed = *m_job.mixStreamIndices;
                     if (!mixed.contains(int(i)))
                         continue; // not in the mix: dropped
+                    // One AAC track mixes into itself unchanged: with nothing to cut, its packets
+                    // are copied (a save or an upload copy of a one-track movie is a remux).
+                    if (mixed.size() == 1 && !m_job.cut && in->codecpar->codec_id == AV_CODEC_ID_AAC) {
+                        if (StageResult r = addCopy(in, route))
+                            return r;
+                        continue;
+                    }
                     if (!m_mixer) {
                         ExportAudioEncoder::Options options;
                         for (int index : mixed) {

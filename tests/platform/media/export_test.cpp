@@ -280,6 +280,8 @@ TEST_F(ExportTest, MixSumsListedTracksAtUnityGainDropsOthersAndCopiesVideo)
     ASSERT_EQ(probeStreams(second, "audio").size(), 1);
     EXPECT_GT(toneLevel(second, 0, toneFrequency(1)), 0.4);
     EXPECT_LT(toneLevel(second, 0, toneFrequency(0)), 0.05);
+    // One track has nothing to mix: its packets are copied, not re-encoded.
+    EXPECT_EQ(streamMD5(second, "0:a:0"), streamMD5(source, "0:a:1"));
 }
 
 // An empty mix of a movie without audio gives a movie without an audio track, video copied.
