@@ -5,6 +5,7 @@
 #include "platform/media/export_session.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/media/second_decoder.h"
 #include "tests/support/temp_dir.h"
 
 #include <QCoreApplication>
@@ -210,6 +211,9 @@ TEST_F(ExportTest, TrimKeepsExactlyTheFramesOfItsRangeAndEveryAudioTrackInSync)
         ASSERT_EQ(frames.size(), c.frames);
         for (int i = 0; i < frames.size(); ++i)
             ASSERT_EQ(frames[i], c.firstFrame + i) << "at output frame " << i;
+        if (secondDecoderAvailable()) {
+            EXPECT_EQ(decodeVideoFramesWithSecondDecoder(output), c.frames) << "GStreamer decodes every frame too";
+        }
 
         const QList<QJsonObject> video = probeStreams(output, "video");
         const QList<QJsonObject> audio = probeStreams(output, "audio");
