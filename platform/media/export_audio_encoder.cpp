@@ -1,4 +1,5 @@
 #include "platform/media/export_audio_encoder.h"
+#include "platform/media/decoder_setup.h"
 
 #include "platform/log.h"
 
@@ -71,20 +72,10 @@ ExportAudioEncoder::~ExportAudioEncoder() = default;
 
 StageResult ExportAudioEncoder::Private::openDecoder(Input &input)
 {
-    const AVCodecParameters *par = input.stream->codecpar;
-    const AVCodec *codec = avcodec_find_decoder(par->codec_id);
-    if (!codec)
-        return stageError(kMediaErrorDecodeFailed, QStringLiteral("no decoder for audio codec %1").arg(QString::fromLatin1(avcodec_get_name(par->codec_id))));
-    input.decoder.reset(avcodec_alloc_context3(codec));
+    QString error;
+    input.decoder = media::openDecoder(input.stream, DecoderOptions{}, &error);
     if (!input.decoder)
-        return stageError(kMediaErrorUnknown, QStringLiteral("out of memory"));
-    int rc = avcodec_parameters_to_context(input.decoder.get(), par);
-    if (rc < 0)
-        return stageError(kMediaErrorDecodeFailed, QStringLiteral("audio decoder parameters"), rc);
-    input.decoder->pkt_timebase = input.stream->time_base;
-    rc = avcodec_open2(input.decoder.get(), codec, nullptr);
-    if (rc < 0)
-        return stageError(kMediaErrorDecodeFailed, QStringLiteral("cannot open the audio decoder"), rc);
+        return stageError(kMediaErrorDecodeFailed, error);
     if (input.decoder->sample_rate <= 0 || input.decoder->sample_fmt == AV_SAMPLE_FMT_NONE)
         return stageError(kMediaErrorDecodeFailed, QStringLiteral("audio stream %1 has no usable format").arg(input.stream->index));
     return std::nullopt;

@@ -1,16 +1,16 @@
 #pragma once
 
 // Internal pieces shared by the export pipeline stages (private to platform/media): the logging
-// category, the failure type a stage reports, the cancel flag, and the packet hand-off between a
+// category, the failure type a stage reports, and the packet hand-off between a
 // stage and the muxer. Every stage runs on the export's worker thread.
 
 #include "platform/error.h"
+#include "platform/media/cancel_token.h"
 #include "platform/media/ffmpeg_ptr.h"
 #include "platform/media/media_asset.h"
 
 #include <QLoggingCategory>
 
-#include <atomic>
 #include <functional>
 
 namespace zaf::media::exportpipe {
@@ -33,16 +33,6 @@ inline Error writeError(const QString &what, int averror)
 {
     return stageError(averror == AVERROR(ENOSPC) ? kMediaErrorDiskFull : kMediaErrorWriteFailed, what, averror);
 }
-
-// The cancel flag of one export, readable from FFmpeg's interrupt callback.
-struct CancelFlag {
-    std::atomic<bool> cancelled{false};
-    static int interruptCallback(void *opaque)
-    {
-        return static_cast<const CancelFlag *>(opaque)->cancelled.load(std::memory_order_relaxed) ? 1 : 0;
-    }
-    bool isSet() const { return cancelled.load(std::memory_order_relaxed); }
-};
 
 // Hands an encoded packet (timestamps in `timeBase`) to the muxer for output stream `outputIndex`.
 // Returns an AVERROR code or 0. Called on the export's worker thread.

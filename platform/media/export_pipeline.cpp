@@ -4,6 +4,7 @@
 #include "platform/log.h"
 #include "platform/media/export_audio_encoder.h"
 #include "platform/media/export_video_encoder.h"
+#include "platform/media/media_input.h"
 
 #include <QFile>
 
@@ -39,7 +40,7 @@ struct StreamRoute {
 
 class Pipeline {
 public:
-    Pipeline(const ExportJob &job, CancelFlag &cancel, const std::function<void(float)> &progress)
+    Pipeline(const ExportJob &job, const CancelToken &cancel, const std::function<void(float)> &progress)
         : m_job(job), m_cancel(cancel), m_progress(progress)
     {
     }
@@ -47,7 +48,7 @@ public:
     OptionalError run()
     {
         OptionalError result = runSteps();
-        if (m_cancel.isSet())
+        if (m_cancel.isCancelled())
             return makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
         return result;
     }
@@ -72,18 +73,10 @@ private:
 
     StageResult openInput()
     {
-        AVFormatContext *raw = avformat_alloc_context();
-        if (!raw)
-            return stageError(kMediaErrorUnknown, QStringLiteral("out of memory"));
-        raw->interrupt_callback = AVIOInterruptCB{&CancelFlag::interruptCallback, &m_cancel};
-        const QByteArray path = QFile::encodeName(m_job.sourcePath);
-        int rc = avformat_open_input(&raw, path.constData(), nullptr, nullptr);
-        if (rc < 0)
-            return stageError(kMediaErrorCannotOpen, QStringLiteral("cannot open %1").arg(m_job.sourcePath), rc);
-        m_input.reset(raw);
-        rc = avformat_find_stream_info(m_input.get(), nullptr);
-        if (rc < 0)
-            return stageError(kMediaErrorCannotOpen, QStringLiteral("cannot read the streams of %1").arg(m_job.sourcePath), rc);
+        QString error;
+        m_input = media::openInput(m_job.sourcePath, m_cancel, &error);
+        if (!m_input)
+            return stageError(kMediaErrorCannotOpen, error);
         return std::nullopt;
     }
 
@@ -95,7 +88,7 @@ private:
         if (rc < 0 || !raw)
             return stageError(kMediaErrorWriteFailed, QStringLiteral("no MPEG-4 muxer"), rc);
         m_output.reset(raw);
-        m_output->interrupt_callback = AVIOInterruptCB{&CancelFlag::interruptCallback, &m_cancel};
+        m_output->interrupt_callback = AVIOInterruptCB{&CancelToken::interruptCallback, const_cast<CancelToken *>(&m_cancel)};
         return std::nullopt;
     }
 
@@ -315,7 +308,7 @@ private:
         ff::AVPacketPtr packet = ff::makePacket();
         int retries = 0;
         for (std::int64_t n = 0; n < kMaxPackets; ++n) {
-            if (m_cancel.isSet())
+            if (m_cancel.isCancelled())
                 return makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
             const int rc = av_read_frame(m_input.get(), packet.get());
             if (rc == AVERROR_EOF)
@@ -364,7 +357,7 @@ private:
     }
 
     const ExportJob &m_job;
-    CancelFlag &m_cancel;
+    const CancelToken &m_cancel;
     const std::function<void(float)> &m_progress;
     ff::InputFormatContextPtr m_input;
     // Declared before the stages: the stages' writers point at it, and it outlives them.
@@ -377,7 +370,7 @@ private:
 
 } // namespace
 
-OptionalError runExport(const ExportJob &job, CancelFlag &cancel, const std::function<void(float)> &progress)
+OptionalError runExport(const ExportJob &job, const CancelToken &cancel, const std::function<void(float)> &progress)
 {
     Pipeline pipeline(job, cancel, progress);
     return pipeline.run();

@@ -30,6 +30,6 @@ struct ExportJob {
 };
 
 // Runs the job to its end. No error on success; kMediaErrorCancelled once `cancel` is set.
-OptionalError runExport(const ExportJob &job, CancelFlag &cancel, const std::function<void(float)> &progress);
+OptionalError runExport(const ExportJob &job, const CancelToken &cancel, const std::function<void(float)> &progress);
 
 } // namespace zaf::media::exportpipe

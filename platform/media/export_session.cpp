@@ -34,7 +34,7 @@ struct ExportSession::Private {
     std::atomic<int> status{int(ExportStatus::Unknown)};
     std::atomic<float> progress{0.0f};
     std::atomic<bool> started{false};
-    CancelFlag cancel;
+    CancelToken cancel;
 
     // Whether an export is queued or writing; waitUntilFinished() waits for it to turn false.
     mutable std::mutex runningMutex;
@@ -162,7 +162,7 @@ std::uint64_t ExportSession::sessionID() const
 
 void ExportSession::cancelExport()
 {
-    d->cancel.cancelled.store(true);
+    d->cancel.cancel();
     // An export that has not started, or waits for a pool thread, ends here: it will write nothing
     // (its run ends at once, with the completion). A running one notices the flag in its loops.
     for (ExportStatus before : {ExportStatus::Unknown, ExportStatus::Waiting}) {
@@ -291,7 +291,7 @@ void ExportSession::run(std::function<void()> completion)
     };
     const Error cancelled = makeMediaError(kMediaErrorCancelled, QStringLiteral("the export was cancelled"));
     int expected = int(ExportStatus::Waiting);
-    if (d->cancel.isSet() || !d->status.compare_exchange_strong(expected, int(ExportStatus::Exporting)))
+    if (d->cancel.isCancelled() || !d->status.compare_exchange_strong(expected, int(ExportStatus::Exporting)))
         return end(ExportStatus::Cancelled, cancelled);
 
     QUrl url;
@@ -316,7 +316,7 @@ void ExportSession::run(std::function<void()> completion)
 
     const std::function<void(float)> progress = [this](float value) { d->progress.store(value); };
     OptionalError result = runExport(*job, d->cancel, progress);
-    if (d->cancel.isSet()) {
+    if (d->cancel.isCancelled()) {
         output->discard();
         return end(ExportStatus::Cancelled, cancelled);
     }

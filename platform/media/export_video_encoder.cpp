@@ -1,4 +1,5 @@
 #include "platform/media/export_video_encoder.h"
+#include "platform/media/decoder_setup.h"
 #include "platform/media/frame_converter.h"
 
 extern "C" {
@@ -86,26 +87,10 @@ std::unique_ptr<ExportVideoEncoder> ExportVideoEncoder::create(const Options &op
     p.writer = std::move(writer);
     p.startPts = av_rescale_q(options.startMicros, AV_TIME_BASE_Q, in->time_base);
     p.endPts = av_rescale_q(options.endMicros, AV_TIME_BASE_Q, in->time_base);
-    if (par->width <= 0 || par->height <= 0 || std::int64_t(par->width) * par->height > ff::kMaxPixels)
-        return failed(stageError(kMediaErrorDecodeFailed, QStringLiteral("video stream %1 has an unusable size %2x%3")
-                                                              .arg(in->index).arg(par->width).arg(par->height)));
-
-    const AVCodec *decoderCodec = avcodec_find_decoder(par->codec_id);
-    if (!decoderCodec)
-        return failed(stageError(kMediaErrorDecodeFailed, QStringLiteral("no decoder for video codec %1").arg(QString::fromLatin1(avcodec_get_name(par->codec_id)))));
-    p.decoder.reset(avcodec_alloc_context3(decoderCodec));
+    QString decoderError;
+    p.decoder = media::openDecoder(in, DecoderOptions{0, FF_THREAD_FRAME | FF_THREAD_SLICE}, &decoderError);
     if (!p.decoder)
-        return failed(stageError(kMediaErrorUnknown, QStringLiteral("out of memory")));
-    int rc = avcodec_parameters_to_context(p.decoder.get(), par);
-    if (rc < 0)
-        return failed(stageError(kMediaErrorDecodeFailed, QStringLiteral("video decoder parameters"), rc));
-    p.decoder->pkt_timebase = in->time_base;
-    p.decoder->max_pixels = ff::kMaxPixels;
-    p.decoder->thread_count = 0;
-    p.decoder->thread_type = FF_THREAD_FRAME | FF_THREAD_SLICE;
-    rc = avcodec_open2(p.decoder.get(), decoderCodec, nullptr);
-    if (rc < 0)
-        return failed(stageError(kMediaErrorDecodeFailed, QStringLiteral("cannot open the video decoder"), rc));
+        return failed(stageError(kMediaErrorDecodeFailed, decoderError));
 
     const AVCodec *codec = avcodec_find_encoder_by_name("libx264");
     if (!codec)
@@ -136,11 +121,10 @@ std::unique_ptr<ExportVideoEncoder> ExportVideoEncoder::create(const Options &op
     enc->thread_count = 0; // x264 picks its own thread count
     if (output->oformat->flags & AVFMT_GLOBALHEADER)
         enc->flags |= AV_CODEC_FLAG_GLOBAL_HEADER;
-    AVDictionary *opts = nullptr;
-    av_dict_set(&opts, "preset", kX264Preset, 0);
-    av_dict_set(&opts, "crf", kX264Crf, 0);
-    rc = avcodec_open2(enc, codec, &opts);
-    av_dict_free(&opts);
+    ff::Dictionary opts;
+    opts.set("preset", kX264Preset);
+    opts.set("crf", kX264Crf);
+    int rc = avcodec_open2(enc, codec, opts.address());
     if (rc < 0)
         return failed(stageError(kMediaErrorEncodeFailed, QStringLiteral("cannot open the H.264 encoder"), rc));
 

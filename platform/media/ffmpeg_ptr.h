@@ -63,6 +63,24 @@ using SwrContextPtr = std::unique_ptr<SwrContext, SwrContextDeleter>;
 using FilterGraphPtr = std::unique_ptr<AVFilterGraph, FilterGraphDeleter>;
 using FilterInOutPtr = std::unique_ptr<AVFilterInOut, FilterInOutDeleter>;
 
+// An AVDictionary of options, freed with its holder. Pass address() where FFmpeg takes an
+// AVDictionary ** (it may consume entries and leave the rest, which are freed here too).
+class Dictionary {
+public:
+    Dictionary() = default;
+    ~Dictionary() { av_dict_free(&m_dictionary); }
+    Dictionary(const Dictionary &) = delete;
+    Dictionary &operator=(const Dictionary &) = delete;
+
+    // An AVERROR code or 0.
+    int set(const char *key, const char *value) { return av_dict_set(&m_dictionary, key, value, 0); }
+    AVDictionary *get() const { return m_dictionary; }
+    AVDictionary **address() { return &m_dictionary; }
+
+private:
+    AVDictionary *m_dictionary = nullptr;
+};
+
 inline AVFramePtr makeFrame() { return AVFramePtr(av_frame_alloc()); }
 inline AVPacketPtr makePacket() { return AVPacketPtr(av_packet_alloc()); }
 

@@ -1,4 +1,6 @@
 #include "platform/media/image_frame_source.h"
+#include "platform/media/decoder_setup.h"
+#include "platform/media/media_input.h"
 #include "platform/media/media_log.h"
 
 #include "platform/log.h"
@@ -44,8 +46,8 @@ std::int64_t framePts(const AVFrame *frame)
 
 } // namespace
 
-ImageFrameSource::ImageFrameSource(QString path, int streamIndex, int rotationClockwise, std::function<bool()> interrupt)
-    : m_path(std::move(path)), m_streamIndex(streamIndex), m_rotation(rotationClockwise), m_interrupt(std::move(interrupt))
+ImageFrameSource::ImageFrameSource(QString path, int streamIndex, int rotationClockwise, const CancelToken &interrupt)
+    : m_path(std::move(path)), m_streamIndex(streamIndex), m_rotation(rotationClockwise), m_interrupt(interrupt)
 {
 }
 
@@ -54,14 +56,9 @@ ImageFrameSource::~ImageFrameSource()
     close();
 }
 
-int ImageFrameSource::interruptCallback(void *opaque)
-{
-    return static_cast<ImageFrameSource *>(opaque)->interrupted() ? 1 : 0;
-}
-
 bool ImageFrameSource::interrupted() const
 {
-    return m_interrupt && m_interrupt();
+    return m_interrupt.isCancelled();
 }
 
 void ImageFrameSource::close()
@@ -76,19 +73,10 @@ void ImageFrameSource::close()
 
 OptionalError ImageFrameSource::open()
 {
-    AVFormatContext *raw = avformat_alloc_context();
-    if (!raw)
-        return sourceError(kMediaErrorUnknown, QStringLiteral("out of memory opening %1").arg(m_path));
-    raw->interrupt_callback.callback = &ImageFrameSource::interruptCallback;
-    raw->interrupt_callback.opaque = this;
-    const QByteArray path = m_path.toUtf8();
-    int rc = avformat_open_input(&raw, path.constData(), nullptr, nullptr);
-    m_format.reset(raw); // null after a failed open (FFmpeg frees the context)
-    if (rc < 0)
-        return sourceError(kMediaErrorCannotOpen, QStringLiteral("cannot open %1: %2").arg(m_path, ff::errorString(rc)));
-    rc = avformat_find_stream_info(m_format.get(), nullptr);
-    if (rc < 0)
-        return sourceError(kMediaErrorCannotOpen, QStringLiteral("cannot read the streams of %1: %2").arg(m_path, ff::errorString(rc)));
+    QString error;
+    m_format = openInput(m_path, m_interrupt, &error);
+    if (!m_format)
+        return sourceError(kMediaErrorCannotOpen, error);
 
     if (m_streamIndex < 0 || m_streamIndex >= int(m_format->nb_streams)
         || m_format->streams[m_streamIndex]->codecpar->codec_type != AVMEDIA_TYPE_VIDEO)
@@ -99,23 +87,11 @@ OptionalError ImageFrameSource::open()
         m_format->streams[i]->discard = int(i) == m_streamIndex ? AVDISCARD_DEFAULT : AVDISCARD_ALL;
     m_stream = m_format->streams[m_streamIndex];
 
-    const AVCodec *codec = avcodec_find_decoder(m_stream->codecpar->codec_id);
-    if (!codec)
-        return sourceError(kMediaErrorDecodeFailed, QStringLiteral("no decoder for the video of %1").arg(m_path));
-    m_decoder.reset(avcodec_alloc_context3(codec));
-    if (!m_decoder)
-        return sourceError(kMediaErrorUnknown, QStringLiteral("out of memory opening %1").arg(m_path));
-    rc = avcodec_parameters_to_context(m_decoder.get(), m_stream->codecpar);
-    if (rc < 0)
-        return sourceError(kMediaErrorDecodeFailed, QStringLiteral("bad video parameters in %1: %2").arg(m_path, ff::errorString(rc)));
-    m_decoder->max_pixels = ff::kMaxPixels;
-    m_decoder->pkt_timebase = m_stream->time_base;
     // One thread: a still needs one or a few frames, and a single-threaded decoder hands each frame
     // out as soon as it is decoded.
-    m_decoder->thread_count = 1;
-    rc = avcodec_open2(m_decoder.get(), codec, nullptr);
-    if (rc < 0)
-        return sourceError(kMediaErrorDecodeFailed, QStringLiteral("cannot open the video decoder for %1: %2").arg(m_path, ff::errorString(rc)));
+    m_decoder = openDecoder(m_stream, DecoderOptions{1}, &error);
+    if (!m_decoder)
+        return sourceError(kMediaErrorDecodeFailed, QStringLiteral("%1 (the video of %2)").arg(error, m_path));
 
     if (!m_packet)
         m_packet = ff::makePacket();

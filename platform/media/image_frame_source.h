@@ -4,10 +4,11 @@
 //
 // Holds one open demuxer and video decoder for a file and answers "the picture at time T within
 // these tolerances", seeking or decoding on from the previous answer, whichever is cheaper. Not
-// thread-safe: its owner serialises calls. Long I/O can be interrupted through `interrupt`, which
-// is polled from FFmpeg's interrupt callback on the calling thread.
+// thread-safe: its owner serialises calls. Long I/O and decoding can be interrupted through
+// `interrupt`, which is polled from FFmpeg's interrupt callback on the calling thread.
 
 #include "platform/error.h"
+#include "platform/media/cancel_token.h"
 #include "platform/media/ffmpeg_ptr.h"
 #include "platform/media/frame_converter.h"
 #include "platform/media/media_asset.h"
@@ -17,7 +18,6 @@
 #include <QSize>
 #include <QString>
 
-#include <functional>
 
 namespace zaf::media {
 
@@ -37,8 +37,9 @@ public:
         bool cancelled = false;
     };
 
-    // `interrupt` is polled during I/O and decoding; returning true abandons the current call.
-    ImageFrameSource(QString path, int streamIndex, int rotationClockwise, std::function<bool()> interrupt);
+    // `interrupt` is polled during I/O and decoding; once cancelled it abandons the current call.
+    // It must outlive the source.
+    ImageFrameSource(QString path, int streamIndex, int rotationClockwise, const CancelToken &interrupt);
     ~ImageFrameSource();
     ImageFrameSource(const ImageFrameSource &) = delete;
     ImageFrameSource &operator=(const ImageFrameSource &) = delete;
@@ -56,12 +57,11 @@ private:
     std::int64_t toStreamTicks(const MediaTime &time, bool roundDown) const;
     std::int64_t frameDuration(const AVFrame *frame) const;
     bool interrupted() const;
-    static int interruptCallback(void *opaque);
 
     QString m_path;
     int m_streamIndex = -1;
     int m_rotation = 0;
-    std::function<bool()> m_interrupt;
+    const CancelToken &m_interrupt;
 
     ff::InputFormatContextPtr m_format;
     ff::CodecContextPtr m_decoder;

@@ -42,9 +42,10 @@ struct ImageGenerator::Private {
     std::deque<Batch> queue;
     bool queueRunning = false;
 
-    // cancelAllImageGeneration() moves the epoch on; work of an older epoch is cancelled.
+    // cancelAllImageGeneration() moves the epoch on; work of an older epoch is cancelled. It also
+    // cancels `interrupt`, which stops the decode in progress; each request clears it first.
     std::atomic<std::uint64_t> cancelEpoch{0};
-    std::atomic<std::uint64_t> activeEpoch{0};
+    CancelToken interrupt;
 
     std::mutex decodeMutex;                    // guards source
     std::unique_ptr<ImageFrameSource> source;
@@ -64,9 +65,10 @@ struct ImageGenerator::Private {
     ImageFrameSource::Answer generate(const MediaTime &time, ImageFrameSource::Request request, std::uint64_t epoch)
     {
         std::lock_guard lock(decodeMutex);
+        // Cleared before the epoch is read: a cancel after the read sets it again.
+        interrupt.reset();
         if (epoch != cancelEpoch.load())
             return cancelledAnswer();
-        activeEpoch.store(epoch);
         if (!source) {
             if (!asset->load()) {
                 const OptionalError error = asset->loadError();
@@ -82,8 +84,7 @@ struct ImageGenerator::Private {
                 return ImageFrameSource::Answer{{}, MediaTime::invalid(), error, false};
             }
             source = std::make_unique<ImageFrameSource>(asset->url().toLocalFile(), video.first().streamIndex,
-                                                        video.first().preferredTransform.rotationDegrees(),
-                                                        [this] { return activeEpoch.load() != cancelEpoch.load(); });
+                                                        video.first().preferredTransform.rotationDegrees(), interrupt);
         }
         request.time = time;
         return source->imageAt(request);
@@ -232,6 +233,7 @@ void ImageGenerator::cancelAllImageGeneration()
     // Queued requests see the new epoch when their turn comes; a decode in progress sees it
     // through the source's interrupt check.
     d->cancelEpoch.fetch_add(1);
+    d->interrupt.cancel();
     zaf::log::info(lcMedia(), QStringLiteral("ImageGenerator: cancelled pending requests for %1").arg(d->asset->url().toString()));
 }
 

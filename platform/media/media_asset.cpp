@@ -4,12 +4,12 @@
 #include "platform/dispatch.h"
 #include "platform/log.h"
 #include "platform/media/ffmpeg_ptr.h"
+#include "platform/media/media_input.h"
 
 extern "C" {
 #include <libavutil/display.h>
 }
 
-#include <QFile>
 #include <QFileInfo>
 #include <QLoggingCategory>
 
@@ -26,16 +26,6 @@ using zaf::media::lcMedia;
 // Opening a file and reading its header never takes longer than this: a file on a stalled network
 // mount fails instead of blocking its caller for ever.
 constexpr auto kOpenTimeBound = std::chrono::seconds(20);
-
-struct OpenDeadline {
-    std::chrono::steady_clock::time_point deadline;
-};
-
-int openInterrupt(void *opaque)
-{
-    const auto *d = static_cast<const OpenDeadline *>(opaque);
-    return std::chrono::steady_clock::now() > d->deadline ? 1 : 0;
-}
 
 int normalizedQuarterTurns(double degrees)
 {
@@ -147,24 +137,12 @@ void AssetState::loadLocked()
         return;
     }
 
-    OpenDeadline deadline{std::chrono::steady_clock::now() + kOpenTimeBound};
-    AVFormatContext *raw = avformat_alloc_context();
-    if (!raw) {
-        fail(kMediaErrorUnknown, QStringLiteral("out of memory opening %1").arg(path));
-        return;
-    }
-    raw->interrupt_callback.callback = &openInterrupt;
-    raw->interrupt_callback.opaque = &deadline;
-    const QByteArray encodedPath = QFile::encodeName(path);
-    int rc = avformat_open_input(&raw, encodedPath.constData(), nullptr, nullptr);
-    if (rc < 0) { // avformat_open_input frees the context on failure
-        fail(kMediaErrorCannotOpen, QStringLiteral("cannot open %1: %2").arg(path, ff::errorString(rc)));
-        return;
-    }
-    ff::InputFormatContextPtr format(raw);
-    rc = avformat_find_stream_info(format.get(), nullptr);
-    if (rc < 0) {
-        fail(kMediaErrorCannotOpen, QStringLiteral("cannot read the streams of %1: %2").arg(path, ff::errorString(rc)));
+    CancelToken openBound;
+    openBound.setDeadlineAfter(kOpenTimeBound);
+    QString error;
+    const ff::InputFormatContextPtr format = openInput(path, openBound, &error);
+    if (!format) {
+        fail(kMediaErrorCannotOpen, error);
         return;
     }
     containerName = QString::fromLatin1(format->iformat->name);

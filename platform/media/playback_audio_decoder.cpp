@@ -1,7 +1,8 @@
 #include "platform/media/playback_audio_decoder.h"
 
 #include "platform/log.h"
-#include "platform/media/playback_input.h"
+#include "platform/media/decoder_setup.h"
+#include "platform/media/media_input.h"
 #include "platform/media/playback_log.h"
 
 #include <algorithm>
@@ -64,7 +65,7 @@ AudioDecoder::AudioDecoder(QString path, QList<int> streamIndexes, AudioOutputFo
 
 AudioDecoder::~AudioDecoder()
 {
-    m_stop = true;
+    m_stop.cancel();
     m_wake.notify_all();
     m_ring->wake();
     if (m_thread.joinable())
@@ -100,10 +101,10 @@ void AudioDecoder::stop()
 void AudioDecoder::run()
 {
     QString error;
-    ff::InputFormatContextPtr format = openInput(m_path, &m_stop, &error);
+    ff::InputFormatContextPtr format = openInput(m_path, m_stop, &error);
     if (!format) {
-        if (!m_stop)
-            m_failed(QStringLiteral("cannot open %1 for audio playback: %2").arg(m_path, error));
+        if (!m_stop.isCancelled())
+            m_failed(QStringLiteral("no audio playback: %1").arg(error));
         return;
     }
     std::vector<StreamDecoder> streams;
@@ -113,7 +114,7 @@ void AudioDecoder::run()
         StreamDecoder s;
         s.index = index;
         s.timeBase = av_q2d(format->streams[index]->time_base);
-        s.codec = openDecoder(format->streams[index], &error);
+        s.codec = openDecoder(format->streams[index], DecoderOptions{2}, &error);
         if (!s.codec) {
             zaf::log::error(lcPlayback(), QStringLiteral("audio stream %1 of %2 is skipped: %3").arg(index).arg(m_path, error));
             continue;
@@ -149,7 +150,7 @@ void AudioDecoder::run()
     std::vector<float> mixed;
     std::vector<std::int16_t> converted;
 
-    auto giveUp = [&] { return m_stop.load() || m_latest.load() != request; };
+    auto giveUp = [&] { return m_stop.isCancelled() || m_latest.load() != request; };
 
     // Mixes and writes what every live stream has; with `all`, everything that is left.
     auto writeMix = [&](bool all) {
@@ -224,12 +225,12 @@ void AudioDecoder::run()
         }
     };
 
-    while (!m_stop) {
+    while (!m_stop.isCancelled()) {
         {
             std::unique_lock lock(m_mutex);
             if (!m_hasRequest && !active)
-                m_wake.wait(lock, [this] { return m_stop.load() || m_hasRequest; });
-            if (m_stop)
+                m_wake.wait(lock, [this] { return m_stop.isCancelled() || m_hasRequest; });
+            if (m_stop.isCancelled())
                 break;
             if (m_hasRequest) {
                 m_hasRequest = false;
@@ -244,7 +245,7 @@ void AudioDecoder::run()
                 targetSeconds = double(*target) / 1e9;
                 const std::int64_t ts = std::llround((targetSeconds + startSeconds) * AV_TIME_BASE);
                 const int rc = av_seek_frame(format.get(), -1, ts, AVSEEK_FLAG_BACKWARD);
-                if (rc < 0 && !m_stop)
+                if (rc < 0 && !m_stop.isCancelled())
                     zaf::log::error(lcPlayback(), QStringLiteral("cannot seek the audio of %1: %2").arg(m_path, ff::errorString(rc)));
                 for (StreamDecoder &s : streams) {
                     avcodec_flush_buffers(s.codec.get());
@@ -266,7 +267,7 @@ void AudioDecoder::run()
                 rc = AVERROR_EOF;
             }
             if (rc < 0) {
-                if (rc != AVERROR_EOF && !m_stop)
+                if (rc != AVERROR_EOF && !m_stop.isCancelled())
                     zaf::log::error(lcPlayback(), QStringLiteral("reading the audio of %1 stopped: %2").arg(m_path, ff::errorString(rc)));
                 draining = true;
                 for (StreamDecoder &s : streams) {

@@ -7,6 +7,7 @@
 // Input: start(time) and stop() requests. Output: PCM in the ring, starting at exactly the requested
 // time, then the end mark at the end of the longest stream.
 
+#include "platform/media/cancel_token.h"
 #include "platform/media/playback_audio_ring.h"
 
 #include <QList>
@@ -54,7 +55,7 @@ private:
     AudioRing *const m_ring;
     const std::function<void(const QString &)> m_failed;
 
-    std::atomic<bool> m_stop{false};
+    CancelToken m_stop;
     std::atomic<std::uint64_t> m_latest{0};  // the latest request
     std::atomic<std::uint64_t> m_serving{0};
     std::mutex m_mutex;

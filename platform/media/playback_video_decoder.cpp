@@ -2,7 +2,8 @@
 
 #include "platform/log.h"
 #include "platform/media/frame_converter.h"
-#include "platform/media/playback_input.h"
+#include "platform/media/decoder_setup.h"
+#include "platform/media/media_input.h"
 #include "platform/media/playback_log.h"
 
 #include <cmath>
@@ -32,7 +33,7 @@ VideoDecoder::VideoDecoder(QString path, int streamIndex, FrameQueue *queue, std
 
 VideoDecoder::~VideoDecoder()
 {
-    m_stop = true;
+    m_stop.cancel();
     m_wake.notify_all();
     m_queue->wake();
     if (m_thread.joinable())
@@ -58,10 +59,10 @@ bool VideoDecoder::hasNewerRequest() const
 void VideoDecoder::run()
 {
     QString error;
-    ff::InputFormatContextPtr format = openInput(m_path, &m_stop, &error);
+    ff::InputFormatContextPtr format = openInput(m_path, m_stop, &error);
     if (!format) {
-        if (!m_stop)
-            m_failed(QStringLiteral("cannot open %1 for playback: %2").arg(m_path, error));
+        if (!m_stop.isCancelled())
+            m_failed(QStringLiteral("no playback: %1").arg(error));
         return;
     }
     if (m_streamIndex < 0 || m_streamIndex >= int(format->nb_streams)
@@ -74,7 +75,7 @@ void VideoDecoder::run()
         if (int(i) != m_streamIndex)
             format->streams[i]->discard = AVDISCARD_ALL;
     }
-    ff::CodecContextPtr codec = openDecoder(stream, &error);
+    ff::CodecContextPtr codec = openDecoder(stream, DecoderOptions{2}, &error);
     if (!codec) {
         m_failed(QStringLiteral("cannot decode the video of %1: %2").arg(m_path, error));
         return;
@@ -120,7 +121,7 @@ void VideoDecoder::run()
             return true;
         }
         VideoFrame out{std::move(image), ptsNs, current.generation, seekResult};
-        if (!m_queue->push(std::move(out), [this] { return m_stop.load() || hasNewerRequest(); }))
+        if (!m_queue->push(std::move(out), [this] { return m_stop.isCancelled() || hasNewerRequest(); }))
             return false;
         if (m_framesReady)
             m_framesReady();
@@ -149,13 +150,13 @@ void VideoDecoder::run()
         return deliver(f, pts, true);
     };
 
-    while (!m_stop) {
+    while (!m_stop.isCancelled()) {
         {
             std::unique_lock lock(m_mutex);
             if (!m_request && mode == Mode::Idle) {
-                m_wake.wait(lock, [this] { return m_stop.load() || m_request.has_value(); });
+                m_wake.wait(lock, [this] { return m_stop.isCancelled() || m_request.has_value(); });
             }
-            if (m_stop)
+            if (m_stop.isCancelled())
                 break;
             if (m_request) {
                 current = *m_request;
@@ -167,7 +168,7 @@ void VideoDecoder::run()
                 int rc = av_seek_frame(format.get(), m_streamIndex, ts, AVSEEK_FLAG_BACKWARD);
                 if (rc < 0)
                     rc = av_seek_frame(format.get(), m_streamIndex, stream->start_time == AV_NOPTS_VALUE ? 0 : stream->start_time, AVSEEK_FLAG_BACKWARD);
-                if (rc < 0 && !m_stop)
+                if (rc < 0 && !m_stop.isCancelled())
                     zaf::log::error(lcPlayback(), QStringLiteral("cannot seek in %1: %2").arg(m_path, ff::errorString(rc)));
                 avcodec_flush_buffers(codec.get());
                 av_frame_unref(held.get());
@@ -186,7 +187,7 @@ void VideoDecoder::run()
                 rc = AVERROR_EOF;
             }
             if (rc < 0) {
-                if (rc != AVERROR_EOF && !m_stop)
+                if (rc != AVERROR_EOF && !m_stop.isCancelled())
                     zaf::log::error(lcPlayback(), QStringLiteral("reading %1 stopped: %2").arg(m_path, ff::errorString(rc)));
                 draining = true;
                 avcodec_send_packet(codec.get(), nullptr);
@@ -222,7 +223,7 @@ void VideoDecoder::run()
             decodeErrors = 0;
             const bool kept = handle(frame.get());
             av_frame_unref(frame.get());
-            if (!kept || hasNewerRequest() || m_stop)
+            if (!kept || hasNewerRequest() || m_stop.isCancelled())
                 break;
         }
     }

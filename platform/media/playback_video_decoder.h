@@ -10,6 +10,7 @@
 // in order until the end of the stream. A newer request abandons an older one at once, so a burst
 // of requests costs one decode.
 
+#include "platform/media/cancel_token.h"
 #include "platform/media/playback_frame_queue.h"
 
 #include <QString>
@@ -53,7 +54,7 @@ private:
     const std::function<void()> m_framesReady;
     const std::function<void(const QString &)> m_failed;
 
-    std::atomic<bool> m_stop{false};
+    CancelToken m_stop;
     std::atomic<bool> m_requestPending{false};
     mutable std::mutex m_mutex;
     std::condition_variable m_wake;

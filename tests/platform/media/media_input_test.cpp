@@ -1,0 +1,139 @@
+// The input layer every media stage opens files through: the cancel token, openInput and the
+// decoder set-up.
+
+#include "platform/media/cancel_token.h"
+#include "platform/media/decoder_setup.h"
+#include "platform/media/media_input.h"
+#include "tests/support/media/fixture_movies.h"
+#include "tests/support/temp_dir.h"
+
+#include <QDir>
+#include <QFile>
+
+#include <gtest/gtest.h>
+
+#include <thread>
+
+namespace zaf::media {
+namespace {
+
+using zaf::test::ScratchDir;
+
+TEST(CancelTokenTest, FlagAndDeadlineEachCancelAndResetClearsOnlyTheFlag)
+{
+    CancelToken token;
+    EXPECT_FALSE(token.isCancelled());
+    EXPECT_EQ(CancelToken::interruptCallback(&token), 0);
+    token.cancel();
+    EXPECT_TRUE(token.isCancelled());
+    EXPECT_EQ(CancelToken::interruptCallback(&token), 1);
+    token.reset();
+    EXPECT_FALSE(token.isCancelled());
+
+    token.setDeadlineAfter(std::chrono::hours(1));
+    EXPECT_FALSE(token.isCancelled());
+    token.setDeadlineAfter(std::chrono::milliseconds(1));
+    std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    EXPECT_TRUE(token.isCancelled());
+    token.reset();
+    EXPECT_TRUE(token.isCancelled());
+}
+
+enum class Token { Fresh, Cancelled, DeadlinePassed };
+
+struct OpenCase {
+    const char *name;
+    QString (*makeFile)(const ScratchDir &); // returns the path to open
+    Token token;
+    bool opens;
+    const char *errorPart;                   // part of the error when it does not open
+};
+
+QString movieCopy(const ScratchDir &dir, const QString &name)
+{
+    const QString path = dir.file(name);
+    EXPECT_TRUE(QFile::copy(zaf::test::sharedFlatColourMovie(QSize(64, 48)), path));
+    return path;
+}
+
+const OpenCase kOpenCases[] = {
+    {"Movie", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("movie.mp4")); }, Token::Fresh, true, ""},
+    {"NonAsciiName", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("Aufnahme é 日本 10:43.mp4")); },
+     Token::Fresh, true, ""},
+    // Relative, with what looks like a protocol in front: still the local file of that name.
+    {"NameLikeAProtocol", [](const ScratchDir &d) {
+         movieCopy(d, QStringLiteral("clip:1.mp4"));
+         return QDir::setCurrent(d.path()) ? QStringLiteral("clip:1.mp4") : QString();
+     },
+     Token::Fresh, true, ""},
+    {"CancelledBefore", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("movie.mp4")); }, Token::Cancelled, false,
+     "cancelled"},
+    {"DeadlinePassed", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("movie.mp4")); }, Token::DeadlinePassed,
+     false, "movie.mp4"},
+    {"Missing", [](const ScratchDir &d) { return d.file(QStringLiteral("nothing-here.mp4")); }, Token::Fresh, false,
+     "cannot open"},
+    {"Garbage", [](const ScratchDir &d) { return d.write(QStringLiteral("garbage.mp4"), 5000); }, Token::Fresh, false,
+     "garbage.mp4"},
+};
+
+class OpenInputTest : public testing::TestWithParam<OpenCase> {
+protected:
+    void TearDown() override { QDir::setCurrent(m_cwd); }
+    QString m_cwd = QDir::currentPath();
+};
+
+TEST_P(OpenInputTest, OpensLocalFilesAndFailsWithANamedErrorOtherwise)
+{
+    const OpenCase &c = GetParam();
+    ScratchDir dir;
+    const QString path = c.makeFile(dir);
+    ASSERT_FALSE(path.isEmpty());
+    CancelToken token;
+    if (c.token == Token::Cancelled)
+        token.cancel();
+    if (c.token == Token::DeadlinePassed) {
+        token.setDeadlineAfter(std::chrono::milliseconds(1));
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    }
+    QString error;
+    const ff::InputFormatContextPtr format = openInput(path, token, &error);
+    EXPECT_EQ(bool(format), c.opens) << error.toStdString();
+    if (c.opens) {
+        EXPECT_EQ(format->nb_streams, 2u);
+    } else {
+        EXPECT_TRUE(error.contains(QString::fromUtf8(c.errorPart))) << error.toStdString();
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Files, OpenInputTest, testing::ValuesIn(kOpenCases),
+                         [](const testing::TestParamInfo<OpenCase> &info) { return std::string(info.param.name); });
+
+// Every decoder is made with the same limits: the pixel limit refuses a larger stream up front,
+// and audio streams are not affected by it.
+TEST(DecoderSetupTest, OpensEveryStreamAndRefusesPicturesOverThePixelLimit)
+{
+    const CancelToken token;
+    QString error;
+    const ff::InputFormatContextPtr format = openInput(zaf::test::sharedFlatColourMovie(QSize(64, 48)), token, &error);
+    ASSERT_TRUE(format) << error.toStdString();
+    ASSERT_EQ(format->nb_streams, 2u);
+    for (unsigned i = 0; i < format->nb_streams; ++i) {
+        const AVStream *stream = format->streams[i];
+        const bool video = stream->codecpar->codec_type == AVMEDIA_TYPE_VIDEO;
+        SCOPED_TRACE(video ? "video" : "audio");
+        const ff::CodecContextPtr decoder = openDecoder(stream, DecoderOptions{2, 0, 64 * 48}, &error);
+        ASSERT_TRUE(decoder) << error.toStdString();
+        EXPECT_EQ(decoder->max_pixels, 64 * 48);
+        EXPECT_EQ(decoder->pkt_timebase.den, stream->time_base.den);
+        if (video) // audio decoders without threading support run on one
+            EXPECT_EQ(decoder->thread_count, 2);
+
+        error.clear();
+        const ff::CodecContextPtr limited = openDecoder(stream, DecoderOptions{1, 0, 64 * 48 - 1}, &error);
+        EXPECT_EQ(bool(limited), !video);
+        EXPECT_EQ(error.contains(QStringLiteral("unusable size 64x48")), video) << error.toStdString();
+    }
+}
+
+} // namespace
+} // namespace zaf::media
