@@ -23,16 +23,16 @@ ff::InputFormatContextPtr openInput(const QString &path, const CancelToken &canc
     options.set("protocol_whitelist", "file");
     int rc = avformat_open_input(&raw, url.constData(), nullptr, options.address());
     if (rc < 0) { // avformat_open_input frees the context on failure
-        *error = QStringLiteral("cannot open %1: %2").arg(path, ff::errorString(rc));
+        *error = QStringLiteral("cannot open %1: %2").arg(path, cancel.isCancelled() ? QStringLiteral("cancelled") : ff::errorString(rc));
         return {};
     }
     ff::InputFormatContextPtr format(raw);
     rc = avformat_find_stream_info(format.get(), nullptr);
-    if (rc < 0) {
+    if (rc < 0 && !cancel.isCancelled()) {
         *error = QStringLiteral("cannot read the streams of %1: %2").arg(path, ff::errorString(rc));
         return {};
     }
-    // Probing can stop early on an interrupt without reporting an error.
+    // Probing can also stop early on an interrupt without reporting an error.
     if (cancel.isCancelled()) {
         *error = QStringLiteral("cannot read the streams of %1: cancelled").arg(path);
         return {};

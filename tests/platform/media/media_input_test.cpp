@@ -12,7 +12,12 @@
 
 #include <gtest/gtest.h>
 
+#include <csignal>
 #include <thread>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 namespace zaf::media {
 namespace {
@@ -107,6 +112,48 @@ TEST_P(OpenInputTest, OpensLocalFilesAndFailsWithANamedErrorOtherwise)
 
 INSTANTIATE_TEST_SUITE_P(Files, OpenInputTest, testing::ValuesIn(kOpenCases),
                          [](const testing::TestParamInfo<OpenCase> &info) { return std::string(info.param.name); });
+
+// A cancel from another thread while the open waits for data ends it at the next read: a pipe
+// hands over the start of a movie, the token is cancelled (or not), and the rest follows.
+TEST(OpenInputCancelTest, CancelWhileOpeningFailsAsCancelledWhereTheSameOpenSucceedsOtherwise)
+{
+    std::signal(SIGPIPE, SIG_IGN);
+    ScratchDir dir;
+    const QString source = dir.file(QStringLiteral("streamable.mp4")); // header first: readable from a pipe
+    ASSERT_TRUE(zaf::test::ffmpeg(QStringList{QStringLiteral("-i"), zaf::test::sharedFlatColourMovie(QSize(64, 48))}
+                                  << zaf::test::words("-c copy -movflags +faststart") << source));
+    QFile movie(source);
+    ASSERT_TRUE(movie.open(QIODevice::ReadOnly));
+    const QByteArray bytes = movie.readAll();
+    ASSERT_GT(bytes.size(), 4000);
+    for (const bool cancel : {false, true}) {
+        SCOPED_TRACE(cancel ? "cancelled" : "not cancelled");
+        const QByteArray fifo = QFile::encodeName(dir.file(cancel ? QStringLiteral("cancelled.mp4") : QStringLiteral("whole.mp4")));
+        ASSERT_EQ(mkfifo(fifo.constData(), 0600), 0);
+        CancelToken token;
+        std::thread writer([&] {
+            const int fd = ::open(fifo.constData(), O_WRONLY); // waits for the reader
+            if (fd < 0)
+                return;
+            qsizetype written = ::write(fd, bytes.constData(), 100);
+            std::this_thread::sleep_for(std::chrono::milliseconds(100)); // the reader waits for more
+            if (cancel)
+                token.cancel();
+            while (written < bytes.size()) {
+                const ssize_t n = ::write(fd, bytes.constData() + written, bytes.size() - written);
+                if (n <= 0)
+                    break; // the reader has gone
+                written += n;
+            }
+            ::close(fd);
+        });
+        QString error;
+        const ff::InputFormatContextPtr format = openInput(QFile::decodeName(fifo), token, &error);
+        writer.join();
+        EXPECT_EQ(bool(format), !cancel) << error.toStdString();
+        EXPECT_EQ(error.contains(QStringLiteral("cancelled")), cancel) << error.toStdString();
+    }
+}
 
 // Every decoder is made with the same limits: the pixel limit refuses a larger stream up front,
 // and audio streams are not affected by it.
