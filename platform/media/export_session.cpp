@@ -2,9 +2,9 @@
 
 #include "platform/dispatch.h"
 #include "platform/log.h"
-#include "platform/media/export_common.h"
-#include "platform/media/export_output_file.h"
-#include "platform/media/export_pipeline.h"
+#include "platform/media/export/export_common.h"
+#include "platform/media/export/export_output_file.h"
+#include "platform/media/export/export_pipeline.h"
 
 #include <algorithm>
 #include <atomic>
@@ -69,11 +69,11 @@ struct ExportSession::Private {
 std::shared_ptr<ExportSession> ExportSession::exportSessionWithAsset(std::shared_ptr<MediaAsset> asset, const QString &preset)
 {
     if (!asset) {
-        zaf::log::error(lcExport(), QStringLiteral("ExportSession: no asset"));
+        zaf::log::error(lcExport(), QStringLiteral("no asset"));
         return nullptr;
     }
     if (preset != QLatin1String(kExportPresetHighestQuality)) {
-        zaf::log::error(lcExport(), QStringLiteral("ExportSession: unknown preset \"%1\"").arg(preset));
+        zaf::log::error(lcExport(), QStringLiteral("unknown preset \"%1\"").arg(preset));
         return nullptr;
     }
     return std::shared_ptr<ExportSession>(new ExportSession(std::move(asset), preset));
@@ -189,7 +189,7 @@ bool ExportSession::cancelExportAndWait(std::chrono::milliseconds timeout)
     cancelExport();
     if (waitUntilFinished(timeout))
         return true;
-    zaf::log::error(lcExport(), QStringLiteral("ExportSession: export to %1 still writing %2 ms after its cancel")
+    zaf::log::error(lcExport(), QStringLiteral("export to %1 still writing %2 ms after its cancel")
                                     .arg(outputURL().toLocalFile())
                                     .arg(qint64(timeout.count())));
     return false;
@@ -198,7 +198,7 @@ bool ExportSession::cancelExportAndWait(std::chrono::milliseconds timeout)
 void ExportSession::exportAsynchronously(std::function<void()> completion)
 {
     if (d->started.exchange(true)) {
-        zaf::log::error(lcExport(), QStringLiteral("ExportSession: the session has already exported; nothing new starts"));
+        zaf::log::error(lcExport(), QStringLiteral("the session has already exported; nothing new starts"));
         zaf::dispatch::async(zaf::dispatch::Priority::Default, [completion = std::move(completion)] {
             if (completion)
                 completion();
@@ -281,10 +281,10 @@ void ExportSession::run(std::function<void()> completion)
 {
     auto end = [&](ExportStatus final, OptionalError error) {
         if (error && final == ExportStatus::Failed)
-            zaf::log::error(lcExport(), QStringLiteral("ExportSession: export to %1 failed: %2")
+            zaf::log::error(lcExport(), QStringLiteral("export to %1 failed: %2")
                                             .arg(outputURL().toLocalFile(), error->message));
         else if (final == ExportStatus::Cancelled)
-            zaf::log::notice(lcExport(), QStringLiteral("ExportSession: export to %1 cancelled").arg(outputURL().toLocalFile()));
+            zaf::log::notice(lcExport(), QStringLiteral("export to %1 cancelled").arg(outputURL().toLocalFile()));
         d->finish(final, std::move(error));
         if (completion)
             completion();
@@ -328,7 +328,7 @@ void ExportSession::run(std::function<void()> completion)
         output->discard();
         return end(ExportStatus::Failed, commitError);
     }
-    zaf::log::info(lcExport(), QStringLiteral("ExportSession: wrote %1").arg(url.toLocalFile()));
+    zaf::log::info(lcExport(), QStringLiteral("wrote %1").arg(url.toLocalFile()));
     end(ExportStatus::Completed, std::nullopt);
 }
 

@@ -1,9 +1,9 @@
 #include "platform/media/image_generator.h"
-#include "platform/media/media_log.h"
+#include "platform/media/core/media_log.h"
 
 #include "platform/dispatch.h"
 #include "platform/log.h"
-#include "platform/media/image_frame_source.h"
+#include "platform/media/thumbnails/image_frame_source.h"
 #include "platform/media/media_asset.h"
 
 #include <QLoggingCategory>

@@ -1,10 +1,10 @@
 #include "platform/media/media_asset.h"
-#include "platform/media/media_log.h"
+#include "platform/media/core/media_log.h"
 
 #include "platform/dispatch.h"
 #include "platform/log.h"
-#include "platform/media/ffmpeg_ptr.h"
-#include "platform/media/media_input.h"
+#include "platform/media/core/ffmpeg_ptr.h"
+#include "platform/media/core/media_input.h"
 
 extern "C" {
 #include <libavutil/display.h>

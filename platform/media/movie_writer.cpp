@@ -1,10 +1,10 @@
 #include "platform/media/movie_writer.h"
-#include "platform/media/media_log.h"
+#include "platform/media/core/media_log.h"
 
 #include "platform/files/atomic_file.h"
 #include "platform/log.h"
-#include "platform/media/ffmpeg_ptr.h"
-#include "platform/media/frame_converter.h"
+#include "platform/media/core/ffmpeg_ptr.h"
+#include "platform/media/core/frame_converter.h"
 #include "platform/media/media_asset.h"
 
 extern "C" {

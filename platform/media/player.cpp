@@ -1,12 +1,12 @@
 #include "platform/media/player.h"
-#include "platform/media/media_log.h"
+#include "platform/media/core/media_log.h"
 
 #include "platform/log.h"
-#include "platform/media/playback_audio_decoder.h"
-#include "platform/media/playback_audio_output.h"
-#include "platform/media/playback_frame_queue.h"
-#include "platform/media/playback_log.h"
-#include "platform/media/playback_video_decoder.h"
+#include "platform/media/playback/playback_audio_decoder.h"
+#include "platform/media/playback/playback_audio_output.h"
+#include "platform/media/playback/playback_frame_queue.h"
+#include "platform/media/core/media_log.h"
+#include "platform/media/playback/playback_video_decoder.h"
 
 #include <QPointer>
 
@@ -15,15 +15,6 @@
 #include <limits>
 
 namespace zaf::media {
-
-namespace playback {
-const QLoggingCategory &lcPlayback()
-{
-    return lcMedia();
-}
-}
-
-using playback::lcPlayback;
 
 namespace {
 

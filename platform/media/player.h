@@ -22,7 +22,7 @@
 // and pause call every periodic observer once with the new time; they never call boundary observers.
 
 #include "platform/media/media_time.h"
-#include "platform/media/playback_clock.h"
+#include "platform/media/playback/playback_clock.h"
 #include "platform/media/player_item.h"
 
 #include <QImage>

@@ -2,12 +2,11 @@
 
 #include "platform/dispatch.h"
 #include "platform/log.h"
-#include "platform/media/playback_log.h"
+#include "platform/media/core/media_log.h"
 #include "platform/media/player.h"
 
 namespace zaf::media {
 
-using playback::lcPlayback;
 
 PlayerItem::PlayerItem(std::shared_ptr<MediaAsset> asset, QObject *parent)
     : QObject(parent)

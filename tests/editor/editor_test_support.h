@@ -5,7 +5,7 @@
 
 #include "editor/editor.h"
 #include "platform/capability/capability_service.h"
-#include "platform/media/playback_clock.h"
+#include "platform/media/playback/playback_clock.h"
 #include "platform/media/player_item.h"
 #include "platform/ui/bar_button_item.h"
 #include "platform/ui/movie_scrubber.h"

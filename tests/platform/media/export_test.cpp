@@ -327,7 +327,7 @@ protected:
         ASSERT_TRUE(session->error().has_value());
         EXPECT_EQ(session->error()->domain, QString::fromLatin1(kMediaErrorDomain));
         EXPECT_EQ(session->error()->code, code) << session->error()->description().toStdString();
-        EXPECT_FALSE(log.messages(QStringLiteral("zaf.media")).isEmpty());
+        EXPECT_FALSE(log.messages(QStringLiteral("zaf.media.export")).isEmpty());
         EXPECT_FALSE(QFile::exists(output));
         expectNoPartialFiles();
     }

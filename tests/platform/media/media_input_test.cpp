@@ -1,9 +1,9 @@
 // The input layer every media stage opens files through: the cancel token, openInput and the
 // decoder set-up.
 
-#include "platform/media/cancel_token.h"
-#include "platform/media/decoder_setup.h"
-#include "platform/media/media_input.h"
+#include "platform/media/core/cancel_token.h"
+#include "platform/media/core/decoder_setup.h"
+#include "platform/media/core/media_input.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/temp_dir.h"
 

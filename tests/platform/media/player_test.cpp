@@ -1,6 +1,6 @@
 // The Player on a manual clock (loading, observers, the item's end, seeks and pictures checked by the
 // numbers fixture frames show), its layer and audio stage; the tests wait only for loading and decoding.
-#include "platform/media/playback_audio_decoder.h"
+#include "platform/media/playback/playback_audio_decoder.h"
 #include "platform/media/player.h"
 #include "platform/media/player_layer.h"
 #include "tests/support/log_capture.h"
@@ -109,7 +109,7 @@ TEST(PlayerItemTest, ItemFailsWithLoggedErrorForMissingEmptyGarbageAndTruncatedF
         ASSERT_TRUE(item->error().has_value());
         EXPECT_EQ(item->error()->domain, QString::fromUtf8(kMediaErrorDomain));
         EXPECT_FALSE(item->duration().isValid());
-        const QStringList messages = log.messages(QStringLiteral("zaf.media"));
+        const QStringList messages = log.messages(QStringLiteral("zaf.media.playback"));
         EXPECT_TRUE(std::any_of(messages.begin(), messages.end(),
                                 [&](const QString &m) { return m.startsWith(QStringLiteral("Cannot play")) && m.contains(path); }))
             << messages.join(u'\n').toStdString();

@@ -10,8 +10,8 @@
 // keeps running to the end of a movie whose video is longer than its sound.
 // Created, used and destroyed on the main thread.
 
-#include "platform/media/playback_audio_decoder.h"
-#include "platform/media/playback_clock.h"
+#include "platform/media/playback/playback_audio_decoder.h"
+#include "platform/media/playback/playback_clock.h"
 
 #include <QAudioDevice>
 #include <QTimer>

@@ -1,10 +1,10 @@
-#include "platform/media/playback_video_decoder.h"
+#include "platform/media/playback/playback_video_decoder.h"
 
 #include "platform/log.h"
-#include "platform/media/frame_converter.h"
-#include "platform/media/decoder_setup.h"
-#include "platform/media/media_input.h"
-#include "platform/media/playback_log.h"
+#include "platform/media/core/frame_converter.h"
+#include "platform/media/core/decoder_setup.h"
+#include "platform/media/core/media_input.h"
+#include "platform/media/core/media_log.h"
 
 #include <cmath>
 #include <utility>

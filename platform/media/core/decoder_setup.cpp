@@ -1,4 +1,4 @@
-#include "platform/media/decoder_setup.h"
+#include "platform/media/core/decoder_setup.h"
 
 namespace zaf::media {
 

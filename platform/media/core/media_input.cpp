@@ -1,4 +1,4 @@
-#include "platform/media/media_input.h"
+#include "platform/media/core/media_input.h"
 
 #include <QFile>
 

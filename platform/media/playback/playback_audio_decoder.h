@@ -7,8 +7,8 @@
 // Input: start(time) and stop() requests. Output: PCM in the ring, starting at exactly the requested
 // time, then the end mark at the end of the longest stream.
 
-#include "platform/media/cancel_token.h"
-#include "platform/media/playback_audio_ring.h"
+#include "platform/media/core/cancel_token.h"
+#include "platform/media/playback/playback_audio_ring.h"
 
 #include <QList>
 #include <QString>

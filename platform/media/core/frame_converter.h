@@ -12,7 +12,7 @@
 // A converter keeps one scaler for pictures of one shape and makes a new one when the shape
 // changes. Not thread-safe: one converter per thread of use.
 
-#include "platform/media/ffmpeg_ptr.h"
+#include "platform/media/core/ffmpeg_ptr.h"
 
 #include <QImage>
 #include <QSize>

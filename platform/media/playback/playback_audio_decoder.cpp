@@ -1,9 +1,9 @@
-#include "platform/media/playback_audio_decoder.h"
+#include "platform/media/playback/playback_audio_decoder.h"
 
 #include "platform/log.h"
-#include "platform/media/decoder_setup.h"
-#include "platform/media/media_input.h"
-#include "platform/media/playback_log.h"
+#include "platform/media/core/decoder_setup.h"
+#include "platform/media/core/media_input.h"
+#include "platform/media/core/media_log.h"
 
 #include <algorithm>
 #include <cmath>

@@ -8,7 +8,7 @@
 // Input: the source stream's packets through sendPacket(). Output: encoded packets handed to the
 // PacketWriter for its one output stream. Every call runs on the export's worker thread.
 
-#include "platform/media/export_common.h"
+#include "platform/media/export/export_common.h"
 
 #include <memory>
 

@@ -1,10 +1,10 @@
-#include "platform/media/export_pipeline.h"
-#include "platform/media/media_log.h"
+#include "platform/media/export/export_pipeline.h"
+#include "platform/media/core/media_log.h"
 
 #include "platform/log.h"
-#include "platform/media/export_audio_encoder.h"
-#include "platform/media/export_video_encoder.h"
-#include "platform/media/media_input.h"
+#include "platform/media/export/export_audio_encoder.h"
+#include "platform/media/export/export_video_encoder.h"
+#include "platform/media/core/media_input.h"
 
 #include <QFile>
 
@@ -13,11 +13,6 @@
 #include <vector>
 
 namespace zaf::media::exportpipe {
-
-const QLoggingCategory &lcExport()
-{
-    return lcMedia();
-}
 
 namespace {
 
@@ -200,7 +195,7 @@ private:
                 if (StageResult r = addCopy(in, route))
                     return r;
             } else {
-                zaf::log::info(lcExport(), QStringLiteral("ExportSession: stream %1 (%2) is not exported")
+                zaf::log::info(lcExport(), QStringLiteral("stream %1 (%2) is not exported")
                                                .arg(i).arg(QString::fromLatin1(avcodec_get_name(in->codecpar->codec_id))));
             }
         }
@@ -236,7 +231,7 @@ private:
         // The latest keyframe at or before the target, for every stream.
         const int rc = avformat_seek_file(m_input.get(), -1, INT64_MIN, target, target, 0);
         if (rc < 0) {
-            zaf::log::info(lcExport(), QStringLiteral("ExportSession: seek failed (%1); reading from the start").arg(ff::errorString(rc)));
+            zaf::log::info(lcExport(), QStringLiteral("seek failed (%1); reading from the start").arg(ff::errorString(rc)));
             avformat_seek_file(m_input.get(), -1, INT64_MIN, 0, 0, 0);
         }
         return std::nullopt;

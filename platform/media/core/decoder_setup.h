@@ -3,7 +3,7 @@
 // Setting up a decoder for one stream of an opened input, the one way every decoder is made
 // (playback video and audio, thumbnails, export). Private to platform/media.
 
-#include "platform/media/ffmpeg_ptr.h"
+#include "platform/media/core/ffmpeg_ptr.h"
 
 #include <QString>
 

@@ -1,4 +1,4 @@
-#include "platform/media/media_log.h"
+#include "platform/media/core/media_log.h"
 
 #include "platform/log.h"
 
@@ -38,6 +38,18 @@ void routeFFmpegMessage(void *context, int level, const char *format, va_list ar
 const QLoggingCategory &lcMedia()
 {
     static const QLoggingCategory category("zaf.media");
+    return category;
+}
+
+const QLoggingCategory &lcPlayback()
+{
+    static const QLoggingCategory category("zaf.media.playback");
+    return category;
+}
+
+const QLoggingCategory &lcExport()
+{
+    static const QLoggingCategory category("zaf.media.export");
     return category;
 }
 

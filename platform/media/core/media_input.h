@@ -3,8 +3,8 @@
 // Opening a movie file for reading, the one way every stage does it (probe, playback, thumbnails,
 // export). Private to platform/media.
 
-#include "platform/media/cancel_token.h"
-#include "platform/media/ffmpeg_ptr.h"
+#include "platform/media/core/cancel_token.h"
+#include "platform/media/core/ffmpeg_ptr.h"
 
 #include <QString>
 

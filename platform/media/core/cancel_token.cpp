@@ -1,4 +1,4 @@
-#include "platform/media/cancel_token.h"
+#include "platform/media/core/cancel_token.h"
 
 #include <algorithm>
 

@@ -1,12 +1,13 @@
 #pragma once
 
-// Internal pieces shared by the export pipeline stages (private to platform/media): the logging
-// category, the failure type a stage reports, and the packet hand-off between a
+// Internal pieces shared by the export pipeline stages (private to platform/media): the failure
+// type a stage reports, and the packet hand-off between a
 // stage and the muxer. Every stage runs on the export's worker thread.
 
 #include "platform/error.h"
-#include "platform/media/cancel_token.h"
-#include "platform/media/ffmpeg_ptr.h"
+#include "platform/media/core/cancel_token.h"
+#include "platform/media/core/ffmpeg_ptr.h"
+#include "platform/media/core/media_log.h"
 #include "platform/media/media_asset.h"
 
 #include <QLoggingCategory>
@@ -14,8 +15,6 @@
 #include <functional>
 
 namespace zaf::media::exportpipe {
-
-const QLoggingCategory &lcExport();
 
 // The outcome of a stage's step: no error, or the media error that ends the export.
 using StageResult = OptionalError;

@@ -8,9 +8,9 @@
 // `interrupt`, which is polled from FFmpeg's interrupt callback on the calling thread.
 
 #include "platform/error.h"
-#include "platform/media/cancel_token.h"
-#include "platform/media/ffmpeg_ptr.h"
-#include "platform/media/frame_converter.h"
+#include "platform/media/core/cancel_token.h"
+#include "platform/media/core/ffmpeg_ptr.h"
+#include "platform/media/core/frame_converter.h"
 #include "platform/media/media_asset.h"
 #include "platform/media/media_time.h"
 

@@ -7,7 +7,7 @@
 // runExport() runs on the caller's thread (the export's worker thread) from start to end; the
 // progress callback runs on that same thread.
 
-#include "platform/media/export_common.h"
+#include "platform/media/export/export_common.h"
 
 #include <QList>
 #include <QString>

@@ -1,4 +1,4 @@
-#include "platform/media/playback_frame_queue.h"
+#include "platform/media/playback/playback_frame_queue.h"
 
 #include <algorithm>
 #include <chrono>

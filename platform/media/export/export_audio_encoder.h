@@ -7,7 +7,7 @@
 // Inputs: the source streams' packets, through sendPacket(). Output: encoded packets handed to the
 // PacketWriter for its one output stream. Every call runs on the export's worker thread.
 
-#include "platform/media/export_common.h"
+#include "platform/media/export/export_common.h"
 
 #include <QList>
 

@@ -1,6 +1,6 @@
-#include "platform/media/export_output_file.h"
+#include "platform/media/export/export_output_file.h"
 
-#include "platform/media/export_common.h"
+#include "platform/media/export/export_common.h"
 
 #include <cerrno>
 

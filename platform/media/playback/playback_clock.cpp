@@ -1,4 +1,4 @@
-#include "platform/media/playback_clock.h"
+#include "platform/media/playback/playback_clock.h"
 
 namespace zaf::media {
 

@@ -10,8 +10,8 @@
 // in order until the end of the stream. A newer request abandons an older one at once, so a burst
 // of requests costs one decode.
 
-#include "platform/media/cancel_token.h"
-#include "platform/media/playback_frame_queue.h"
+#include "platform/media/core/cancel_token.h"
+#include "platform/media/playback/playback_frame_queue.h"
 
 #include <QString>
 

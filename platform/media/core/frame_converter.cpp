@@ -1,4 +1,4 @@
-#include "platform/media/frame_converter.h"
+#include "platform/media/core/frame_converter.h"
 
 extern "C" {
 #include <libavutil/imgutils.h>

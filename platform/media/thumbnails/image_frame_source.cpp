@@ -1,7 +1,7 @@
-#include "platform/media/image_frame_source.h"
-#include "platform/media/decoder_setup.h"
-#include "platform/media/media_input.h"
-#include "platform/media/media_log.h"
+#include "platform/media/thumbnails/image_frame_source.h"
+#include "platform/media/core/decoder_setup.h"
+#include "platform/media/core/media_input.h"
+#include "platform/media/core/media_log.h"
 
 #include "platform/log.h"
 

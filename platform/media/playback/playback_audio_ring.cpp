@@ -1,4 +1,4 @@
-#include "platform/media/playback_audio_ring.h"
+#include "platform/media/playback/playback_audio_ring.h"
 
 #include <algorithm>
 #include <chrono>

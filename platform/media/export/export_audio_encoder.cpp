@@ -1,5 +1,5 @@
-#include "platform/media/export_audio_encoder.h"
-#include "platform/media/decoder_setup.h"
+#include "platform/media/export/export_audio_encoder.h"
+#include "platform/media/core/decoder_setup.h"
 
 #include "platform/log.h"
 
@@ -162,7 +162,7 @@ StageResult ExportAudioEncoder::Private::buildGraph(const Options &options)
     rc = avfilter_graph_config(graph.get(), nullptr);
     if (rc < 0)
         return stageError(kMediaErrorUnknown, QStringLiteral("audio filter graph \"%1\"").arg(description), rc);
-    zaf::log::info(lcExport(), QStringLiteral("ExportSession: audio graph %1").arg(description));
+    zaf::log::info(lcExport(), QStringLiteral("audio graph %1").arg(description));
     return std::nullopt;
 }
 

@@ -1,4 +1,4 @@
-#include "platform/media/playback_audio_output.h"
+#include "platform/media/playback/playback_audio_output.h"
 
 #include <QAudioFormat>
 #include <QAudioSink>

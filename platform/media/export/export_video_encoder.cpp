@@ -1,6 +1,6 @@
-#include "platform/media/export_video_encoder.h"
-#include "platform/media/decoder_setup.h"
-#include "platform/media/frame_converter.h"
+#include "platform/media/export/export_video_encoder.h"
+#include "platform/media/core/decoder_setup.h"
+#include "platform/media/core/frame_converter.h"
 
 extern "C" {
 #include <libavutil/opt.h>
