@@ -48,43 +48,14 @@ bool isValidUtf8(const QByteArray &bytes)
     return !decoder.hasError();
 }
 
-// The deepest nesting of arrays and objects in `text` (a top-level object counts 1), read in one
-// pass without recursion; strings are skipped. Stops counting once `limit` is passed.
-int nestingDepth(const QByteArray &text, int limit)
-{
-    int depth = 0, deepest = 0;
-    bool inString = false, escaped = false;
-    for (const char c : text) {
-        if (inString) {
-            if (escaped)
-                escaped = false;
-            else if (c == '\\')
-                escaped = true;
-            else if (c == '"')
-                inString = false;
-        } else if (c == '"') {
-            inString = true;
-        } else if (c == '{' || c == '[') {
-            deepest = std::max(deepest, ++depth);
-            if (deepest > limit)
-                break;
-        } else if ((c == '}' || c == ']') && depth > 0) {
-            --depth;
-        }
-    }
-    return deepest;
-}
-
-// `text` with every array or object inside the top-level value replaced by null: the envelope of
-// a message (its id and method) without its contents, which can be read however deep they go.
-QByteArray envelopeOf(const QByteArray &text)
-{
-    QByteArray out;
-    out.reserve(text.size());
+// Walks JSON text one character at a time and keeps the nesting depth of arrays and objects;
+// brackets inside strings do not count.
+struct NestingScanner {
     int depth = 0;
     bool inString = false, escaped = false;
-    for (const char c : text) {
-        const int before = depth;
+
+    void step(char c)
+    {
         if (inString) {
             if (escaped)
                 escaped = false;
@@ -99,9 +70,37 @@ QByteArray envelopeOf(const QByteArray &text)
         } else if ((c == '}' || c == ']') && depth > 0) {
             --depth;
         }
-        if (before <= 1 && depth <= 1)
+    }
+};
+
+// The deepest nesting of arrays and objects in `text` (a top-level object counts 1), read in one
+// pass without recursion. Stops counting once `limit` is passed.
+int nestingDepth(const QByteArray &text, int limit)
+{
+    NestingScanner scanner;
+    int deepest = 0;
+    for (const char c : text) {
+        scanner.step(c);
+        deepest = std::max(deepest, scanner.depth);
+        if (deepest > limit)
+            break;
+    }
+    return deepest;
+}
+
+// `text` with every array or object inside the top-level value replaced by null: the envelope of
+// a message (its id and method) without its contents, which can be read however deep they go.
+QByteArray envelopeOf(const QByteArray &text)
+{
+    QByteArray out;
+    out.reserve(text.size());
+    NestingScanner scanner;
+    for (const char c : text) {
+        const int before = scanner.depth;
+        scanner.step(c);
+        if (before <= 1 && scanner.depth <= 1)
             out.append(c);
-        else if (before == 1 && depth == 2)
+        else if (before == 1 && scanner.depth == 2)
             out.append("null");
     }
     return out;
