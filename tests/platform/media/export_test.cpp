@@ -246,6 +246,71 @@ TEST_F(ExportTest, TrimKeepsExactlyTheFramesOfItsRangeAndEveryAudioTrackInSync)
     EXPECT_EQ(track[0].preferredTransform, AffineTransform::rotation(90, 320, 240));
 }
 
+// Sources as recorders and cameras write them, each trimmed frame-exactly: cut 0.1 ms into a
+// keyframe, into the frame before and the frame after one, twice inside one group, and the whole
+// movie. Whatever the export does inside (copying groups, re-encoding the frames at the cuts), the
+// output holds exactly the frames shown during the range, and a second decoder agrees.
+struct TrimSource {
+    const char *name;
+    fixture::FixtureSpec spec;
+    const char *encode; // ffmpeg options re-encoding the fixture; empty: the fixture itself
+};
+
+class ExportTrimSourceTest : public ExportTest, public ::testing::WithParamInterface<TrimSource> {};
+
+TEST_P(ExportTrimSourceTest, EveryCutHoldsExactlyTheFramesShownDuringItsRange)
+{
+    QString source = sharedFixtureMovie(GetParam().spec);
+    if (*GetParam().encode) {
+        source = scratch.file(QStringLiteral("source.mp4"));
+        ASSERT_TRUE(ffmpeg(QStringList{QStringLiteral("-i"), sharedFixtureMovie(GetParam().spec)} << words(GetParam().encode) << source));
+    }
+    const QList<double> pts = presentationTimes(source);
+    const QList<int> numbers = readFrameNumbers(source);
+    const QList<int> keys = keyFrameIndexes(source);
+    ASSERT_EQ(pts.size(), numbers.size());
+    ASSERT_GE(keys.size(), 2);
+    const int k = keys[1];
+    ASSERT_TRUE(k >= 2 && k + 10 < pts.size()) << k;
+    const double movieEnd = pts.last() + (pts.last() - pts[pts.size() - 2]);
+    constexpr double kInto = 1e-4;
+    struct Cut {
+        const char *name;
+        double start, end;
+    };
+    const QList<Cut> cuts{{"keyframe", pts[k] + kInto, pts[k + 9] + kInto},
+                          {"frame-before-keyframe", pts[k - 1] + kInto, pts[k + 9] + kInto},
+                          {"frame-after-keyframe", pts[k + 1] + kInto, pts[k + 9] + kInto},
+                          {"inside-one-group", pts[k + 2] + kInto, pts[k + 7] + kInto},
+                          {"whole-movie", 0.0, movieEnd}};
+    for (const Cut &c : cuts) {
+        SCOPED_TRACE(c.name);
+        QList<int> expected; // from the frame on screen at the start to the last that begins before the end
+        for (int i = 0; i < pts.size(); ++i) {
+            if ((i + 1 < pts.size() ? pts[i + 1] : movieEnd) > c.start && pts[i] < c.end)
+                expected << numbers[i];
+        }
+        const QString output = exported(source, QString::fromLatin1(c.name) + QStringLiteral(".mp4"), [&](ExportSession &s) {
+            s.setTimeRange(MediaTimeRange::fromStartEnd(MediaTime::fromSeconds(c.start, 1000000), MediaTime::fromSeconds(c.end, 1000000)));
+        });
+        EXPECT_EQ(readFrameNumbers(output), expected);
+        if (secondDecoderAvailable()) {
+            EXPECT_EQ(decodeVideoFramesWithSecondDecoder(output), expected.size());
+        }
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Sources, ExportTrimSourceTest, ::testing::Values(
+    TrimSource{"NoBFramesOneSecondGroups", {.seconds = 4, .gop = 30}, ""},
+    TrimSource{"BFramesOneSecondGroups", {.seconds = 4}, "-map 0 -c:v libx264 -preset veryfast -bf 3 -g 30 -sc_threshold 0 -c:a copy"},
+    TrimSource{"BFramesEightSecondGroups", {.seconds = 12}, "-map 0 -c:v libx264 -preset veryfast -bf 3 -g 240 -keyint_min 240 -sc_threshold 0 -c:a copy"},
+    TrimSource{"SixtyFps", {.seconds = 3, .fps = 60}, "-map 0 -c:v libx264 -preset veryfast -bf 3 -g 60 -sc_threshold 0 -c:a copy"},
+    TrimSource{"VariableFrameRate", {.seconds = 4}, "-map 0 -vf setpts=(N+floor(N/3)*0.5)/30/TB -fps_mode passthrough -c:v libx264 -preset veryfast -bf 3 -g 30 -sc_threshold 0 -c:a copy"},
+    TrimSource{"OpenGroups", {.seconds = 4}, "-map 0 -c:v libx264 -preset veryfast -bf 3 -g 30 -sc_threshold 0 -x264-params open_gop=1 -c:a copy"},
+    TrimSource{"Rotated", {.seconds = 4, .rotation = 90, .gop = 30}, ""},
+    TrimSource{"NotH264", {.seconds = 4}, "-map 0 -c:v mpeg4 -q:v 1 -g 30 -c:a copy"}),
+    [](const ::testing::TestParamInfo<TrimSource> &info) { return std::string(info.param.name); });
+
 // A trim with an audio mix gives one mixed track cut to the range.
 TEST_F(ExportTest, TrimWithAudioMixGivesOneMixedTrackCutToTheRange)
 {

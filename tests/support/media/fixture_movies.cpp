@@ -265,6 +265,21 @@ int countVideoFrames(const QString &path)
     return ok ? frames : -1;
 }
 
+QList<double> presentationTimes(const QString &path)
+{
+    QList<double> times;
+    for (const QByteArray &line : ffprobeOutput(words("-select_streams v:0 -show_entries frame=pts_time -of csv=p=0") << path).split('\n')) {
+        bool ok = false; // a frame with side data prints "0.000000," then an empty line
+        const double t = line.trimmed().split(',').first().toDouble(&ok);
+        if (ok)
+            times.append(t);
+    }
+    const double first = times.isEmpty() ? 0 : times.first();
+    for (double &t : times)
+        t -= first;
+    return times;
+}
+
 QList<int> keyFrameIndexes(const QString &path)
 {
     QList<int> indexes;

@@ -57,6 +57,9 @@ int probeRotation(const QJsonObject &stream);
 // The number of video frames of the first video stream, counted by decoding with ffprobe.
 int countVideoFrames(const QString &path);
 
+// The presentation times (seconds, from the first frame's) of the frames of the first video stream,
+// in presentation order.
+QList<double> presentationTimes(const QString &path);
 // The presentation-order indexes of the key frames of the first video stream.
 QList<int> keyFrameIndexes(const QString &path);
 
