@@ -311,6 +311,29 @@ INSTANTIATE_TEST_SUITE_P(Sources, ExportTrimSourceTest, ::testing::Values(
     TrimSource{"NotH264", {.seconds = 4}, "-map 0 -c:v mpeg4 -q:v 1 -g 30 -c:a copy"}),
     [](const ::testing::TestParamInfo<TrimSource> &info) { return std::string(info.param.name); });
 
+// A click at a known moment of each audio track lands where it should after a trim, within a
+// millisecond, on a keyframe, inside a frame or a frame after the start.
+TEST_F(ExportTest, TrimKeepsEachAudioTracksClickWithinAMillisecond)
+{
+    const QString source = scratch.file(QStringLiteral("clicks.mp4"));
+    ASSERT_TRUE(ffmpeg(QStringList{QStringLiteral("-i"), sharedFixtureMovie({.seconds = 4, .audioTracks = 0})}
+                       << words("-f lavfi -i aevalsrc=if(between(t\\,2\\,2.0005)\\,0.9\\,0):s=48000:d=4"
+                                " -f lavfi -i aevalsrc=if(between(t\\,2.5\\,2.5005)\\,0.9\\,0):s=48000:d=4"
+                                " -map 0:v -map 1 -map 2 -c:v copy -c:a aac -b:a 256k")
+                       << source));
+    const double clicks[2] = {loudestMoment(source, 0), loudestMoment(source, 1)};
+    ASSERT_NEAR(clicks[0], 2.0, 0.005);
+    ASSERT_NEAR(clicks[1], 2.5, 0.005);
+    for (const double start : {1.0, 1.31, 1.0 / 30}) {
+        SCOPED_TRACE(start);
+        const QString output = exported(source, QStringLiteral("clicks-%1.mp4").arg(start), [&](ExportSession &s) {
+            s.setTimeRange(MediaTimeRange::fromStartEnd(MediaTime::fromSeconds(start, 1000000), MediaTime::fromSeconds(3.6, 1000000)));
+        });
+        for (int k = 0; k < 2; ++k)
+            EXPECT_NEAR(loudestMoment(output, k), clicks[k] - start, 0.001) << "track " << k;
+    }
+}
+
 // A trim with an audio mix gives one mixed track cut to the range.
 TEST_F(ExportTest, TrimWithAudioMixGivesOneMixedTrackCutToTheRange)
 {

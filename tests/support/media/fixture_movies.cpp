@@ -185,6 +185,33 @@ int readFrameNumber(const QImage &image)
     return zaf::fixture::readFrameNumber(image);
 }
 
+double loudestMoment(const QString &moviePath, int audioStreamIndex)
+{
+    constexpr int kRate = 48000;
+    // aresample with first_pts=0 pads or drops samples so that sample i plays at i / rate on the
+    // movie's timeline, whatever the track's start and edit list.
+    const ToolRun r = ffmpegRun({QStringLiteral("-i"), moviePath, QStringLiteral("-map"), QStringLiteral("0:a:%1").arg(audioStreamIndex),
+                                 QStringLiteral("-af"), QStringLiteral("aresample=async=1:first_pts=0"), QStringLiteral("-ac"),
+                                 QStringLiteral("1"), QStringLiteral("-ar"), QString::number(kRate), QStringLiteral("-c:a"),
+                                 QStringLiteral("pcm_f32le"), QStringLiteral("-f"), QStringLiteral("f32le"), QStringLiteral("-")});
+    const qsizetype samples = r.out.size() / qsizetype(sizeof(float));
+    if (!r.ok() || samples == 0) {
+        ADD_FAILURE() << "audio stream " << audioStreamIndex << " of " << qPrintable(moviePath) << " decodes to no samples";
+        return -1;
+    }
+    qsizetype loudest = 0;
+    float peak = -1;
+    for (qsizetype i = 0; i < samples; ++i) {
+        float v;
+        std::memcpy(&v, r.out.constData() + i * sizeof(float), sizeof v);
+        if (std::abs(v) > peak) {
+            peak = std::abs(v);
+            loudest = i;
+        }
+    }
+    return double(loudest) / kRate;
+}
+
 double toneLevel(const QString &moviePath, int audioStreamIndex, double frequency)
 {
     const QList<QJsonObject> audio = probeStreams(ffprobe(moviePath), QStringLiteral("audio"));

@@ -47,6 +47,10 @@ int readFrameNumber(const QImage &image);
 // the audio streams), mixed to mono: ~0.5 for a fixture tone, ~0 for an absent one. -1 on failure.
 double toneLevel(const QString &moviePath, int audioStreamIndex, double frequency);
 
+// The moment (seconds on the movie's timeline) of the loudest sample of audio stream
+// `audioStreamIndex`, mixed to mono: where a click sits. -1 on failure.
+double loudestMoment(const QString &moviePath, int audioStreamIndex);
+
 // ffprobe -show_streams -show_format, parsed.
 QJsonObject ffprobe(const QString &path);
 // The streams of one kind ("video", "audio") from an ffprobe answer or of a file, in file order.
