@@ -29,6 +29,8 @@ ff::CodecContextPtr openDecoder(const AVStream *stream, const DecoderOptions &op
     context->pkt_timebase = stream->time_base;
     context->max_pixels = options.maxPixels;
     context->thread_count = options.threadCount;
+    if (options.errorRecognition != 0)
+        context->err_recognition = options.errorRecognition;
     if (options.threadType != 0)
         context->thread_type = options.threadType;
     rc = avcodec_open2(context.get(), codec, nullptr);

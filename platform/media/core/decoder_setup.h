@@ -18,6 +18,8 @@ struct DecoderOptions {
     int threadType = 0;
     // Streams that declare larger pictures are refused, and no picture larger is ever allocated.
     std::int64_t maxPixels = ff::kMaxPixels;
+    // AV_EF_* flags: which damage the decoder reports as an error instead of concealing it.
+    int errorRecognition = 0;
 };
 
 // A decoder for `stream`, opened: its parameters come from the stream, its packet time base is the

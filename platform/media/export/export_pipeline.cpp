@@ -4,6 +4,8 @@
 #include "platform/log.h"
 #include "platform/media/export/export_audio_encoder.h"
 #include "platform/media/export/export_video_encoder.h"
+#include "platform/media/export/export_video_splicer.h"
+#include "platform/media/export/splice_check.h"
 #include "platform/media/core/media_input.h"
 
 #include <QFile>
@@ -25,7 +27,7 @@ constexpr int kMaxConsecutiveRetries = 1000;
 // that never reaches its end.
 constexpr std::int64_t kMaxPackets = std::int64_t(1) << 32;
 
-enum class Route { Drop, Copy, Video, Audio };
+enum class Route { Drop, Copy, Video, Splice, Audio };
 
 struct StreamRoute {
     Route route = Route::Drop;
@@ -35,8 +37,10 @@ struct StreamRoute {
 
 class Pipeline {
 public:
-    Pipeline(const ExportJob &job, const CancelToken &cancel, const std::function<void(float)> &progress)
-        : m_job(job), m_cancel(cancel), m_progress(progress)
+    // `smartCut`: cut H.264 video by copying whole groups and re-encoding only the pictures at the
+    // cuts; otherwise every kept picture is re-encoded.
+    Pipeline(const ExportJob &job, const CancelToken &cancel, const std::function<void(float)> &progress, bool smartCut)
+        : m_job(job), m_cancel(cancel), m_progress(progress), m_smartCut(smartCut)
     {
     }
 
@@ -142,9 +146,13 @@ private:
                         return r;
                     continue;
                 }
+                const std::int64_t start = m_job.cut->startMicros + startOffset(), end = m_job.cut->endMicros + startOffset();
+                if (StageResult r = addSplicedVideo(in, start, end, route))
+                    return r;
+                if (route.route == Route::Splice)
+                    continue;
                 Error error;
-                auto stage = ExportVideoEncoder::create({in, m_job.cut->startMicros + startOffset(), m_job.cut->endMicros + startOffset()},
-                                                        m_output.get(), writer(), &error);
+                auto stage = ExportVideoEncoder::create({in, start, end, std::nullopt}, m_output.get(), writer(), &error);
                 if (!stage)
                     return error;
                 route.route = Route::Video;
@@ -204,6 +212,26 @@ private:
         return std::nullopt;
     }
 
+    // Routes a cut video stream to the splicer when it can be spliced; leaves the route alone (for
+    // a full re-encode) otherwise.
+    StageResult addSplicedVideo(const AVStream *in, std::int64_t start, std::int64_t end, StreamRoute &route)
+    {
+        if (!m_smartCut || m_splicer)
+            return std::nullopt;
+        if (const std::optional<QString> why = ExportVideoSplicer::whyNotSpliceable(in)) {
+            zaf::log::info(lcExport(), QStringLiteral("video stream %1 is re-encoded whole: %2").arg(in->index).arg(*why));
+            return std::nullopt;
+        }
+        if (StageResult r = addCopy(in, route))
+            return r;
+        Error error;
+        m_splicer = ExportVideoSplicer::create({in, start, end}, m_output->streams[route.outputIndex], writer(), &error);
+        if (!m_splicer)
+            return error;
+        route.route = Route::Splice;
+        return std::nullopt;
+    }
+
     // Source timestamps of the movie's first instant (ranges are relative to it).
     std::int64_t startOffset() const
     {
@@ -240,6 +268,8 @@ private:
     bool allStagesPastEnd() const
     {
         if (!m_job.cut)
+            return false;
+        if (m_splicer && !m_splicer->isPastEnd())
             return false;
         for (const auto &v : m_video) {
             if (!v->isPastEnd())
@@ -292,6 +322,8 @@ private:
                     return v->sendPacket(packet);
             }
             return std::nullopt;
+        case Route::Splice:
+            return m_splicer->sendPacket(packet);
         case Route::Audio:
             return route.audio->sendPacket(packet);
         }
@@ -329,6 +361,10 @@ private:
 
     StageResult finish()
     {
+        if (m_splicer) {
+            if (StageResult r = m_splicer->finish())
+                return r;
+        }
         for (const auto &v : m_video) {
             if (StageResult r = v->finish())
                 return r;
@@ -346,6 +382,12 @@ private:
         rc = avio_closep(&m_output->pb);
         if (rc < 0)
             return writeError(QStringLiteral("cannot close %1").arg(m_job.outputPath), rc);
+        if (m_splicer) {
+            zaf::log::info(lcExport(), QStringLiteral("cut by copying %1 pictures and re-encoding %2")
+                                           .arg(m_splicer->copiedPictures()).arg(m_splicer->encodedPictures()));
+            if (const std::optional<QString> why = checkSplices(m_job.outputPath, m_splicer->splicePoints(), m_cancel))
+                return spliceError(*why);
+        }
         if (m_progress)
             m_progress(1.0f);
         return std::nullopt;
@@ -358,7 +400,9 @@ private:
     // Declared before the stages: the stages' writers point at it, and it outlives them.
     ff::OutputFormatContextPtr m_output;
     std::vector<StreamRoute> m_routes;
+    const bool m_smartCut;
     std::vector<std::unique_ptr<ExportVideoEncoder>> m_video;
+    std::unique_ptr<ExportVideoSplicer> m_splicer;
     std::vector<std::unique_ptr<ExportAudioEncoder>> m_audio;
     ExportAudioEncoder *m_mixer = nullptr;
 };
@@ -367,8 +411,21 @@ private:
 
 OptionalError runExport(const ExportJob &job, const CancelToken &cancel, const std::function<void(float)> &progress)
 {
-    Pipeline pipeline(job, cancel, progress);
-    return pipeline.run();
+    // Progress never runs backwards, also when a smart cut is redone as a full re-encode.
+    float reported = 0;
+    const std::function<void(float)> monotonic = [&](float value) {
+        if (value > reported || value >= 1.0f) {
+            reported = std::max(reported, value);
+            if (progress)
+                progress(reported);
+        }
+    };
+    OptionalError result = Pipeline(job, cancel, monotonic, true).run();
+    if (result && isSpliceError(*result)) {
+        zaf::log::info(lcExport(), QStringLiteral("the smart cut of %1 is redone as a full re-encode: %2").arg(job.sourcePath, result->message));
+        result = Pipeline(job, cancel, monotonic, false).run();
+    }
+    return result;
 }
 
 } // namespace zaf::media::exportpipe
