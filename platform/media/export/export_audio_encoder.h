@@ -7,7 +7,7 @@
 // Inputs: the source streams' packets, through sendPacket(). Output: encoded packets handed to the
 // PacketWriter for its one output stream. Every call runs on the export's worker thread.
 
-#include "platform/media/export/export_common.h"
+#include "platform/media/export/export_audio_stage.h"
 
 #include <QList>
 
@@ -16,7 +16,7 @@
 
 namespace zaf::media::exportpipe {
 
-class ExportAudioEncoder {
+class ExportAudioEncoder final : public ExportAudioStage {
 public:
     struct Cut {
         std::int64_t startMicros = 0;   // first instant kept, in microseconds of the source
@@ -32,15 +32,15 @@ public:
     // (before its header is written).
     static std::unique_ptr<ExportAudioEncoder> create(const Options &options, AVFormatContext *output,
                                                       PacketWriter writer, Error *error);
-    ~ExportAudioEncoder();
+    ~ExportAudioEncoder() override;
 
-    bool handlesStream(int sourceStreamIndex) const;
+    bool handlesStream(int sourceStreamIndex) const override;
     // A packet of one of the input streams.
-    StageResult sendPacket(const AVPacket *packet);
+    StageResult sendPacket(const AVPacket *packet) override;
     // Drains decoders, filters and encoder at the end of the input.
-    StageResult finish();
+    StageResult finish() override;
     // True once every input has delivered audio at or past the cut's end (always false without a cut).
-    bool isPastEnd() const;
+    bool isPastEnd() const override;
 
 private:
     ExportAudioEncoder();

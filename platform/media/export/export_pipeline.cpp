@@ -2,11 +2,13 @@
 #include "platform/media/core/media_log.h"
 
 #include "platform/log.h"
+#include "platform/media/export/export_audio_copier.h"
 #include "platform/media/export/export_audio_encoder.h"
 #include "platform/media/export/export_video_encoder.h"
 #include "platform/media/export/export_video_splicer.h"
 #include "platform/media/export/splice_check.h"
 #include "platform/media/core/media_input.h"
+#include "platform/media/export/stream_copy.h"
 
 #include <QFile>
 
@@ -32,7 +34,7 @@ enum class Route { Drop, Copy, Video, Splice, Audio };
 struct StreamRoute {
     Route route = Route::Drop;
     int outputIndex = -1;                        // for Copy
-    ExportAudioEncoder *audio = nullptr;         // for Audio
+    ExportAudioStage *audio = nullptr;           // for Audio
 };
 
 class Pipeline {
@@ -104,24 +106,10 @@ private:
 
     StageResult addCopy(const AVStream *in, StreamRoute &route)
     {
-        AVStream *out = avformat_new_stream(m_output.get(), nullptr);
+        Error error;
+        const AVStream *out = addStreamCopy(m_output.get(), in, &error);
         if (!out)
-            return stageError(kMediaErrorUnknown, QStringLiteral("out of memory"));
-        int rc = avcodec_parameters_copy(out->codecpar, in->codecpar);
-        if (rc < 0)
-            return stageError(kMediaErrorWriteFailed, QStringLiteral("stream parameters"), rc);
-        out->codecpar->codec_tag = 0;
-        out->time_base = in->time_base;
-        out->avg_frame_rate = in->avg_frame_rate;
-        out->r_frame_rate = in->r_frame_rate;
-        out->sample_aspect_ratio = in->sample_aspect_ratio;
-        out->disposition = in->disposition;
-        av_dict_copy(&out->metadata, in->metadata, 0);
-        for (int i = 0; i < in->nb_side_data; ++i) {
-            const AVPacketSideData &side = in->side_data[i];
-            if (uint8_t *copy = av_stream_new_side_data(out, side.type, side.size))
-                std::memcpy(copy, side.data, side.size);
-        }
+            return error;
         route.route = Route::Copy;
         route.outputIndex = out->index;
         return std::nullopt;
@@ -162,10 +150,11 @@ private:
                     const QList<int> &mixed = *m_job.mixStreamIndices;
                     if (!mixed.contains(int(i)))
                         continue; // not in the mix: dropped
-                    // One AAC track mixes into itself unchanged: with nothing to cut, its packets
-                    // are copied (a save or an upload copy of a one-track movie is a remux).
-                    if (mixed.size() == 1 && !m_job.cut && in->codecpar->codec_id == AV_CODEC_ID_AAC) {
-                        if (StageResult r = addCopy(in, route))
+                    // One AAC track mixes into itself unchanged: its packets are copied (a save or
+                    // an upload copy of a one-track movie is a remux), and a cut cuts it as it
+                    // cuts a track without a mix.
+                    if (mixed.size() == 1 && in->codecpar->codec_id == AV_CODEC_ID_AAC) {
+                        if (StageResult r = m_job.cut ? addCutAudio(in, *audioCut, route) : addCopy(in, route))
                             return r;
                         continue;
                     }
@@ -188,13 +177,8 @@ private:
                     route.route = Route::Audio;
                     route.audio = m_mixer;
                 } else if (m_job.cut) {
-                    Error error;
-                    auto stage = ExportAudioEncoder::create({{in}, false, audioCut}, m_output.get(), writer(), &error);
-                    if (!stage)
-                        return error;
-                    route.route = Route::Audio;
-                    route.audio = stage.get();
-                    m_audio.push_back(std::move(stage));
+                    if (StageResult r = addCutAudio(in, *audioCut, route))
+                        return r;
                 } else if (StageResult r = addCopy(in, route)) {
                     return r;
                 }
@@ -229,6 +213,27 @@ private:
         if (!m_splicer)
             return error;
         route.route = Route::Splice;
+        return std::nullopt;
+    }
+
+    // A cut audio track: AAC packets are copied between the cuts when they can be, anything else
+    // is re-encoded.
+    StageResult addCutAudio(const AVStream *in, const ExportAudioEncoder::Cut &cut, StreamRoute &route)
+    {
+        Error error;
+        std::unique_ptr<ExportAudioStage> stage;
+        const ExportAudioCopier::Options copy{in, cut.startMicros, cut.endMicros};
+        if (const std::optional<QString> why = ExportAudioCopier::whyNotCopyable(copy)) {
+            zaf::log::info(lcExport(), QStringLiteral("audio stream %1 is re-encoded: %2").arg(in->index).arg(*why));
+            stage = ExportAudioEncoder::create({{in}, false, cut}, m_output.get(), writer(), &error);
+        } else {
+            stage = ExportAudioCopier::create(copy, m_output.get(), writer(), &error);
+        }
+        if (!stage)
+            return error;
+        route.route = Route::Audio;
+        route.audio = stage.get();
+        m_audio.push_back(std::move(stage));
         return std::nullopt;
     }
 
@@ -403,7 +408,7 @@ private:
     const bool m_smartCut;
     std::vector<std::unique_ptr<ExportVideoEncoder>> m_video;
     std::unique_ptr<ExportVideoSplicer> m_splicer;
-    std::vector<std::unique_ptr<ExportAudioEncoder>> m_audio;
+    std::vector<std::unique_ptr<ExportAudioStage>> m_audio;
     ExportAudioEncoder *m_mixer = nullptr;
 };
 
