@@ -14,6 +14,8 @@
 #include <QFile>
 #include <QFileInfo>
 #include <QHash>
+#include <QJsonArray>
+#include <QJsonDocument>
 #include <QSet>
 #include <QThread>
 
@@ -22,6 +24,7 @@
 #include <atomic>
 #include <cmath>
 #include <condition_variable>
+#include <cstring>
 #include <mutex>
 #include <thread>
 
@@ -368,6 +371,95 @@ TEST_F(ExportTest, TrimKeepsEachAudioTracksClickWithinAMillisecond)
         });
         for (int k = 0; k < 2; ++k)
             EXPECT_NEAR(loudestMoment(output, k), clicks[k] - start, 0.001) << "track " << k;
+    }
+}
+
+// One packet of a stream as ffprobe shows it.
+struct ProbedPacket {
+    qint64 pts = 0, duration = 0; // in the stream's time base (samples for MPEG-4 audio)
+    QString hash;                 // MD5 of its data
+};
+
+QList<ProbedPacket> audioPackets(const QString &path, int audioIndex)
+{
+    const ToolRun r = runTool(QStringLiteral("ffprobe"), words("-v error -show_data_hash MD5 -show_entries packet=pts,duration,data_hash -of json -select_streams")
+                                                               << QStringLiteral("a:%1").arg(audioIndex) << path);
+    EXPECT_TRUE(r.ok()) << r.err.toStdString();
+    QList<ProbedPacket> packets;
+    for (const QJsonValue &v : QJsonDocument::fromJson(r.out).object().value(QLatin1String("packets")).toArray()) {
+        const QJsonObject p = v.toObject();
+        packets.append({p.value(QLatin1String("pts")).toInteger(), p.value(QLatin1String("duration")).toInteger(),
+                        p.value(QLatin1String("data_hash")).toString()});
+    }
+    return packets;
+}
+
+// The samples of an audio stream mixed to mono, as FFmpeg plays them (from where the edit list starts).
+QList<float> decodedSamples(const QString &path, int audioIndex)
+{
+    const ToolRun r = runTool(QStringLiteral("ffmpeg"), QStringList{QStringLiteral("-nostdin"), QStringLiteral("-v"), QStringLiteral("error"),
+                                                                   QStringLiteral("-i"), path, QStringLiteral("-map"), QStringLiteral("0:a:%1").arg(audioIndex)}
+                                                           << words("-ac 1 -c:a pcm_f32le -f f32le -"));
+    EXPECT_TRUE(r.ok()) << r.err.toStdString();
+    QList<float> samples(r.out.size() / qsizetype(sizeof(float)));
+    std::memcpy(samples.data(), r.out.constData(), samples.size() * sizeof(float));
+    return samples;
+}
+
+// A trim copies the AAC packets from the one before the start (the decoder's pre-roll) to the one
+// holding the last sample before the end, bit for bit; the edit list starts playback on the sample at
+// the start and ends the track at the end. An MP3 track beside it is re-encoded and stays in sync.
+TEST_F(ExportTest, TrimCopiesAacPacketsAndStartsOnTheSampleAtTheCut)
+{
+    constexpr int kRate = 48000;
+    // Noise tells every sample offset apart. Noise substitution stays off: its noise is drawn anew
+    // by each decoder, so a copy would not decode to the source's samples even when exact.
+    const QString source = scratch.file(QStringLiteral("noise.mp4"));
+    ASSERT_TRUE(ffmpeg(QStringList{QStringLiteral("-i"), sharedFixtureMovie({.seconds = 4, .audioTracks = 0})}
+                       << words("-f lavfi -i anoisesrc=d=4:c=pink:r=48000:a=0.3 -f lavfi -i aevalsrc=if(between(t\\,2\\,2.0005)\\,0.9\\,0):s=48000:d=4"
+                                " -map 0:v -map 1 -map 2 -c:v copy -c:a:0 aac -b:a:0 192k -aac_pns 0 -c:a:1 libmp3lame")
+                       << source));
+    const QList<ProbedPacket> sourcePackets = audioPackets(source, 0);
+    const QList<float> sourceSamples = decodedSamples(source, 0);
+    const double click = loudestMoment(source, 1);
+    ASSERT_NEAR(click, 2.0, 0.005);
+    // From the start (its priming packet is the pre-roll), inside frames, an end inside a frame, and
+    // an end past the movie's.
+    for (const auto &[start, end] : {std::pair{0.0, 2.5}, {1.31, 2.5}, {1.31, 2.0105}, {3.9, 30.0}}) {
+        SCOPED_TRACE(QStringLiteral("%1 to %2").arg(start).arg(end).toStdString());
+        const QString output = exported(source, QStringLiteral("noise-%1-%2.mp4").arg(start).arg(end), [&](ExportSession &s) {
+            s.setTimeRange(MediaTimeRange::fromStartEnd(MediaTime::fromSeconds(start, kRate), MediaTime::fromSeconds(end, kRate)));
+        });
+        const qint64 first = std::llround(start * kRate), last = std::llround(std::min(end, 4.0) * kRate);
+        QStringList expected, copied;
+        for (qsizetype i = 0; i < sourcePackets.size(); ++i) {
+            const ProbedPacket &p = sourcePackets[i], &next = sourcePackets.value(i + 1);
+            const bool preRoll = i + 1 < sourcePackets.size() && next.pts <= first && next.pts + next.duration > first;
+            if (preRoll || (p.pts + p.duration > first && p.pts < last))
+                expected << p.hash;
+        }
+        for (const ProbedPacket &p : audioPackets(output, 0))
+            copied << p.hash;
+        EXPECT_EQ(copied, expected);
+
+        const QList<QJsonObject> audio = probeStreams(output, "audio");
+        ASSERT_EQ(audio.size(), 2);
+        EXPECT_NEAR(seconds(audio[0], "duration"), double(last - first) / kRate, 1e-3);
+        EXPECT_EQ(audio[1]["codec_name"].toString(), "aac") << "the MP3 track is re-encoded";
+        // The first sample played is the one at the start; FFmpeg plays the last packet whole.
+        const QList<float> samples = decodedSamples(output, 0);
+        ASSERT_GE(samples.size(), last - first);
+        EXPECT_LT(samples.size(), last - first + 1024);
+        float worst = 0;
+        for (qsizetype i = 0; i < std::min<qsizetype>(4800, last - first); ++i)
+            worst = std::max(worst, std::abs(samples[i] - sourceSamples.value(first + i)));
+        EXPECT_LT(worst, 1e-4f);
+        if (start < click && click < end) {
+            EXPECT_NEAR(loudestMoment(output, 1), click - start, 0.001);
+        }
+        if (secondDecoderAvailable()) {
+            EXPECT_EQ(decodeVideoFramesWithSecondDecoder(output), countVideoFrames(output)) << "GStreamer reads the file too";
+        }
     }
 }
 
