@@ -149,8 +149,10 @@ TEST_F(EditorTest, DestroyingTheEditorDuringItsTrimExportStopsItAndLeavesTheDire
 // editor shows the newer trim.
 TEST_F(EditorTest, CompletionOfAnOlderTrimExportIsIgnoredOnceANewerOneBegan)
 {
-    auto e = ready(movie(10));
-    selectRange(*e, 0, 10);
+    // One group of pictures for the whole movie: a trim that starts after its keyframe re-encodes
+    // every kept picture, so the older export is still running when the newer one begins.
+    auto e = ready(makeFixtureMovie(scratch.path(), {.seconds = 10, .gop = 300}));
+    selectRange(*e, 0.5, 10);
     // The two exports must not share a name (the older would fail): the older takes a counter.
     const QString plainName = e->trimFileURL().toLocalFile();
     QFile placeholder(plainName);
