@@ -107,9 +107,15 @@ StageResult ExportAudioEncoder::Private::buildGraph(const Options &options)
 
         QString chain = QStringLiteral("[in%1]").arg(i);
         if (options.cut) {
+            // atrim counts in samples whatever the stream's time base (a Matroska stream counts
+            // milliseconds); asetpts works in the time base.
+            const AVRational samples{1, dec->sample_rate};
             const std::int64_t start = av_rescale_q(options.cut->startMicros, AV_TIME_BASE_Q, tb);
             input.endPts = av_rescale_q(options.cut->endMicros, AV_TIME_BASE_Q, tb);
-            chain += QStringLiteral("atrim=start_pts=%1:end_pts=%2,asetpts=PTS-%1,").arg(start).arg(input.endPts);
+            chain += QStringLiteral("atrim=start_pts=%1:end_pts=%2,asetpts=PTS-%3,")
+                         .arg(av_rescale_q(options.cut->startMicros, AV_TIME_BASE_Q, samples))
+                         .arg(av_rescale_q(options.cut->endMicros, AV_TIME_BASE_Q, samples))
+                         .arg(start);
         }
         chain += QStringLiteral("aresample=%1,aformat=sample_fmts=fltp:channel_layouts=stereo[a%2];")
                      .arg(kOutputSampleRate).arg(i);

@@ -13,7 +13,6 @@
 #include <QFile>
 
 #include <algorithm>
-#include <cstring>
 #include <vector>
 
 namespace zaf::media::exportpipe {
