@@ -19,8 +19,9 @@ namespace zaf::media::exportpipe {
 
 namespace {
 
-// Audio before the cut is decoded from a little ahead of it, so the first kept samples do not come
-// from a decoder that has just started (no overlap from the previous frame).
+// Audio before the cut is read from a little ahead of it, so the first kept samples do not come
+// from a decoder that has just started (no overlap from the previous frame): at least this long, and
+// at least two frames of every audio stream (an AAC frame lasts 128 ms at 8 kHz).
 constexpr std::int64_t kAudioPreRollMicros = 50000;
 // Read errors that the demuxer asks to retry are retried this many times in a row at most.
 constexpr int kMaxConsecutiveRetries = 1000;
@@ -259,7 +260,13 @@ private:
     {
         if (!m_job.cut || m_job.cut->startMicros <= 0)
             return std::nullopt;
-        const std::int64_t target = std::max<std::int64_t>(0, m_job.cut->startMicros - kAudioPreRollMicros) + startOffset();
+        std::int64_t preRoll = kAudioPreRollMicros;
+        for (unsigned i = 0; i < m_input->nb_streams; ++i) {
+            const AVCodecParameters *par = m_input->streams[i]->codecpar;
+            if (par->codec_type == AVMEDIA_TYPE_AUDIO && par->sample_rate > 0 && par->frame_size > 0)
+                preRoll = std::max(preRoll, av_rescale(2 * par->frame_size, AV_TIME_BASE, par->sample_rate));
+        }
+        const std::int64_t target = std::max<std::int64_t>(0, m_job.cut->startMicros - preRoll) + startOffset();
         // The latest keyframe at or before the target, for every stream.
         const int rc = avformat_seek_file(m_input.get(), -1, INT64_MIN, target, target, 0);
         if (rc < 0) {
