@@ -647,8 +647,9 @@ TEST_F(ExportFailureTest, ExportOfMissingEmptyTruncatedOrNonMovieInputFails)
 // while the completion is held up (as the editor's is by its hop to the main thread).
 TEST_F(ExportFailureTest, CancelledExportStopsWritingWithinTheWaitAndLeavesNoOutput)
 {
-    auto session = makeSession(sharedFixtureMovie({.seconds = 20, .width = 640, .height = 480, .audioTracks = 2}), output);
-    session->setTimeRange(MediaTimeRange{MediaTime::zero(), MediaTime::make(20, 1)});
+    // One group of pictures cut inside: every picture is re-encoded, so the export runs a while.
+    auto session = makeSession(sharedFixtureMovie({.seconds = 20, .width = 640, .height = 480, .audioTracks = 2, .gop = 600}), output);
+    session->setTimeRange(MediaTimeRange{MediaTime::make(1, 2), MediaTime::make(20, 1)});
     EXPECT_TRUE(session->waitUntilFinished(std::chrono::milliseconds(0))) << "a session not started writes nothing";
     ExportWaiter waiter;
     std::mutex gate;
