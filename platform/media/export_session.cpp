@@ -38,7 +38,7 @@ struct ExportSession::Private {
 
     // Whether an export is queued or writing; waitUntilFinished() waits for it to turn false.
     mutable std::mutex runningMutex;
-    mutable std::condition_variable stoppedRunning;
+    mutable std::condition_variable_any stoppedRunning; // _any: its timed wait is visible to ThreadSanitizer
     bool running = false;
 
     void setRunning(bool value)

@@ -42,7 +42,7 @@ int runExport(const std::shared_ptr<zaf::media::ExportSession> &session, const c
 {
     using zaf::media::ExportStatus;
     std::mutex mutex;
-    std::condition_variable done;
+    std::condition_variable_any done;
     bool finished = false;
 
     g_interrupted = false;

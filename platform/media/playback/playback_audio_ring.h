@@ -34,7 +34,7 @@ public:
 private:
     QByteArray m_buffer;
     mutable std::mutex m_mutex;
-    std::condition_variable m_room;
+    std::condition_variable_any m_room; // _any: its timed wait is visible to ThreadSanitizer
     qsizetype m_head = 0; // read position
     qsizetype m_size = 0; // bytes held
     bool m_ended = false;

@@ -41,7 +41,7 @@ public:
 private:
     const std::size_t m_capacity;
     mutable std::mutex m_mutex;
-    std::condition_variable m_room;
+    std::condition_variable_any m_room; // _any: its timed wait is visible to ThreadSanitizer
     std::deque<VideoFrame> m_frames;
 };
 

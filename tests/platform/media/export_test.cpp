@@ -87,7 +87,7 @@ public:
 
 private:
     std::mutex m_mutex;
-    std::condition_variable m_done;
+    std::condition_variable_any m_done;
     ExportOutcome m_outcome;
 };
 

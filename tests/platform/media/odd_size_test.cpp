@@ -57,7 +57,7 @@ protected:
         session->setOutputFileType(QString::fromLatin1(kFileTypeMPEG4));
         configure(*session);
         std::mutex mutex;
-        std::condition_variable done;
+        std::condition_variable_any done;
         bool finished = false;
         session->exportAsynchronously([&] {
             std::lock_guard lock(mutex);

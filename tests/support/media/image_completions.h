@@ -31,7 +31,7 @@ public:
 
 private:
     mutable std::mutex m_mutex;
-    std::condition_variable m_arrived;
+    std::condition_variable_any m_arrived;
     QList<ImageCompletion> m_completions;
 };
 
