@@ -18,7 +18,10 @@
 #include <cmath>
 #include <cstring>
 #include <map>
+#include <functional>
 #include <tuple>
+
+#include <unistd.h>
 
 namespace zaf::test {
 
@@ -110,39 +113,82 @@ QString makeFixtureMovie(const QString &dir, const zaf::fixture::FixtureSpec &sh
     return path;
 }
 
+namespace {
+
+// Generated fixtures are kept between test processes (ctest runs every case in a process of its
+// own) and between the builds of one source tree (the sanitizer builds reuse the normal build's),
+// in a directory named after the digest of the generator's sources, so a changed generator never
+// serves a stale movie. Files are made under a temporary name and renamed into place: a test
+// process never sees half a movie, and of two made at once either serves.
+QString fixtureCacheDirectory()
+{
+    static const QString dir = [] {
+        const QString path = QDir::temp().filePath(QStringLiteral("zaf-fixtures-%1-%2").arg(getuid()).arg(QStringLiteral(ZAF_FIXTURE_GENERATOR_DIGEST)));
+        if (!QDir().mkpath(path))
+            ADD_FAILURE() << "cannot make the fixture cache " << qPrintable(path);
+        return path;
+    }();
+    return dir;
+}
+
+// The cached fixture `name` (`stem.ext`), made by `make` into the path it is given when missing.
+// Cached files are read-only: a test that would change a shared movie fails instead of spoiling it.
+QString cachedFixture(const QString &name, const std::function<bool(const QString &path)> &make)
+{
+    const QString path = QDir(fixtureCacheDirectory()).filePath(name);
+    if (QFileInfo::exists(path))
+        return path;
+    const QFileInfo info(path);
+    const QString partial = info.dir().filePath(QStringLiteral("%1.partial-%2.%3").arg(info.completeBaseName())
+                                                    .arg(QCoreApplication::applicationPid()).arg(info.suffix()));
+    QFile::remove(partial);
+    if (!make(partial)) {
+        QFile::remove(partial);
+        return {};
+    }
+    QFile::setPermissions(partial, QFileDevice::ReadOwner | QFileDevice::ReadGroup | QFileDevice::ReadOther);
+    if (::rename(QFile::encodeName(partial).constData(), QFile::encodeName(path).constData()) != 0) {
+        ADD_FAILURE() << "cannot move " << qPrintable(partial) << " into the fixture cache: " << std::strerror(errno);
+        QFile::remove(partial);
+        return {};
+    }
+    return path;
+}
+
+} // namespace
+
 QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape)
 {
-    static QTemporaryDir dir;
-    static std::map<std::tuple<double, int, int, int, int, int, int, int>, QString> made;
-    const auto key = std::tuple(shape.seconds, shape.width, shape.height, shape.fps, shape.audioTracks, shape.channels,
-                                shape.rotation, shape.gop);
-    const auto found = made.find(key);
-    return found != made.end() ? found->second : made[key] = makeFixtureMovie(dir.path(), shape);
+    const QString name = QStringLiteral("fixture-%1s-%2x%3-%4fps-a%5x%6-r%7-g%8.mp4")
+                             .arg(shape.seconds).arg(shape.width).arg(shape.height).arg(shape.fps)
+                             .arg(shape.audioTracks).arg(shape.channels).arg(shape.rotation).arg(shape.gop);
+    return cachedFixture(name, [&](const QString &path) {
+        if (OptionalError error = zaf::fixture::writeFixtureMovie(path, shape)) {
+            ADD_FAILURE() << "cannot write fixture movie " << qPrintable(path) << ": " << qPrintable(error->description());
+            return false;
+        }
+        return true;
+    });
 }
 
 QString sharedFlatColourMovie(QSize size, const QString &codec)
 {
-    static QTemporaryDir dir;
-    static std::map<std::tuple<int, int, QString>, QString> made;
-    const auto key = std::tuple(size.width(), size.height(), codec);
-    if (const auto found = made.find(key); found != made.end())
-        return found->second;
-    const QString path = dir.filePath(QStringLiteral("flat-%1x%2-%3.mp4").arg(size.width()).arg(size.height()).arg(codec));
-    const bool even = size.width() % 2 == 0 && size.height() % 2 == 0;
-    const QString format = codec == QLatin1String("libx264rgb") ? QStringLiteral("gbrp") : even ? QStringLiteral("yuv420p") : QStringLiteral("yuv444p");
-    // The colour source only makes even sizes: crop a larger picture down to the size asked for.
-    const QString video = QStringLiteral("color=c=0x%1:size=%2x%3:rate=30,crop=%4:%5:0:0,format=%6")
-                              .arg(kFlatColour & 0xffffff, 6, 16, QLatin1Char('0'))
-                              .arg(size.width() + 2 - size.width() % 2)
-                              .arg(size.height() + 2 - size.height() % 2)
-                              .arg(size.width())
-                              .arg(size.height())
-                              .arg(format);
-    if (!ffmpeg(QStringList{QStringLiteral("-f"), QStringLiteral("lavfi"), QStringLiteral("-i"), video}
-                + words("-f lavfi -i sine=frequency=440:sample_rate=48000 -t 1 -map 0:v -map 1:a -c:a aac -c:v")
-                << codec << path))
-        return {};
-    return made[key] = path;
+    const QString name = QStringLiteral("flat-%1x%2-%3.mp4").arg(size.width()).arg(size.height()).arg(codec);
+    return cachedFixture(name, [&](const QString &path) {
+        const bool even = size.width() % 2 == 0 && size.height() % 2 == 0;
+        const QString format = codec == QLatin1String("libx264rgb") ? QStringLiteral("gbrp") : even ? QStringLiteral("yuv420p") : QStringLiteral("yuv444p");
+        // The colour source only makes even sizes: crop a larger picture down to the size asked for.
+        const QString video = QStringLiteral("color=c=0x%1:size=%2x%3:rate=30,crop=%4:%5:0:0,format=%6")
+                                  .arg(kFlatColour & 0xffffff, 6, 16, QLatin1Char('0'))
+                                  .arg(size.width() + 2 - size.width() % 2)
+                                  .arg(size.height() + 2 - size.height() % 2)
+                                  .arg(size.width())
+                                  .arg(size.height())
+                                  .arg(format);
+        return ffmpeg(QStringList{QStringLiteral("-f"), QStringLiteral("lavfi"), QStringLiteral("-i"), video}
+                      + words("-f lavfi -i sine=frequency=440:sample_rate=48000 -t 1 -map 0:v -map 1:a -c:a aac -c:v")
+                      << codec << path);
+    });
 }
 
 int largestColourDistance(const QImage &image, QRgb colour)
