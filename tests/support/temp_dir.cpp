@@ -1,5 +1,6 @@
 #include "tests/support/temp_dir.h"
 
+#include <QCryptographicHash>
 #include <QFile>
 
 #include <fcntl.h>
@@ -16,6 +17,15 @@ QString ScratchDir::write(const QString &name, qint64 bytes) const
     if (f.open(QIODevice::WriteOnly))
         f.write(QByteArray(int(bytes), 'z'));
     return path;
+}
+
+QByteArray fileDigest(const QString &path)
+{
+    QFile f(path);
+    QCryptographicHash hash(QCryptographicHash::Sha256);
+    if (!f.open(QIODevice::ReadOnly) || !hash.addData(&f))
+        return {};
+    return hash.result();
 }
 
 bool setModificationTime(const QString &path, qint64 secondsSinceEpoch)

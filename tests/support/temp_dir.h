@@ -21,6 +21,10 @@ private:
     QTemporaryDir m_dir;
 };
 
+// SHA-256 of a file's bytes, to tell that a user's movie came through a fault untouched; empty
+// when the file cannot be read.
+QByteArray fileDigest(const QString &path);
+
 // Sets a file's modification time to `secondsSinceEpoch` exactly (nanoseconds 0).
 bool setModificationTime(const QString &path, qint64 secondsSinceEpoch);
 
