@@ -118,8 +118,13 @@ OptionalError PhotoLibrary::createVideo(const QUrl &source)
             log::notice(lcPhotos(), QStringLiteral("saved %1").arg(target));
             return std::nullopt;
         }
+        if (e->code == ENOSPC || e->code == EDQUOT)
+            return libraryError(kPhotoLibraryErrorNotEnoughSpace, e->message);
+        // A read-only or forbidden library fails every name alike: the library cannot be written.
+        if (e->code == EROFS || e->code == EACCES || e->code == EPERM)
+            return libraryError(kPhotoLibraryErrorLibraryUnavailable, e->message);
         if (e->code != EEXIST)
-            return libraryError(e->code == ENOSPC ? kPhotoLibraryErrorNotEnoughSpace : kPhotoLibraryErrorWriteFailed, e->message);
+            return libraryError(kPhotoLibraryErrorWriteFailed, e->message);
     }
     return libraryError(kPhotoLibraryErrorWriteFailed, QStringLiteral("no free name in %1").arg(m_directory));
 }
