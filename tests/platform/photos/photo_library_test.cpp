@@ -1,6 +1,8 @@
 // The video library: playable movies only, room checked, unique names, never a partial file.
 #include "platform/photos/photo_library.h"
+#include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/private_mounts.h"
 #include "tests/support/temp_dir.h"
 
 #include <QCoreApplication>
@@ -79,6 +81,51 @@ TEST(PhotoLibrary, RefusesNonMoviesFullVolumesAndUnusableLibrariesWithoutWriting
     // A library that cannot be made: a file stands where its parent should be.
     expectRefused(PhotoLibrary(scratch.write("blocker", 1) + "/Videos"), movie, kPhotoLibraryErrorLibraryUnavailable);
 }
+
+// The library on a file system of its own that fails the copy: one that fills up part-way through
+// (its volume claims room enough, so the copy starts) and a read-only one. The save fails with a
+// logged error and the right code, the library holds nothing, not even a partial file, and the
+// source is as it was.
+struct OwnVolumeCase {
+    const char *name;
+    bool readOnly;
+    int code;
+};
+void PrintTo(const OwnVolumeCase &c, std::ostream *os) { *os << c.name; }
+
+class PhotoLibraryOnItsOwnVolume : public ::testing::TestWithParam<OwnVolumeCase> {};
+
+TEST_P(PhotoLibraryOnItsOwnVolume, FailsWithALoggedErrorLeavingNothingAndKeepingTheSource)
+{
+    if (!test::insidePrivateMounts())
+        return test::runThisTestInPrivateMounts();
+    test::ScratchDir scratch;
+    const QString movie = test::makeFixtureMovie(scratch.path(), {});
+    const qint64 size = QFileInfo(movie).size();
+    ASSERT_GT(size, 16 * 1024);
+    const QByteArray before = test::fileDigest(movie);
+    const QString directory = scratch.file("Videos");
+    ASSERT_TRUE(QDir().mkpath(directory));
+    const test::ScopedTmpfs volume(directory, GetParam().readOnly ? 64 * 1024 * 1024 : size / 2 / 4096 * 4096, GetParam().readOnly);
+    if (!volume.mounted())
+        return;
+    SmallVolume roomy;
+    roomy.freeSize = 1ull << 40;
+    test::LogCapture logs;
+    PhotoLibrary library(directory, roomy);
+    const Outcome outcome = save(library, movie);
+    EXPECT_FALSE(outcome.success);
+    EXPECT_EQ(outcome.error.value_or(Error{}).code, GetParam().code) << outcome.error.value_or(Error{}).message.toStdString();
+    EXPECT_TRUE(entries(directory).isEmpty()) << entries(directory).join(", ").toStdString();
+    EXPECT_EQ(test::fileDigest(movie), before);
+    const QString logged = logs.messages("zaf.photos").join('\n');
+    EXPECT_TRUE(logged.contains("cannot add the video to " + directory)) << logged.toStdString();
+}
+
+INSTANTIATE_TEST_SUITE_P(Faults, PhotoLibraryOnItsOwnVolume,
+                         ::testing::Values(OwnVolumeCase{"FillsUpMidCopy", false, kPhotoLibraryErrorNotEnoughSpace},
+                                           OwnVolumeCase{"ReadOnly", true, kPhotoLibraryErrorLibraryUnavailable}),
+                         [](const auto &info) { return std::string(info.param.name); });
 
 } // namespace
 } // namespace zaf::photos
