@@ -1,8 +1,11 @@
 // Save and done: the mixed movie reaches the video library, the report holds the save (after any
 // completed share), and no file is lost when the library fails.
 #include "tests/editor/editor_test_support.h"
+#include "tests/support/private_mounts.h"
 
 #include <QDir>
+
+#include <optional>
 
 namespace zaf::test {
 namespace {
@@ -81,20 +84,54 @@ TEST_F(EditorSaveTest, WithTheShareSheetUpSaveAndDoneDoNothing)
     EXPECT_TRUE(e->activityTypes().isEmpty());
 }
 
-TEST_F(EditorSaveTest, UnavailableLibraryStillFinishesAndKeepsTheMovie)
+// Saves that meet a fault: a library that cannot be made (a file where its parent folder should
+// be), a library on a read-only volume, a temporary directory that fills up while the mix writes.
+// The editor still finishes with the save reported and the error logged; the host's movie is kept
+// as it was, and the library holds nothing but whole movies: none after a failed library write,
+// the movie as recorded when there was no room to mix it.
+enum class SaveFault { LibraryParentIsAFile, ReadOnlyLibrary, TemporaryDirectoryFull };
+
+class EditorSaveFaultTest : public EditorSaveTest, public ::testing::WithParamInterface<SaveFault> {};
+
+TEST_P(EditorSaveFaultTest, StillFinishesLogsTheErrorAndLosesNothing)
 {
-    // A file where the library's parent folder should be.
-    libraryPath = scratch.write(QStringLiteral("not-a-directory"), 1) + QStringLiteral("/Videos");
-    qputenv("ZAF_VIDEO_LIBRARY", QFile::encodeName(libraryPath));
+    const SaveFault fault = GetParam();
+    if (fault != SaveFault::LibraryParentIsAFile && !insidePrivateMounts())
+        return runThisTestInPrivateMounts();
+    std::optional<ScopedTmpfs> volume;
+    if (fault == SaveFault::LibraryParentIsAFile) {
+        libraryPath = scratch.write(QStringLiteral("not-a-directory"), 1) + QStringLiteral("/Videos");
+        qputenv("ZAF_VIDEO_LIBRARY", QFile::encodeName(libraryPath));
+    } else if (fault == SaveFault::ReadOnlyLibrary) {
+        ASSERT_TRUE(QDir().mkpath(libraryPath));
+        volume.emplace(libraryPath, 64 * 1024 * 1024, true);
+    } else {
+        volume.emplace(ZafTempStore::defaultStore()._srTempPath(), 8192);
+    }
+    if (volume && !volume->mounted())
+        return;
     LogCapture logs;
     const QString source = movie(1, 320, 240, 0, 2);
+    const QByteArray recorded = fileDigest(source);
     auto e = open(source);
     e->saveAction();
     ASSERT_TRUE(waitForReport());
     EXPECT_EQ(delegate.reports.first(), QStringList{kSave});
-    EXPECT_TRUE(QFile::exists(source)) << "a failed library write removes nothing";
-    EXPECT_EQ(logs.count(QStringLiteral("Error writing video to camera roll: 4")), 1);
+    spin(300); // a removal of the source would have been started by now
+    EXPECT_EQ(fileDigest(source), recorded) << "the host's movie is kept as it was";
+    if (fault == SaveFault::TemporaryDirectoryFull) {
+        EXPECT_EQ(logs.count(QStringLiteral("Error Mixing video Audio tracks")), 1);
+        ASSERT_EQ(library().size(), 1);
+        EXPECT_EQ(fileDigest(QDir(libraryPath).filePath(library().first())), recorded) << "saved as recorded";
+    } else {
+        EXPECT_EQ(logs.count(QStringLiteral("Error writing video to camera roll: 4")), 1);
+        EXPECT_EQ(QDir(libraryPath).entryList(QDir::AllEntries | QDir::Hidden | QDir::NoDotAndDotDot), QStringList());
+    }
 }
+
+INSTANTIATE_TEST_SUITE_P(Faults, EditorSaveFaultTest,
+                         ::testing::Values(SaveFault::LibraryParentIsAFile, SaveFault::ReadOnlyLibrary,
+                                           SaveFault::TemporaryDirectoryFull));
 
 } // namespace
 } // namespace zaf::test
