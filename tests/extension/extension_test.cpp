@@ -170,20 +170,37 @@ TEST_F(ExtensionTest, CompletedActivitiesThenDoneAreReportedInOrder)
     EXPECT_EQ(reportedTypes(), (QStringList{"com.zafrel.activity.Mail", "ZafPublishToYouTube"}));
 }
 
-TEST_F(ExtensionTest, RemovalBeforeTheUserFinishedTearsDownWithoutReportAndEmptiesTheDirectory)
+// The host removes the view before the user finished, or the host dies (its end of the channel
+// closes): either way the extension tears down without a report, empties its temporary directory
+// and keeps the host's movie as it was.
+class ExtensionRemovalTest : public ExtensionTest, public ::testing::WithParamInterface<bool> {};
+
+TEST_P(ExtensionRemovalTest, TearsDownWithoutReportEmptiesTheDirectoryAndKeepsTheMovie)
 {
+    const bool hostDies = GetParam();
+    const QByteArray movieBefore = fileDigest(moviePath);
+    LogCapture logs;
     beginWith(requiredItems());
     ASSERT_NE(editor(), nullptr);
     QFile leftover(ZafTempStore::defaultStore()._srTempPath() + "Recorder_1.mp4");
     ASSERT_TRUE(leftover.open(QIODevice::WriteOnly));
     leftover.close();
 
-    removeView();
+    if (hostDies)
+        host.closeHost();
+    else
+        removeView();
     ASSERT_TRUE(waitUntil([&] { return finished; }, 5000));
     EXPECT_EQ(editor(), nullptr);
     EXPECT_TRUE(tempEntries().isEmpty());
-    EXPECT_FALSE(reportedTypes(300).has_value());
+    EXPECT_EQ(fileDigest(moviePath), movieBefore);
+    if (hostDies)
+        EXPECT_EQ(logs.count("channel closed: the host closed the connection"), 1);
+    else
+        EXPECT_FALSE(reportedTypes(300).has_value());
 }
+
+INSTANTIATE_TEST_SUITE_P(RemovedOrHostGone, ExtensionRemovalTest, ::testing::Bool());
 
 // The host's items made no editor: the window must still close. Closing it, or Escape, is Cancel:
 // one empty report, so that the host removes the view.
