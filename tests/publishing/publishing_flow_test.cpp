@@ -77,14 +77,17 @@ struct PreparedActivity {
     QList<bool> finishes;
     ui::ViewController *navigation = nullptr;
     QObject *form = nullptr;
+    QString movie;       // the editor's movie, which the action copies
+    QByteArray recorded; // its digest before the action
 
     PreparedActivity()
     {
         fixture::FixtureSpec spec;
         spec.seconds = 4;
         spec.audioTracks = 2;
-        const QString movie = makeFixtureMovie(scratch.path(), spec);
+        movie = makeFixtureMovie(scratch.path(), spec);
         EXPECT_FALSE(movie.isEmpty());
+        recorded = fileDigest(movie);
         QObject::connect(activity.get(), &ui::ShareActivity::activityFinished,
                          [this](bool completed) { finishes << completed; });
         activity->prepareWithActivityItems({QStringLiteral("Watch my run"), QStringLiteral("https://store.example/app"),
@@ -156,11 +159,20 @@ TEST(PublishingFlow, DefaultCategoryRoutinePicksTheRowOfCategory20)
 
 // Publish waits for the copy under the overlay, uploads it with category "20" and the form's
 // normalised fields, reports progress to the total, shows the success alert with its View and Close
-// buttons, removes the copy, and Close ends the action as completed.
-TEST(PublishingFlow, PublishingTheCopyEndsWithTheSuccessAlertAndRemovesTheCopy)
+// buttons, removes the copy, and Close ends the action as completed. A connection that drops twice
+// in the middle of the upload changes none of that: the upload resumes and the whole copy arrives.
+// The editor's movie is left as it was.
+class PublishingTheCopy : public ::testing::TestWithParam<bool> {};
+
+TEST_P(PublishingTheCopy, EndsWithTheSuccessAlertTheWholeCopyUploadedAndTheCopyRemoved)
 {
     UploadTestServer server(200, std::chrono::seconds(90));
     ASSERT_TRUE(server.listen());
+    const bool interruptedTwice = GetParam();
+    if (interruptedTwice) {
+        server.queueFault({UploadTestServer::FaultKind::DropBody, 1000});
+        server.queueFault({UploadTestServer::FaultKind::DropBody, 5000});
+    }
     ScopedUploadEnvironment environment(server.baseUrl());
 
     PreparedActivity prepared;
@@ -210,12 +222,18 @@ TEST(PublishingFlow, PublishingTheCopyEndsWithTheSuccessAlertAndRemovesTheCopy)
         EXPECT_TRUE(body.contains(field)) << body.toStdString();
 
     EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
+    EXPECT_EQ(fileDigest(prepared.movie), prepared.recorded);
+    if (interruptedTwice)
+        EXPECT_EQ(server.count(QStringLiteral("PUT"), true), 2) << "a status query after each drop";
     EXPECT_TRUE(prepared.finishes.isEmpty());
     QAbstractButton *close = buttonWithText(alert->buttons(), tableText("CLOSE"));
     ASSERT_NE(close, nullptr);
     close->click();
     EXPECT_EQ(prepared.finishes, QList<bool>{true});
 }
+
+INSTANTIATE_TEST_SUITE_P(Connection, PublishingTheCopy, ::testing::Values(false, true),
+                         [](const auto &info) { return info.param ? "DropsTwice" : "Steady"; });
 
 // A 400 from the service ends with the failure alert (Close only), removes the copy, and the action
 // ends as not completed.

@@ -3,6 +3,9 @@
 #include "tests/publishing/upload_test_support.h"
 #include "publishing/plugin/upload/upload_chunk_device.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/temp_dir.h"
+
+#include <QCryptographicHash>
 
 #include <gtest/gtest.h>
 
@@ -116,6 +119,8 @@ TEST(ResumableUpload, recoversFromEachServiceFault)
         const auto result = h.run();
         ASSERT_TRUE(result && result->ok()) << describe(result);
         EXPECT_EQ(h.server.videoBytes(result->videoId), h.movie);
+        EXPECT_EQ(zaf::test::fileDigest(h.path), QCryptographicHash::hash(h.movie, QCryptographicHash::Sha256))
+            << "the file uploaded is left as it was";
         EXPECT_EQ(h.delays, c.delays);
         EXPECT_EQ(dataStarts(h.server).mid(0, c.firstStarts.size()), c.firstStarts);
         EXPECT_EQ(h.server.count(QStringLiteral("PUT"), true), c.statusQueries);
