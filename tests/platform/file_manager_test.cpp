@@ -13,6 +13,9 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
+#include <string>
+#include <string_view>
+#include <algorithm>
 #include <fcntl.h>
 #include <functional>
 #include <sys/resource.h>
@@ -30,6 +33,8 @@ struct Faults {
     int renameat2 = 0;       // errno of renameat2()
     bool renameOnce = false; // only the first renameat2() fails
     int link = 0;            // errno of link()
+    long spaceLeft = -1;     // bytes that writes into a ".partial-" temporary may still add before
+                             // the disk is full (ENOSPC); -1: no limit
 };
 Faults faults;
 
@@ -58,6 +63,26 @@ extern "C" int renameat2(int fromDir, const char *from, int toDir, const char *t
         return fail(err);
     }
     return int(::syscall(SYS_renameat2, fromDir, from, toDir, to, flags));
+}
+
+// Whether a descriptor is open on an atomic write's temporary file.
+static bool writesATemporary(int fd)
+{
+    char target[4096];
+    const std::string link = "/proc/self/fd/" + std::to_string(fd);
+    const ssize_t n = ::readlink(link.c_str(), target, sizeof target - 1);
+    return n > 0 && std::string_view(target, size_t(n)).find(".partial-") != std::string_view::npos;
+}
+
+extern "C" ssize_t write(int fd, const void *buffer, size_t size)
+{
+    if (faults.spaceLeft >= 0 && writesATemporary(fd)) {
+        if (faults.spaceLeft == 0)
+            return fail(ENOSPC);
+        size = std::min(size, size_t(faults.spaceLeft));
+        faults.spaceLeft -= long(size);
+    }
+    return ::syscall(SYS_write, fd, buffer, size);
 }
 
 extern "C" int link(const char *from, const char *to) __THROW
@@ -200,7 +225,8 @@ TEST(AtomicFile, EndsWithTheWholeFileOrNothingAndNeverReplaces)
 }
 
 // Copies and moves across file systems go through the atomic write: a write that fails half-way
-// (the file size limit) or a failed flush leaves the destination absent and the source in place.
+// (the disk fills up, the file size limit) or a failed flush leaves the destination absent and the
+// source in place.
 TEST(FileManager, CopyAndMoveAcrossFileSystemsLeaveNothingWhenWritingFails)
 {
     test::ScratchDir scratch;
@@ -220,6 +246,11 @@ TEST(FileManager, CopyAndMoveAcrossFileSystemsLeaveNothingWhenWritingFails)
         EXPECT_EQ(fm.copyItemAtPath(source, to).value_or(Error{}).code, EIO);
     }
     EXPECT_EQ(moveAcross({.fileSync = EIO}).value_or(Error{}).code, EIO);
+    {
+        const FaultScope scope({.spaceLeft = 100000});
+        EXPECT_EQ(fm.copyItemAtPath(source, to).value_or(Error{}).code, ENOSPC);
+    }
+    EXPECT_EQ(moveAcross({.spaceLeft = 100000}).value_or(Error{}).code, ENOSPC);
     {
         // With SIGXFSZ ignored, a write past RLIMIT_FSIZE fails with EFBIG.
         const auto oldHandler = std::signal(SIGXFSZ, SIG_IGN);
