@@ -7,6 +7,7 @@
 #include "tests/support/media/decoded_pictures.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/media/second_decoder.h"
+#include "tests/support/private_mounts.h"
 #include "tests/support/temp_dir.h"
 
 #include <QCoreApplication>
@@ -555,9 +556,10 @@ protected:
         EXPECT_FALSE(QFile::exists(output));
         expectNoPartialFiles();
     }
-    void expectNoPartialFiles()
+    void expectNoPartialFiles() { expectNoPartialFilesIn(scratch.path()); }
+    static void expectNoPartialFilesIn(const QString &directory)
     {
-        for (const QString &name : QDir(scratch.path()).entryList(QDir::Files | QDir::Hidden))
+        for (const QString &name : QDir(directory).entryList(QDir::Files | QDir::Hidden))
             EXPECT_FALSE(name.contains(QStringLiteral("partial"))) << name.toStdString();
     }
     ScratchDir scratch;
@@ -674,6 +676,30 @@ TEST_F(ExportFailureTest, CancelledExportStopsWritingWithinTheWaitAndLeavesNoOut
     EXPECT_EQ(outcome.statusInCompletion, ExportStatus::Cancelled);
     ASSERT_TRUE(session->error().has_value());
     EXPECT_EQ(session->error()->code, kMediaErrorCancelled);
+
+    // The output's name is free again: the next export to it writes the whole movie.
+    EXPECT_EQ(runToEnd(makeSession(source, output)), ExportStatus::Completed);
+    EXPECT_EQ(QDir(scratch.path()).entryList(QDir::AllEntries | QDir::Hidden | QDir::NoDotAndDotDot), QStringList{"out.mp4"});
+}
+
+// A volume that fills up while the export writes: the export fails as disk full with a logged
+// error, leaves no output and no partial file, and the source stays as it was.
+TEST_F(ExportFailureTest, ExportOntoAVolumeThatFillsUpFailsAsDiskFullLeavingNothing)
+{
+    if (!insidePrivateMounts())
+        return runThisTestInPrivateMounts();
+    const QByteArray before = fileDigest(source);
+    const QString small = scratch.file(QStringLiteral("small"));
+    ASSERT_TRUE(QDir().mkpath(small));
+    ASSERT_GT(QFileInfo(source).size(), 2 * 16384);
+    const ScopedTmpfs volume(small, 16384);
+    if (!volume.mounted())
+        return;
+    output = QDir(small).filePath(QStringLiteral("out.mp4"));
+    expectFailure(makeSession(source, output), kMediaErrorDiskFull);
+    expectNoPartialFilesIn(small);
+    EXPECT_EQ(QDir(small).entryList(QDir::AllEntries | QDir::Hidden | QDir::NoDotAndDotDot), QStringList());
+    EXPECT_EQ(fileDigest(source), before);
 }
 
 // Cancelling before the start ends the export Cancelled; a session exports once, so starting it
