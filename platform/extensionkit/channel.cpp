@@ -17,8 +17,6 @@
 
 namespace zaf::extensionkit {
 
-Q_LOGGING_CATEGORY(lcExtensionKit, "zaf.extensionkit")
-
 namespace {
 
 // Reads per readiness notification: a peer that writes without pause cannot starve the event loop.

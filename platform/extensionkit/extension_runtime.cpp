@@ -28,46 +28,6 @@ namespace {
 constexpr const char *kBeginRequestMethod = "beginExtensionRequest";
 constexpr const char *kRemoveViewMethod = "removeExtensionView";
 
-// The items of a request. An item that is not an object, has a non-string title or a non-array
-// attachments list is skipped with a logged error; an attachment without a MIME type is kept (it
-// conforms to nothing, so readers pass it over).
-QList<InputItem> inputItemsFromJson(const QJsonArray &array)
-{
-    QList<InputItem> items;
-    for (qsizetype i = 0; i < array.size(); ++i) {
-        const QJsonValue entry = array.at(i);
-        if (!entry.isObject()) {
-            log::error(lcExtensionKit(), QStringLiteral("input item %1 is not an object; skipped").arg(i));
-            continue;
-        }
-        const QJsonObject object = entry.toObject();
-        const QJsonValue title = object.value(QLatin1String("title"));
-        if (!title.isString()) {
-            log::error(lcExtensionKit(), QStringLiteral("input item %1 has no string \"title\"; skipped").arg(i));
-            continue;
-        }
-        const QJsonValue attachments = object.value(QLatin1String("attachments"));
-        if (!attachments.isArray()) {
-            log::error(lcExtensionKit(), QStringLiteral("input item %1 (%2) has no \"attachments\" array; skipped").arg(i).arg(title.toString()));
-            continue;
-        }
-        QList<std::shared_ptr<ItemAttachment>> list;
-        const QJsonArray attachmentArray = attachments.toArray();
-        for (qsizetype j = 0; j < attachmentArray.size(); ++j) {
-            const QJsonObject attachment = attachmentArray.at(j).toObject();
-            const QJsonValue type = attachment.value(QLatin1String("type"));
-            const QString typeText = type.isString() ? type.toString() : QString();
-            if (!isMimeType(typeText)) {
-                log::info(lcExtensionKit(), QStringLiteral("attachment %1 of input item %2 (%3) has no MIME type; it conforms to nothing")
-                                              .arg(j).arg(i).arg(title.toString()));
-            }
-            list.append(std::make_shared<ItemAttachment>(typeText, attachment.value(QLatin1String("value"))));
-        }
-        items.append(InputItem(title.toString(), std::move(list)));
-    }
-    return items;
-}
-
 } // namespace
 
 struct ExtensionRuntime::Private {

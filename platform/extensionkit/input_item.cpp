@@ -2,6 +2,7 @@
 
 #include "platform/dispatch.h"
 #include "platform/extensionkit/extensionkit_log.h"
+#include "platform/log.h"
 
 #include <QJsonArray>
 #include <QJsonObject>
@@ -116,6 +117,43 @@ void ItemAttachment::loadItemForTypeIdentifier(const QString &type, const QVaria
 InputItem::InputItem(QString title, QList<std::shared_ptr<ItemAttachment>> attachments)
     : m_title(std::move(title)), m_attachments(std::move(attachments))
 {
+}
+
+QList<InputItem> inputItemsFromJson(const QJsonArray &array)
+{
+    QList<InputItem> items;
+    for (qsizetype i = 0; i < array.size(); ++i) {
+        const QJsonValue entry = array.at(i);
+        if (!entry.isObject()) {
+            log::error(lcExtensionKit(), QStringLiteral("input item %1 is not an object; skipped").arg(i));
+            continue;
+        }
+        const QJsonObject object = entry.toObject();
+        const QJsonValue title = object.value(QLatin1String("title"));
+        if (!title.isString()) {
+            log::error(lcExtensionKit(), QStringLiteral("input item %1 has no string \"title\"; skipped").arg(i));
+            continue;
+        }
+        const QJsonValue attachments = object.value(QLatin1String("attachments"));
+        if (!attachments.isArray()) {
+            log::error(lcExtensionKit(), QStringLiteral("input item %1 (%2) has no \"attachments\" array; skipped").arg(i).arg(title.toString()));
+            continue;
+        }
+        QList<std::shared_ptr<ItemAttachment>> list;
+        const QJsonArray attachmentArray = attachments.toArray();
+        for (qsizetype j = 0; j < attachmentArray.size(); ++j) {
+            const QJsonObject attachment = attachmentArray.at(j).toObject();
+            const QJsonValue type = attachment.value(QLatin1String("type"));
+            const QString typeText = type.isString() ? type.toString() : QString();
+            if (!isMimeType(typeText)) {
+                log::info(lcExtensionKit(), QStringLiteral("attachment %1 of input item %2 (%3) has no MIME type; it conforms to nothing")
+                                              .arg(j).arg(i).arg(title.toString()));
+            }
+            list.append(std::make_shared<ItemAttachment>(typeText, attachment.value(QLatin1String("value"))));
+        }
+        items.append(InputItem(title.toString(), std::move(list)));
+    }
+    return items;
 }
 
 } // namespace zaf::extensionkit

@@ -6,6 +6,7 @@
 #include "platform/error.h"
 
 #include <QColor>
+#include <QJsonArray>
 #include <QJsonValue>
 #include <QList>
 #include <QString>
@@ -74,6 +75,11 @@ private:
     QString m_title;
     QList<std::shared_ptr<ItemAttachment>> m_attachments;
 };
+
+// The items of a request's "inputItems" array, in order. An item that is not an object, has a
+// non-string title or a non-array attachments list is skipped with a logged error; an attachment
+// without a MIME type is kept (it conforms to nothing, so readers pass it over). Any thread.
+QList<InputItem> inputItemsFromJson(const QJsonArray &array);
 
 // "#RRGGBB" or "#RRGGBBAA" (hex digits of either case, alpha last) to a colour; anything else
 // gives an invalid QColor.
