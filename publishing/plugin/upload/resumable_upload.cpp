@@ -1,12 +1,11 @@
 #include "publishing/plugin/upload/resumable_upload.h"
 
 #include "platform/log.h"
+#include "publishing/plugin/upload/upload_answer.h"
 #include "publishing/plugin/upload/upload_chunk_device.h"
 
 #include <QDateTime>
 #include <QFileInfo>
-#include <QJsonDocument>
-#include <QJsonObject>
 #include <QLoggingCategory>
 #include <QMetaEnum>
 #include <QNetworkAccessManager>
@@ -26,55 +25,6 @@ using std::chrono::milliseconds;
 
 constexpr const char *kUploadContentType = "video/mp4";
 constexpr const char *kWatchUrlPrefix = "https://www.youtube.com/watch?v=";
-// A Retry-After larger than this is a server asking us to give up, not to wait.
-constexpr milliseconds kMaxRetryAfter{10 * 60 * 1000};
-// Server messages end up in logs and dialogs; keep them readable.
-constexpr int kMaxServerMessageLength = 500;
-
-int defaultPort(const QString &scheme)
-{
-    return scheme.compare(QLatin1String("https"), Qt::CaseInsensitive) == 0 ? 443 : 80;
-}
-
-bool isRetryableStatus(int status)
-{
-    return status == 500 || status == 502 || status == 503 || status == 504;
-}
-
-// The error message of a failed answer: the service's {"error":{"message"}} or the body's text.
-QString serverMessage(const QByteArray &body)
-{
-    const QJsonDocument document = QJsonDocument::fromJson(body);
-    if (document.isObject()) {
-        const QJsonValue error = document.object().value(QStringLiteral("error"));
-        if (error.isObject()) {
-            const QString message = error.toObject().value(QStringLiteral("message")).toString();
-            if (!message.isEmpty())
-                return message.left(kMaxServerMessageLength);
-        } else if (error.isString()) {
-            return error.toString().left(kMaxServerMessageLength);
-        }
-    }
-    return QString::fromUtf8(body).simplified().left(kMaxServerMessageLength);
-}
-
-// Retry-After as a delay: delta seconds or an HTTP date; nullopt when absent or unreadable.
-std::optional<milliseconds> retryAfter(QNetworkReply *reply)
-{
-    const QByteArray value = reply->rawHeader("Retry-After").trimmed();
-    if (value.isEmpty())
-        return std::nullopt;
-    bool ok = false;
-    const qint64 seconds = value.toLongLong(&ok);
-    if (ok && seconds >= 0)
-        return std::min(milliseconds(seconds * 1000), kMaxRetryAfter);
-    const QDateTime when = QDateTime::fromString(QString::fromLatin1(value), Qt::RFC2822Date);
-    if (when.isValid()) {
-        const qint64 delta = QDateTime::currentDateTimeUtc().msecsTo(when);
-        return std::clamp(milliseconds(delta), milliseconds(0), kMaxRetryAfter);
-    }
-    return std::nullopt;
-}
 
 } // namespace
 
@@ -152,14 +102,7 @@ void ResumableUpload::cancel()
 
 bool ResumableUpload::mayCarryToken(const QUrl &url) const
 {
-    if (!url.isValid() || !url.userName().isEmpty())
-        return false;
-    const auto sameOrigin = [&url](const QUrl &origin) {
-        return url.scheme().compare(origin.scheme(), Qt::CaseInsensitive) == 0
-            && url.host().compare(origin.host(), Qt::CaseInsensitive) == 0
-            && url.port(defaultPort(url.scheme())) == origin.port(defaultPort(origin.scheme()));
-    };
-    return sameOrigin(QUrl(QStringLiteral("https://") + QLatin1String(kServiceApiHost))) || sameOrigin(m_baseUrl);
+    return mayCarryAccessToken(url, m_baseUrl);
 }
 
 QNetworkRequest ResumableUpload::authorisedRequest(const QUrl &url) const
@@ -188,7 +131,7 @@ void ResumableUpload::initiate()
     request.setHeader(QNetworkRequest::ContentTypeHeader, QByteArrayLiteral("application/json; charset=UTF-8"));
     request.setRawHeader("X-Upload-Content-Length", QByteArray::number(m_total));
     request.setRawHeader("X-Upload-Content-Type", kUploadContentType);
-    send(Step::Initiate, m_network->post(request, m_body));
+    send(UploadStep::Initiate, m_network->post(request, m_body));
 }
 
 void ResumableUpload::sendChunk()
@@ -217,7 +160,7 @@ void ResumableUpload::sendChunk()
             return;
         Q_EMIT progress(base + qMin(sent, length), m_total);
     });
-    send(Step::SendChunk, reply);
+    send(UploadStep::SendChunk, reply);
 }
 
 void ResumableUpload::queryStatus()
@@ -225,10 +168,10 @@ void ResumableUpload::queryStatus()
     QNetworkRequest request = authorisedRequest(m_sessionUrl);
     request.setHeader(QNetworkRequest::ContentLengthHeader, 0);
     request.setRawHeader("Content-Range", "bytes */" + QByteArray::number(m_total));
-    send(Step::QueryStatus, m_network->put(request, QByteArray()));
+    send(UploadStep::QueryStatus, m_network->put(request, QByteArray()));
 }
 
-void ResumableUpload::send(Step step, QNetworkReply *reply)
+void ResumableUpload::send(UploadStep step, QNetworkReply *reply)
 {
     m_step = step;
     m_reply = reply;
@@ -246,70 +189,35 @@ void ResumableUpload::handleReply(QNetworkReply *reply)
     if (!statusAttribute.isValid()) {
         // No answer at all: the connection was lost, refused or timed out.
         const char *name = QMetaEnum::fromType<QNetworkReply::NetworkError>().valueToKey(reply->error());
-        retryLater(reply, 0, QStringLiteral("no answer (%1: %2)")
-                                 .arg(QString::fromLatin1(name ? name : "?"), reply->errorString()));
+        retryLater(0, QStringLiteral("no answer (%1: %2)").arg(QString::fromLatin1(name ? name : "?"), reply->errorString()),
+                   parseRetryAfter(reply->rawHeader("Retry-After"), QDateTime::currentDateTimeUtc()));
         return;
     }
-    const int status = statusAttribute.toInt();
-    if (m_step == Step::Initiate)
-        handleInitiation(reply, status);
-    else
-        handleUploadAnswer(reply, status);
+    UploadAnswer answer;
+    answer.status = statusAttribute.toInt();
+    answer.requestUrl = reply->url();
+    answer.location = reply->rawHeader("Location");
+    answer.range = reply->rawHeader("Range");
+    answer.retryAfter = reply->rawHeader("Retry-After");
+    answer.body = reply->readAll();
+    const UploadState state{m_step, m_offset, m_total, m_baseUrl};
+    apply(interpretUploadAnswer(answer, state, QDateTime::currentDateTimeUtc()));
 }
 
-void ResumableUpload::handleInitiation(QNetworkReply *reply, int status)
+void ResumableUpload::apply(const UploadDecision &decision)
 {
-    const QByteArray body = reply->readAll();
-    if (status == 200 || status == 201) {
-        const QUrl location = QUrl(QString::fromUtf8(reply->rawHeader("Location")));
-        if (!location.isValid() || location.isEmpty()) {
-            fail(UploadMalformedAnswerError, QStringLiteral("The upload was accepted without a session address"));
-            return;
-        }
-        const QUrl session = reply->url().resolved(location);
-        if (!mayCarryToken(session)) {
-            // The session address would get the access token: only the service (or the configured
-            // base) may have it.
-            fail(UploadUntrustedSessionError,
-                 QStringLiteral("The upload session address %1 is not on the service's host; nothing was sent there")
-                     .arg(session.toString(QUrl::RemoveUserInfo | QUrl::RemoveQuery).left(kMaxServerMessageLength)));
-            return;
-        }
-        m_sessionUrl = session;
+    using Action = UploadDecision::Action;
+    switch (decision.action) {
+    case Action::BeginSession:
+        m_sessionUrl = decision.sessionUrl;
         m_offset = 0;
         m_retries = 0;
         zaf::log::info(lcPublishing(), QStringLiteral("Upload session %1").arg(m_sessionUrl.toString()));
         sendChunk();
         return;
-    }
-    if (isRetryableStatus(status)) {
-        retryLater(reply, status, QStringLiteral("HTTP %1 %2").arg(status).arg(serverMessage(body)));
-        return;
-    }
-    fail(status, QStringLiteral("The upload was refused with HTTP %1: %2").arg(status).arg(serverMessage(body)));
-}
-
-void ResumableUpload::handleUploadAnswer(QNetworkReply *reply, int status)
-{
-    const QByteArray body = reply->readAll();
-    if (status == 200 || status == 201) {
-        succeed(body);
-        return;
-    }
-    if (status == 308) {
+    case Action::SendFrom: {
         const qint64 before = m_offset;
-        const QByteArray range = reply->rawHeader("Range").left(100);
-        if (!resumeFromRange(reply))
-            return;
-        if (m_step == Step::SendChunk && m_offset <= before) {
-            // The server took a chunk and kept none of it (no Range, or a Range that does not pass the
-            // chunk's start). Sending it again at once could go on for ever: this is a failed attempt,
-            // retried after a wait like a lost connection, within the same bound.
-            m_offset = before;
-            retryLater(reply, 0, QStringLiteral("HTTP 308 without progress (Range \"%1\" for a chunk at %2)")
-                                     .arg(QString::fromLatin1(range)).arg(before));
-            return;
-        }
+        m_offset = decision.offset;
         // Bytes that move us forward end a run of failures.
         if (m_offset > before)
             m_retries = 0;
@@ -317,45 +225,22 @@ void ResumableUpload::handleUploadAnswer(QNetworkReply *reply, int status)
         sendChunk();
         return;
     }
-    if (status == 404 || status == 410) {
-        restartSession(QStringLiteral("HTTP %1 %2").arg(status).arg(serverMessage(body)));
+    case Action::Succeed:
+        succeed(decision.videoId);
+        return;
+    case Action::Retry:
+        retryLater(decision.code, decision.message, decision.retryAfter);
+        return;
+    case Action::Restart:
+        restartSession(decision.message);
+        return;
+    case Action::Fail:
+        fail(decision.code, decision.message);
         return;
     }
-    if (isRetryableStatus(status)) {
-        retryLater(reply, status, QStringLiteral("HTTP %1 %2").arg(status).arg(serverMessage(body)));
-        return;
-    }
-    fail(status, QStringLiteral("The upload failed with HTTP %1: %2").arg(status).arg(serverMessage(body)));
 }
 
-bool ResumableUpload::resumeFromRange(QNetworkReply *reply)
-{
-    const QByteArray range = reply->rawHeader("Range").trimmed();
-    if (range.isEmpty()) {
-        m_offset = 0;
-        return true;
-    }
-    static const QRegularExpression pattern(QStringLiteral("^bytes=0-(\\d+)$"));
-    const QRegularExpressionMatch match = pattern.match(QString::fromLatin1(range));
-    bool ok = match.hasMatch();
-    const qint64 last = ok ? match.captured(1).toLongLong(&ok) : -1;
-    if (!ok || last + 1 > m_total) {
-        fail(UploadMalformedAnswerError,
-             QStringLiteral("The server answered with an unusable Range \"%1\" for %2 bytes")
-                 .arg(QString::fromLatin1(range.left(100)))
-                 .arg(m_total));
-        return false;
-    }
-    if (last + 1 == m_total) {
-        // Every byte arrived, yet the server neither created the video nor reported an error.
-        fail(UploadMalformedAnswerError, QStringLiteral("The server holds every byte but did not create the video"));
-        return false;
-    }
-    m_offset = last + 1;
-    return true;
-}
-
-void ResumableUpload::retryLater(QNetworkReply *reply, int status, const QString &reason)
+void ResumableUpload::retryLater(int status, const QString &reason, std::optional<milliseconds> advertised)
 {
     if (m_retries >= m_maxRetries) {
         fail(status > 0 ? status : UploadTooManyRetriesError,
@@ -364,7 +249,7 @@ void ResumableUpload::retryLater(QNetworkReply *reply, int status, const QString
     }
     milliseconds wait = m_initialBackoff * (qint64(1) << std::min(m_retries, 20));
     wait = std::min(wait, m_maxBackoff);
-    if (const std::optional<milliseconds> advertised = retryAfter(reply))
+    if (advertised)
         wait = *advertised;
     ++m_retries;
     zaf::log::notice(lcPublishing(), QStringLiteral("Upload interrupted: %1; retry %2 of %3 in %4 ms")
@@ -405,15 +290,8 @@ void ResumableUpload::scheduleAfter(milliseconds delay, void (ResumableUpload::*
     });
 }
 
-void ResumableUpload::succeed(const QByteArray &body)
+void ResumableUpload::succeed(const QString &id)
 {
-    const QJsonDocument document = QJsonDocument::fromJson(body);
-    const QString id = document.isObject() ? document.object().value(QStringLiteral("id")).toString() : QString();
-    static const QRegularExpression idPattern(QStringLiteral("^[A-Za-z0-9_-]{1,64}$"));
-    if (!idPattern.match(id).hasMatch()) {
-        fail(UploadMalformedAnswerError, QStringLiteral("The server finished the upload without a usable video id"));
-        return;
-    }
     UploadResult result;
     result.videoId = id;
     result.watchUrl = QUrl(QString::fromLatin1(kWatchUrlPrefix) + id);

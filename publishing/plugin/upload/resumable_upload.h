@@ -21,6 +21,7 @@
 // cancel() and after any error (which is logged in the "zaf.publishing" category).
 
 #include "platform/error.h"
+#include "publishing/plugin/upload/upload_answer.h"
 #include "publishing/plugin/upload/video_metadata.h"
 
 #include <QObject>
@@ -29,6 +30,7 @@
 
 #include <chrono>
 #include <functional>
+#include <optional>
 
 class QNetworkAccessManager;
 class QNetworkReply;
@@ -107,19 +109,16 @@ Q_SIGNALS:
     void finished(const zaf::publishing::UploadResult &result);
 
 private:
-    enum class Step { Initiate, SendChunk, QueryStatus };
-
     void initiate();
     void sendChunk();
     void queryStatus();
-    void send(Step step, QNetworkReply *reply);
+    void send(UploadStep step, QNetworkReply *reply);
     void handleReply(QNetworkReply *reply);
-    void handleInitiation(QNetworkReply *reply, int status);
-    void handleUploadAnswer(QNetworkReply *reply, int status);
-    void retryLater(QNetworkReply *reply, int status, const QString &reason);
+    // Carries out what an answer asked for (see upload_answer.h).
+    void apply(const UploadDecision &decision);
+    void retryLater(int status, const QString &reason, std::optional<std::chrono::milliseconds> advertised);
     void restartSession(const QString &reason);
-    bool resumeFromRange(QNetworkReply *reply);
-    void succeed(const QByteArray &body);
+    void succeed(const QString &videoId);
     void fail(int code, const QString &message);
     void scheduleAfter(std::chrono::milliseconds delay, void (ResumableUpload::*step)());
     // Whether `url` may receive the access token (see kServiceApiHost).
@@ -142,7 +141,7 @@ private:
     // State of the running upload.
     bool m_running = false;
     quint64 m_generation = 0; // bumped on every start, cancel and finish: stale waits do nothing
-    Step m_step = Step::Initiate;
+    UploadStep m_step = UploadStep::Initiate;
     QPointer<QNetworkReply> m_reply;
     QByteArray m_body;
     QUrl m_sessionUrl;
