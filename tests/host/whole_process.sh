@@ -8,15 +8,19 @@
 # to 1 s, I, to 2.5 s, O, Return to apply), waits for the trim, then saves with Ctrl+S into
 # SCRATCH_DIR/Videos. "two-editors" runs two hosts at once on the same user's temporary root: the
 # first editor applies the same trim, the second is cancelled while the first stays open, then
-# the first saves.
+# the first saves. "kill-mid-trim" applies the trim and kills the extension (SIGKILL) while the trim
+# writes into its temporary directory, then opens and cancels a second editor, whose start sweeps
+# what the killed one left. "host-dies" applies the trim and kills zaf-host (SIGKILL): the
+# extension must exit by itself.
 #
 # MOVIE "fixture" (the default) is a 3 s 640x360 recording with two audio tracks; "tiny" is a 4x4
 # H.264 movie; "garbage" is random bytes named .mp4.
 #
 # Writes into SCRATCH_DIR: movie.mp4, temp/ (the per-user temporary root), host.out, host.err,
-# host.status (zaf-host's exit status), extension.pid (the editor window's process), for
-# "two-editors" also second.out, second.err and second.status, and result ("ok" or what went
-# wrong). Exits 0 when the script itself ran to its end; the caller judges the outputs.
+# host.status (zaf-host's exit status), extension.pid (the editor window's process), movie.sha256
+# (the recording's digest before the run), for "two-editors" and "kill-mid-trim" also second.out,
+# second.err and second.status, for "kill-mid-trim" killed.files (what the temporary directory held
+# at the kill), and result ("ok" or what went wrong). Exits 0 when the script itself ran to its end; the caller judges the outputs.
 set -u
 
 if [ "${1:-}" = "--inside" ]; then
@@ -46,13 +50,34 @@ if [ "${1:-}" = "--inside" ]; then
         return 1
     }
     # No window manager under Xvfb: the window gets the keyboard focus directly.
-    trim_with_keys() {
+    trim_keys() {
         xdotool windowfocus --sync "$1"
         xdotool key --delay 20 --repeat 30 Right
         xdotool key i
         xdotool key --delay 20 --repeat 45 Right
         xdotool key o Return
+    }
+    trim_with_keys() {
+        trim_keys "$1"
         sleep 4
+    }
+    # cancel_second_editor KNOWN: a second host's editor (a window other than KNOWN) is cancelled
+    # with Escape; sets result when it goes wrong.
+    cancel_second_editor() {
+        start_host second
+        second_pid=$!
+        second_window=$(new_window "$1")
+        if [ -z "$second_window" ]; then
+            result="the second editor window did not appear"
+        else
+            sleep 2
+            xdotool windowfocus --sync "$second_window"
+            xdotool key Escape
+            wait_exit "$second_pid" || result="the second zaf-host did not exit within 60 s of Escape"
+        fi
+        [ "$result" = ok ] || kill "$second_pid" 2>/dev/null
+        wait "$second_pid"
+        echo $? >"$scratch/second.status"
     }
 
     start_host host
@@ -72,22 +97,27 @@ if [ "${1:-}" = "--inside" ]; then
             ;;
         two-editors)
             trim_with_keys "$window"
-            start_host second
-            second_pid=$!
-            second_window=$(new_window "$window")
-            if [ -z "$second_window" ]; then
-                result="the second editor window did not appear"
-            else
-                sleep 2
-                xdotool windowfocus --sync "$second_window"
-                xdotool key Escape
-                wait_exit "$second_pid" || result="the second zaf-host did not exit within 60 s of Escape"
-            fi
-            [ "$result" = ok ] || kill "$second_pid" 2>/dev/null
-            wait "$second_pid"
-            echo $? >"$scratch/second.status"
+            cancel_second_editor "$window"
             xdotool windowfocus --sync "$window"
             xdotool key ctrl+s
+            ;;
+        kill-mid-trim)
+            trim_keys "$window"
+            # Kill as soon as the trim's temporary output appears (or after 3 s).
+            for _ in $(seq 1 300); do
+                [ -n "$(find "$scratch/temp" -name '.*partial*' 2>/dev/null)" ] && break
+                sleep 0.01
+            done
+            find "$scratch/temp" -mindepth 2 >"$scratch/killed.files"
+            kill -KILL "$(cat "$scratch/extension.pid")"
+            wait_exit "$host_pid" || result="zaf-host did not exit within 60 s of the extension's death"
+            # The killed editor's window has gone, and the X server may give its id to the next.
+            [ "$result" = ok ] && cancel_second_editor none
+            ;;
+        host-dies)
+            trim_with_keys "$window"
+            kill -KILL "$host_pid"
+            wait_exit "$(cat "$scratch/extension.pid")" || result="the extension did not exit within 60 s of its host's death"
             ;;
         *)
             xdotool windowfocus --sync "$window"
@@ -123,6 +153,7 @@ if [ ! -s "$scratch/movie.mp4" ]; then
     echo "the $movie movie could not be made" >"$scratch/result"
     exit 0
 fi
+sha256sum "$scratch/movie.mp4" | cut -d' ' -f1 >"$scratch/movie.sha256"
 export ZAF_TEMP_DIRECTORY="$scratch/temp/"
 export ZAF_VIDEO_LIBRARY="$scratch/Videos"
 export QT_QPA_PLATFORM=xcb

@@ -31,8 +31,9 @@ protected:
         return file.open(QIODevice::ReadOnly) ? QString::fromUtf8(file.readAll()) : QString();
     }
     // Runs the whole-process script for a scenario and checks what every run must end with: the
-    // script ran through, zaf-host printed `report` and exited 0, and the temporary directory is empty.
-    void run(const char *scenario, const char *report, const char *movie = "fixture")
+    // script ran through, zaf-host printed `report` and exited with `hostStatus`, and the temporary
+    // directory is empty.
+    void run(const char *scenario, const char *report, const char *movie = "fixture", const char *hostStatus = "0")
     {
         QProcess script;
         script.setProcessChannelMode(QProcess::ForwardedChannels);
@@ -46,12 +47,31 @@ protected:
         ASSERT_EQ(script.exitCode(), 0);
         const std::string hostErr = read("host.err").toStdString();
         ASSERT_EQ(read("result").trimmed(), "ok") << "zaf-host stderr:\n" << hostErr;
-        EXPECT_EQ(read("host.status").trimmed(), "0") << hostErr;
+        EXPECT_EQ(read("host.status").trimmed(), hostStatus) << hostErr;
         EXPECT_EQ(read("host.out"), report);
         const QDir temp(scratch.file("temp"));
         ASSERT_TRUE(temp.exists()) << "the extension made its temporary directory ready";
         EXPECT_EQ(temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot), QStringList());
     }
+    // A run that saved nothing: the recording as it was and the library without any file, not
+    // even a hidden partial one.
+    void expectTheRecordingKeptAndNothingInTheLibrary()
+    {
+        const QString digest = QString::fromLatin1(fileDigest(scratch.file("movie.mp4")).toHex());
+        EXPECT_EQ(digest, read("movie.sha256").trimmed()) << "the host's recording changed or went";
+        EXPECT_EQ(QDir(scratch.file("Videos")).entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot),
+                  QStringList());
+    }
+    // Whether the process has ended.
+    static bool gone(int pid) { return ::kill(pid, 0) != 0 && errno == ESRCH; }
+    int extensionPid()
+    {
+        bool ok = false;
+        const int pid = read("extension.pid").trimmed().toInt(&ok);
+        EXPECT_TRUE(ok && pid > 0) << "the editor window's process is unknown";
+        return ok ? pid : 0;
+    }
+
     // The library holds one movie: the range 1 s to 2.5 s, its two audio tracks mixed into one.
     void expectTheTrimmedMixedMovieInTheLibrary()
     {
@@ -78,10 +98,8 @@ class ZafHostWholeProcessCancel : public ZafHostWholeProcess, public ::testing::
 TEST_P(ZafHostWholeProcessCancel, EscapeReportsNothingEndsTheExtensionAndLeavesNoTrace)
 {
     ASSERT_NO_FATAL_FAILURE(run("cancel", "[]\n", GetParam()));
-    bool ok = false;
-    const int extensionPid = read("extension.pid").trimmed().toInt(&ok);
-    ASSERT_TRUE(ok && extensionPid > 0) << "the editor window's process is unknown";
-    EXPECT_TRUE(::kill(extensionPid, 0) != 0 && errno == ESRCH) << "the extension " << extensionPid << " is still running";
+    const int pid = extensionPid();
+    EXPECT_TRUE(pid && gone(pid)) << "the extension " << pid << " is still running";
 }
 
 INSTANTIATE_TEST_SUITE_P(Movies, ZafHostWholeProcessCancel, ::testing::Values("fixture", "tiny", "garbage"));
@@ -101,6 +119,29 @@ TEST_F(ZafHostWholeProcess, CancellingASecondEditorLeavesTheFirstEditorsTrimToSa
     EXPECT_EQ(read("second.out"), "[]\n");
     EXPECT_EQ(read("second.status").trimmed(), "0") << read("second.err").toStdString();
     expectTheTrimmedMixedMovieInTheLibrary();
+}
+
+// The extension killed (SIGKILL) while its trim writes: zaf-host says so and fails, and the next
+// editor's start removes what the killed one left in the temporary directory. Nothing is saved and
+// the recording is kept.
+TEST_F(ZafHostWholeProcess, AnExtensionKilledMidTrimLeavesNothingOnceTheNextEditorStarts)
+{
+    ASSERT_NO_FATAL_FAILURE(run("kill-mid-trim", "", "fixture", "1"));
+    EXPECT_TRUE(read("host.err").contains("the extension died (signal 9)")) << read("host.err").toStdString();
+    EXPECT_FALSE(read("killed.files").trimmed().isEmpty()) << "the killed editor had left nothing to sweep";
+    EXPECT_EQ(read("second.out"), "[]\n");
+    EXPECT_EQ(read("second.status").trimmed(), "0") << read("second.err").toStdString();
+    expectTheRecordingKeptAndNothingInTheLibrary();
+}
+
+// zaf-host killed (SIGKILL) while the editor is open with a trim: the extension notices the closed
+// channel, empties its temporary directory and exits; the recording is kept.
+TEST_F(ZafHostWholeProcess, AHostThatDiesLeavesTheExtensionToEmptyItsDirectoryAndExit)
+{
+    ASSERT_NO_FATAL_FAILURE(run("host-dies", "", "fixture", "137"));
+    const int pid = extensionPid();
+    EXPECT_TRUE(pid && gone(pid)) << "the extension " << pid << " is still running";
+    expectTheRecordingKeptAndNothingInTheLibrary();
 }
 
 } // namespace
