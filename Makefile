@@ -10,7 +10,7 @@ BUILD_DIR := build-$(SANITIZE)
 BUILD_TYPE := RelWithDebInfo
 endif
 
-.PHONY: all deps configure build run test sanitizer-job bench clean
+.PHONY: all deps configure build run test sanitizer-job fuzz bench clean
 
 all: build
 
@@ -47,6 +47,12 @@ sanitizer-job:
 	@cmake --build build-address --target $(SANITIZER_JOB_TESTS)
 	@cd build-address && $(TEST_ENV) ctest --output-on-failure -j2 --timeout 600 \
 	  -L '^($(subst $(space),|,$(strip $(SANITIZER_JOB_TESTS))))$$'
+
+# The libFuzzer targets (tests/fuzz), built with clang, ASan and UBSan in build-fuzz, each run for
+# FUZZ_SECONDS on its seeds; any finding fails.
+FUZZ_SECONDS ?= 60
+fuzz: deps
+	@FUZZ_SECONDS=$(FUZZ_SECONDS) scripts/run-fuzzers
 
 run: build
 	@scripts/run-main
