@@ -170,6 +170,9 @@ MoCatalog Parser::parse()
         const qsizetype originalEnd = original.indexOf('\0');
         if (originalEnd >= 0)
             original.truncate(originalEnd);
+        // A plural entry with an empty singular is no message either, like the header.
+        if (original.isEmpty())
+            continue;
         const qsizetype translationEnd = translation.indexOf('\0');
         if (translationEnd >= 0)
             translation.truncate(translationEnd);

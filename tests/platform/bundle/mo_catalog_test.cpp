@@ -59,6 +59,20 @@ TEST(MoCatalogTest, ParsesMsgfmtOutputWithContextPluralsAndHeader)
     }
 }
 
+// A plural entry whose singular is empty ("\0PLURAL") is no message, like the header: the lookup of
+// an empty key finds nothing.
+TEST(MoCatalogTest, APluralEntryWithAnEmptySingularIsNoMessage)
+{
+    QByteArray data = test::compilePo(kRichPo);
+    const qsizetype plural = data.indexOf(QByteArrayView("%d file\0%d files", 16));
+    ASSERT_GT(plural, 0);
+    data[plural] = '\0';
+    const MoCatalog catalog = parseMoCatalog(data);
+    ASSERT_TRUE(catalog.isValid()) << catalog.error.toStdString();
+    EXPECT_FALSE(catalog.strings.contains(QString()));
+    EXPECT_EQ(catalog.strings.size(), 4);
+}
+
 // Strings are decoded in the charset the header declares.
 TEST(MoCatalogTest, DecodesStringsInTheHeadersLatin1Charset)
 {
