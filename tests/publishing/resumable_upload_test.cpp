@@ -222,6 +222,39 @@ TEST(ResumableUpload, endsWhenTheServerStallsOrSendsTheSessionElsewhere)
     }
 }
 
+// Header values at the edge of what a 64-bit number holds are read without overflow: a Retry-After
+// of that many seconds waits the longest allowed wait, and a Range ending at the largest byte number
+// is an unusable Range.
+TEST(UploadAnswer, readsHeaderValuesAtTheEdgeOfANumberWithoutOverflow)
+{
+    using Action = UploadDecision::Action;
+    const struct {
+        const char *name;
+        int status;
+        QByteArray range, retryAfter;
+        Action action;
+        qint64 offsetOrCode;
+        std::optional<std::chrono::milliseconds> retryAfterDelay;
+    } cases[] = {
+        {"Retry-After in seconds", 503, {}, "120", Action::Retry, 503, 120000ms},
+        {"Retry-After past the largest wait", 503, {}, "9223372036854776", Action::Retry, 503, 600000ms},
+        {"Range inside the file", 308, "bytes=0-499", {}, Action::SendFrom, 500, std::nullopt},
+        {"Range at the largest byte number", 308, "bytes=0-9223372036854775807", {}, Action::Fail, UploadMalformedAnswerError, std::nullopt},
+    };
+    const QDateTime now = QDateTime::fromSecsSinceEpoch(1700000000, Qt::UTC);
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.name);
+        UploadAnswer answer;
+        answer.status = c.status;
+        answer.range = c.range;
+        answer.retryAfter = c.retryAfter;
+        const UploadDecision decision = interpretUploadAnswer(answer, UploadState{UploadStep::SendChunk, 0, 1000, {}}, now);
+        EXPECT_EQ(decision.action, c.action);
+        EXPECT_EQ(c.action == Action::SendFrom ? decision.offset : qint64(decision.code), c.offsetOrCode);
+        EXPECT_EQ(decision.retryAfter, c.retryAfterDelay);
+    }
+}
+
 // The chunk device reads its slice of the file and rewinds, so the network stack can resend it.
 TEST(UploadChunkDevice, readsItsSliceAndRewinds)
 {

@@ -113,7 +113,8 @@ UploadDecision readProgress(const UploadAnswer &answer, const UploadState &state
         const QRegularExpressionMatch match = pattern.match(QString::fromLatin1(range));
         bool ok = match.hasMatch();
         const qint64 last = ok ? match.captured(1).toLongLong(&ok) : -1;
-        if (!ok || last + 1 > state.total) {
+        // Compared as `last >= total`: `last + 1` overflows for the largest number a Range can hold.
+        if (!ok || last >= state.total) {
             return fail(UploadMalformedAnswerError, QStringLiteral("The server answered with an unusable Range \"%1\" for %2 bytes")
                                                         .arg(QString::fromLatin1(range.left(100)))
                                                         .arg(state.total));
@@ -171,8 +172,9 @@ std::optional<milliseconds> parseRetryAfter(const QByteArray &raw, const QDateTi
         return std::nullopt;
     bool ok = false;
     const qint64 seconds = value.toLongLong(&ok);
+    // Capped in seconds, before the conversion could overflow.
     if (ok && seconds >= 0)
-        return std::min(milliseconds(seconds * 1000), kMaxRetryAfter);
+        return milliseconds(std::min<qint64>(seconds, kMaxRetryAfter.count() / 1000) * 1000);
     const QDateTime when = QDateTime::fromString(QString::fromLatin1(value), Qt::RFC2822Date);
     if (when.isValid()) {
         const qint64 delta = now.msecsTo(when);
