@@ -2,6 +2,7 @@
 
 #include "platform/dispatch.h"
 #include "platform/log.h"
+#include "platform/media/core/ffmpeg_ptr.h"
 #include "platform/media/core/media_log.h"
 #include "platform/media/player.h"
 
@@ -43,9 +44,15 @@ void PlayerItem::finishLoading()
             m_error = makeMediaError(kMediaErrorNoTracks, QStringLiteral("%1 holds nothing to play.").arg(m_asset->url().toString()));
     } else {
         m_duration = m_asset->duration();
+        const QList<AssetTrack> video = m_asset->tracksWithMediaType(MediaType::Video);
+        const QSize pictureSize = video.isEmpty() ? QSize() : video.first().naturalSize.toSize();
         if (!m_duration.isNumeric()) {
             m_error = makeMediaError(kMediaErrorCannotOpen,
                 QStringLiteral("%1 has no known duration.").arg(m_asset->url().toString()));
+        } else if (qint64(pictureSize.width()) * pictureSize.height() > ff::kMaxPixels) {
+            // No decoder may allocate such pictures: played, the movie would stay black.
+            m_error = makeMediaError(kMediaErrorDecodeFailed, QStringLiteral("%1 has pictures too large to decode (%2x%3).")
+                .arg(m_asset->url().toString()).arg(pictureSize.width()).arg(pictureSize.height()));
         }
     }
     if (m_error) {
