@@ -157,6 +157,11 @@ QString cachedFixture(const QString &name, const std::function<bool(const QStrin
 
 } // namespace
 
+QString sharedGeneratedFile(const QString &name, const std::function<bool(const QString &path)> &make)
+{
+    return cachedFixture(name, make);
+}
+
 QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape)
 {
     const QString name = QStringLiteral("fixture-%1s-%2x%3-%4fps-a%5x%6-r%7-g%8.mp4")

@@ -24,6 +24,9 @@ namespace zaf::test {
 QString makeFixtureMovie(const QString &dir, const zaf::fixture::FixtureSpec &shape = {});
 // A fixture movie made once per process for `shape` and shared by every test that asks for it.
 QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape);
+// The file `name` of the fixture cache, made once by `make` into the path it is given when missing,
+// for generators of their own; `name` must change whenever what `make` writes does.
+QString sharedGeneratedFile(const QString &name, const std::function<bool(const QString &path)> &make);
 
 // The colour of every pixel of a flat-colour movie.
 inline constexpr QRgb kFlatColour = 0xff3366cc;
