@@ -21,9 +21,13 @@
 // Output rules: the file is written under a temporary name in the output's directory and renamed
 // into place without replacing anything; a failed or cancelled export leaves no file behind.
 // Without a time range or an audio mix every stream is copied bit-exact. An audio mix replaces the
-// audio with one AAC track (48 kHz stereo) summing the listed tracks; the video is still copied
-// when no time range is set. A time range re-encodes the video with H.264 frame-accurately and
-// cuts the audio sample-accurately, both starting at time 0 in the output.
+// audio with one track holding the listed tracks: several are summed into AAC at 48 kHz stereo,
+// and one AAC track, having nothing to sum, is copied as it is (its rate and channels kept). The
+// video is still copied when no time range is set. A time range cuts frame-accurately and
+// sample-accurately, both starting at time 0 in the output: H.264 video copies the groups of
+// pictures inside the range and re-encodes only the pictures at the cuts (other video is
+// re-encoded whole with H.264), and AAC audio copies its packets with an edit list for the exact
+// start and end (other audio is re-encoded as AAC).
 
 #include "platform/error.h"
 #include "platform/media/audio_mix.h"
