@@ -86,7 +86,8 @@ bool Parser::string(qint64 tableOffset, quint32 index, const char *what, QByteAr
 
 bool Parser::decode(const QByteArray &bytes, QString *out) const
 {
-    QStringDecoder decoder(m_encoding);
+    // Stateless: a sequence cut off at the end of the string is an error, not input kept for later.
+    QStringDecoder decoder(m_encoding, QStringDecoder::Flag::Stateless);
     *out = decoder.decode(bytes);
     return !decoder.hasError();
 }

@@ -188,6 +188,8 @@ TEST_F(MoCatalogCorruptionTest, EveryCorruptVariantGivesAnErrorAndNoStrings)
              putWord(d, l.originals() + 8 + 4, 0);
          }, ""},
         {"invalid UTF-8 in a string", [](QByteArray &d, const Layout &l) { d[l.originalOffset(2)] = char(0xff); }, "charset"},
+        {"string ending inside a UTF-8 sequence",
+         [](QByteArray &d, const Layout &l) { d[l.originalOffset(2) + l.originalLength(2) - 1] = char(0xc3); }, "charset"},
         {"cut in the middle", [](QByteArray &d, const Layout &) { d.truncate(d.size() / 2); }, ""},
     };
     for (const Corruption &corruption : corruptions) {
