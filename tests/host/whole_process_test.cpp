@@ -1,11 +1,11 @@
 // The whole process under Xvfb: zaf-host starts the real extension on a fixture recording, the
 // editor is driven with the keyboard, and the host prints the report and exits cleanly, with the
 // extension gone and its temporary directory left empty.
+#include "tests/support/child_process.h"
 #include "tests/support/temp_dir.h"
 
 #include <QDir>
 #include <QFile>
-#include <QProcess>
 #include <QStandardPaths>
 
 #include <gtest/gtest.h>
@@ -35,16 +35,13 @@ protected:
     // directory is empty.
     void run(const char *scenario, const char *report, const char *movie = "fixture", const char *hostStatus = "0")
     {
-        QProcess script;
-        script.setProcessChannelMode(QProcess::ForwardedChannels);
-        script.start("bash", {ZAF_WHOLE_PROCESS_SCRIPT, ZAF_HOST_BIN, ZAF_EXTENSION_BIN, ZAF_FIXTURE_BIN, scratch.path(), scenario, movie});
-        ASSERT_TRUE(script.waitForStarted(10000));
-        if (!script.waitForFinished(240000)) {
-            script.kill();
-            script.waitForFinished(5000);
-            FAIL() << "the whole-process script did not finish";
-        }
-        ASSERT_EQ(script.exitCode(), 0);
+        zaf::test::ChildOptions options;
+        options.timeoutMs = 240000;
+        options.forwardOutput = true;
+        const zaf::test::ChildRun script = zaf::test::runChild(
+            "bash", {ZAF_WHOLE_PROCESS_SCRIPT, ZAF_HOST_BIN, ZAF_EXTENSION_BIN, ZAF_FIXTURE_BIN, scratch.path(), scenario, movie}, options);
+        ASSERT_TRUE(script.started && !script.timedOut) << script.error.toStdString();
+        ASSERT_EQ(script.exitCode, 0);
         const std::string hostErr = read("host.err").toStdString();
         ASSERT_EQ(read("result").trimmed(), "ok") << "zaf-host stderr:\n" << hostErr;
         EXPECT_EQ(read("host.status").trimmed(), hostStatus) << hostErr;
@@ -78,10 +75,10 @@ protected:
         const QDir library(scratch.file("Videos"));
         const QStringList saved = library.entryList(QDir::Files);
         ASSERT_EQ(saved.size(), 1);
-        QProcess probe;
-        probe.start("ffprobe", {"-v", "error", "-show_entries", "stream=codec_type:format=duration", "-of", "csv=p=0", library.filePath(saved[0])});
-        ASSERT_TRUE(probe.waitForFinished(30000));
-        const QStringList lines = QString::fromUtf8(probe.readAllStandardOutput()).split('\n', Qt::SkipEmptyParts);
+        const zaf::test::ChildRun probe = zaf::test::runChild(
+            "ffprobe", {"-v", "error", "-show_entries", "stream=codec_type:format=duration", "-of", "csv=p=0", library.filePath(saved[0])});
+        ASSERT_TRUE(probe.ok()) << probe.error.toStdString();
+        const QStringList lines = QString::fromUtf8(probe.out).split('\n', Qt::SkipEmptyParts);
         EXPECT_EQ(lines.count("audio"), 1);
         EXPECT_EQ(lines.count("video"), 1);
         EXPECT_NEAR(lines.last().toDouble(), 1.5, 0.1);

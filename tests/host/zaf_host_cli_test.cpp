@@ -1,8 +1,9 @@
 // zaf-host, run as a host application runs it, with the fake extension behind it: argument
 // errors, the printed reports, and the exit status for each way the extension can end.
+#include "tests/support/child_process.h"
 #include "tests/support/temp_dir.h"
 
-#include <QProcess>
+#include <QProcessEnvironment>
 
 #include <gtest/gtest.h>
 
@@ -18,22 +19,20 @@ struct HostRun {
 // Runs zaf-host with `args`, the fake's steps and (when not empty) $ZAF_EXTENSION_PATH.
 HostRun runHost(const QStringList &args, const QString &fakeSteps = {}, const QString &extensionPath = {})
 {
-    QProcess process;
     QProcessEnvironment environment = QProcessEnvironment::systemEnvironment();
     environment.insert("ZAF_FAKE_STEPS", fakeSteps);
     environment.remove("ZAF_EXTENSION_PATH");
     if (!extensionPath.isEmpty())
         environment.insert("ZAF_EXTENSION_PATH", extensionPath);
-    process.setProcessEnvironment(environment);
-    process.start(ZAF_HOST_BIN, args);
-    if (!process.waitForStarted(10000) || !process.waitForFinished(60000)) {
-        process.kill();
-        process.waitForFinished(5000);
-        ADD_FAILURE() << "zaf-host did not run to its end: " << args.join(' ').toStdString();
+    zaf::test::ChildOptions options;
+    options.timeoutMs = 60000;
+    options.environment = environment.toStringList();
+    const zaf::test::ChildRun run = zaf::test::runChild(ZAF_HOST_BIN, args, options);
+    if (!run.started || run.timedOut) {
+        ADD_FAILURE() << "zaf-host did not run to its end: " << args.join(' ').toStdString() << ": " << run.error.toStdString();
         return {};
     }
-    return {process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1, QString::fromUtf8(process.readAllStandardOutput()),
-            QString::fromUtf8(process.readAllStandardError())};
+    return {run.exitCode, QString::fromUtf8(run.out), QString::fromUtf8(run.err)};
 }
 
 class ZafHostCli : public ::testing::Test {

@@ -1,8 +1,8 @@
 #include "tests/support/private_mounts.h"
+#include "tests/support/child_process.h"
 
 #include <QCoreApplication>
 #include <QFile>
-#include <QProcess>
 #include <QProcessEnvironment>
 #include <QStandardPaths>
 #include <gtest/gtest.h>
@@ -22,16 +22,12 @@ const QStringList kUnshare{QStringLiteral("--mount"), QStringLiteral("--propagat
 // to its end within the bound.
 std::pair<int, QString> runUnshare(const QStringList &arguments, const QProcessEnvironment &environment, int timeoutMs)
 {
-    QProcess process;
-    process.setProcessChannelMode(QProcess::MergedChannels);
-    process.setProcessEnvironment(environment);
-    process.start(QStringLiteral("unshare"), kUnshare + arguments);
-    if (!process.waitForFinished(timeoutMs)) {
-        process.kill();
-        process.waitForFinished(5000);
-        return {-1, QString::fromLocal8Bit(process.readAll())};
-    }
-    return {process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1, QString::fromLocal8Bit(process.readAll())};
+    ChildOptions options;
+    options.timeoutMs = timeoutMs;
+    options.mergeErrorIntoOutput = true;
+    options.environment = environment.toStringList();
+    const ChildRun run = runChild(QStringLiteral("unshare"), kUnshare + arguments, options);
+    return {run.started && !run.timedOut ? run.exitCode : -1, QString::fromLocal8Bit(run.out) + run.error};
 }
 
 void skip(const QString &reason)

@@ -1,9 +1,9 @@
 #include "tests/platform/bundle/bundle_fixtures.h"
+#include "tests/support/child_process.h"
 
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
-#include <QProcess>
 #include <QTemporaryDir>
 #include <gtest/gtest.h>
 
@@ -15,13 +15,11 @@ QByteArray compilePo(const QByteArray &poSource, ByteOrder order)
     const QString po = dir.filePath(QStringLiteral("messages.po"));
     const QString mo = dir.filePath(QStringLiteral("messages.mo"));
     writeFile(po, poSource);
-    QProcess msgfmt;
-    msgfmt.start(QStringLiteral(ZAF_MSGFMT), {order == ByteOrder::Big ? QStringLiteral("--endianness=big") : QStringLiteral("--endianness=little"),
-                                              QStringLiteral("-o"), mo, po});
+    const zaf::test::ChildRun msgfmt = zaf::test::runChild(QStringLiteral(ZAF_MSGFMT),
+        {order == ByteOrder::Big ? QStringLiteral("--endianness=big") : QStringLiteral("--endianness=little"), QStringLiteral("-o"), mo, po});
     QFile file(mo);
-    if (!msgfmt.waitForFinished(30000) || msgfmt.exitStatus() != QProcess::NormalExit || msgfmt.exitCode() != 0
-        || !file.open(QIODevice::ReadOnly)) {
-        ADD_FAILURE() << "msgfmt failed: " << msgfmt.readAllStandardError().toStdString();
+    if (!msgfmt.ok() || !file.open(QIODevice::ReadOnly)) {
+        ADD_FAILURE() << "msgfmt failed: " << msgfmt.error.toStdString() << msgfmt.err.toStdString();
         return QByteArray();
     }
     return file.readAll();

@@ -1,5 +1,6 @@
 #include "tests/support/media/fixture_movies.h"
 
+#include "tests/support/child_process.h"
 #include "tools/fixture/frame_pattern.h"
 
 #include <QCoreApplication>
@@ -8,7 +9,6 @@
 #include <QFileInfo>
 #include <QJsonArray>
 #include <QJsonDocument>
-#include <QProcess>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
@@ -62,31 +62,13 @@ QStringList words(const char *line)
 
 ToolRun runTool(const QString &program, const QStringList &args, const std::function<void(QByteArray &)> &sink)
 {
-    QProcess process;
-    process.start(program, args, QIODevice::ReadOnly);
-    ToolRun result;
-    if (!process.waitForStarted(10000)) {
-        ADD_FAILURE() << "cannot start " << describe(program, args) << ": " << process.errorString().toStdString();
-        return result;
-    }
-    const QDeadlineTimer deadline(kToolTimeoutMs);
-    for (bool running = true; running;) {
-        if (deadline.hasExpired()) {
-            process.kill();
-            process.waitForFinished(5000);
-            ADD_FAILURE() << describe(program, args) << " did not finish within " << kToolTimeoutMs / 1000 << " s";
-            return result;
-        }
-        running = process.state() != QProcess::NotRunning;
-        if (running)
-            process.waitForReadyRead(200);
-        result.out += process.readAllStandardOutput();
-        if (sink)
-            sink(result.out);
-    }
-    result.err = process.readAllStandardError();
-    result.exitCode = process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1;
-    return result;
+    ChildOptions options;
+    options.timeoutMs = kToolTimeoutMs;
+    options.sink = sink;
+    const ChildRun run = runChild(program, args, options);
+    if (!run.started || run.timedOut)
+        ADD_FAILURE() << describe(program, args) << ": " << run.error.toStdString();
+    return ToolRun{run.started && !run.timedOut ? run.exitCode : -1, run.out, run.err};
 }
 
 bool ffmpeg(const QStringList &args)
