@@ -62,4 +62,4 @@ bench: build
 	@cmake --build $(BUILD_DIR) --target benchmarks && scripts/run-benchmarks $(BUILD_DIR)
 
 clean:
-	rm -rf build build-address build-thread
+	rm -rf build build-address build-thread build-fuzz
