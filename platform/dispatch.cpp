@@ -65,6 +65,12 @@ void main(std::function<void()> fn)
     QMetaObject::invokeMethod(app, handedOff(std::move(fn)), Qt::QueuedConnection);
 }
 
+void onThreadOf(QObject *context, std::function<void()> fn)
+{
+    if (context)
+        QMetaObject::invokeMethod(context, handedOff(std::move(fn)), Qt::QueuedConnection);
+}
+
 void mainSync(std::function<void()> fn)
 {
     if (isMainThread()) {
@@ -86,7 +92,12 @@ QThreadPool &globalQueue(Priority priority)
 
 void async(Priority priority, std::function<void()> fn)
 {
-    globalQueue(priority).start(handedOff(std::move(fn)));
+    asyncOn(globalQueue(priority), std::move(fn));
+}
+
+void asyncOn(QThreadPool &pool, std::function<void()> fn)
+{
+    pool.start(handedOff(std::move(fn)));
 }
 
 void waitForGlobalQueue(Priority priority)

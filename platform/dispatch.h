@@ -11,6 +11,7 @@
 #include <memory>
 #include <mutex>
 
+class QObject;
 class QThreadPool;
 
 namespace zaf::dispatch {
@@ -21,11 +22,19 @@ enum class Priority { Background, Default };
 // Requires a QCoreApplication.
 void main(std::function<void()> fn);
 
+// Queues fn to run on the thread of `context` on a later pass of its event loop, unless `context`
+// is destroyed first. Callable from any thread.
+void onThreadOf(QObject *context, std::function<void()> fn);
+
 // Runs fn on the main thread and waits for it; runs it inline when already on the main thread.
 void mainSync(std::function<void()> fn);
 
 // Runs fn on a thread of the global queue of the given priority and returns at once.
 void async(Priority priority, std::function<void()> fn);
+
+// Runs fn on a thread of `pool`, a queue of the caller's own (a serial one, say), with the same
+// hand-over to it as the global queues, and returns at once.
+void asyncOn(QThreadPool &pool, std::function<void()> fn);
 
 // The pool behind a global queue.
 QThreadPool &globalQueue(Priority priority);

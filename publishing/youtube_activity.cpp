@@ -270,12 +270,10 @@ void ZafYouTubeActivity::prepareWithActivityItems(const QVariantList &activityIt
             const std::uint64_t sessionID = m_exportSession->sessionID();
             const QPointer<ZafYouTubeActivity> self(this);
             m_exportSession->exportAsynchronously([weakSession, sessionID, self] {
-                if (QCoreApplication *app = QCoreApplication::instance()) {
-                    QMetaObject::invokeMethod(app, [self, sessionID] {
-                        if (self)
-                            self->exportDidEnd(sessionID);
-                    }, Qt::QueuedConnection);
-                }
+                zaf::dispatch::onThreadOf(QCoreApplication::instance(), [self, sessionID] {
+                    if (self)
+                        self->exportDidEnd(sessionID);
+                });
                 const std::shared_ptr<zaf::media::ExportSession> session = weakSession.lock();
                 if (!session)
                     return;

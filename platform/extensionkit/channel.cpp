@@ -1,5 +1,6 @@
 #include "platform/extensionkit/channel.h"
 
+#include "platform/dispatch.h"
 #include "platform/extensionkit/extensionkit_log.h"
 #include "platform/extensionkit/json_rpc.h"
 #include "platform/log.h"
@@ -42,7 +43,7 @@ std::shared_ptr<Channel> Channel::create(int fd, std::uint32_t maxIncomingFrameL
         if (QThread::currentThread() == channel->thread())
             delete channel;
         else
-            QMetaObject::invokeMethod(channel, [channel] { delete channel; }, Qt::QueuedConnection);
+            zaf::dispatch::onThreadOf(channel, [channel] { delete channel; });
     });
 }
 

@@ -1,4 +1,5 @@
 #include "platform/media/player.h"
+#include "platform/dispatch.h"
 #include "platform/media/core/media_log.h"
 
 #include "platform/log.h"
@@ -89,7 +90,7 @@ void Player::startPipeline()
         // Runs on the video thread; the decoder is joined before this Player goes away.
         auto framesReady = [pending, self] {
             if (!pending->exchange(true))
-                QMetaObject::invokeMethod(self, [self] { self->framesReady(); }, Qt::QueuedConnection);
+                zaf::dispatch::onThreadOf(self, [self] { self->framesReady(); });
         };
         auto failed = [](const QString &message) { zaf::log::error(lcPlayback(), message); };
         m_videoDecoder = std::make_unique<playback::VideoDecoder>(path, video.first().streamIndex, m_frames.get(),
@@ -121,12 +122,10 @@ void Player::chooseDefaultTimeSource()
             m_audioOutput = std::make_shared<playback::AudioOutput>(device);
             QPointer<Player> self(this);
             auto failed = [self](const QString &message) {
-                QMetaObject::invokeMethod(
-                    self.data(), [self, message] {
-                        if (self)
-                            self->audioFailed(message);
-                    },
-                    Qt::QueuedConnection);
+                zaf::dispatch::onThreadOf(self.data(), [self, message] {
+                    if (self)
+                        self->audioFailed(message);
+                });
             };
             m_audioDecoder = std::make_unique<playback::AudioDecoder>(asset->url().toLocalFile(), streams,
                 m_audioOutput->format(), m_audioOutput->ring(), std::move(failed));

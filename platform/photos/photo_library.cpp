@@ -1,6 +1,7 @@
 #include "platform/photos/photo_library.h"
 
 #include "platform/files/file_manager.h"
+#include "platform/dispatch.h"
 #include "platform/log.h"
 #include "platform/media/media_asset.h"
 
@@ -70,7 +71,7 @@ QList<QString> PhotoLibrary::createdVideos() const
 
 void PhotoLibrary::performChanges(ChangeBlock changes, Completion completion)
 {
-    libraryQueue().start([this, changes = std::move(changes), completion = std::move(completion)] {
+    dispatch::asyncOn(libraryQueue(), [this, changes = std::move(changes), completion = std::move(completion)] {
         PhotoLibraryChangeRequest request;
         if (changes)
             changes(request);

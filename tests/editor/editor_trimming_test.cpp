@@ -92,8 +92,9 @@ TEST_F(EditorTest, SecondTrimWithinTheSameSecondGetsAFreeNameAndRetiresTheFirstF
     for (qint64 second = now; second <= now + 3; ++second) {
         taken << ZafTempMovieFileNameAt(ZafTempStore::defaultStore()._srTempPath() + "/Recorder_", double(second));
         QFile other(taken.last());
-        if (taken.last() != first)
+        if (taken.last() != first) {
             ASSERT_TRUE(other.open(QIODevice::WriteOnly) && other.write("not the movie") > 0);
+        }
     }
     selectRange(*e, 1, 3);
     ASSERT_TRUE(applyTrim(*e));
@@ -102,8 +103,9 @@ TEST_F(EditorTest, SecondTrimWithinTheSameSecondGetsAFreeNameAndRetiresTheFirstF
     EXPECT_TRUE(QRegularExpression(QStringLiteral("^Recorder_\\d+-2\\.mp4$")).match(QFileInfo(second).fileName()).hasMatch()) << second.toStdString();
     for (const QString &other : taken) {
         QFile file(other);
-        if (other != first)
+        if (other != first) {
             EXPECT_TRUE(file.open(QIODevice::ReadOnly) && file.readAll() == "not the movie") << other.toStdString();
+        }
     }
     const QList<int> frames = readFrameNumbers(second);
     ASSERT_EQ(frames.size(), 60);

@@ -1,5 +1,6 @@
 #include "publishing/plugin/upload/resumable_upload.h"
 
+#include "platform/dispatch.h"
 #include "platform/log.h"
 #include "publishing/plugin/upload/upload_answer.h"
 #include "publishing/plugin/upload/upload_chunk_device.h"
@@ -283,10 +284,10 @@ void ResumableUpload::scheduleAfter(milliseconds delay, void (ResumableUpload::*
         // Deliver on our thread, and only to the upload that asked.
         if (!self)
             return;
-        QMetaObject::invokeMethod(self, [self, generation, step] {
+        zaf::dispatch::onThreadOf(self, [self, generation, step] {
             if (self && self->m_running && self->m_generation == generation)
                 (self->*step)();
-        }, Qt::QueuedConnection);
+        });
     });
 }
 
