@@ -70,6 +70,22 @@ public:
     virtual void setFormDefaultCategoryRoutine(std::function<void(QObject *form)> routine) = 0;
 };
 
+// The names by which the activity reaches the plug-in's form and agent at run time: the form's and
+// agent's Q_PROPERTYs and Q_INVOKABLE methods carry these names (moc needs them spelt out there),
+// and everything else on both sides uses the constants. A call the other side does not answer is
+// logged by the activity, never silent.
+inline constexpr const char *kZafFormTableProperty = "_table";                // QObject*, also its objectName
+inline constexpr const char *kZafFormCategoriesProperty = "_categories";      // QVariantList of QVariantMap
+inline constexpr const char *kZafFormPickerProperty = "_picker";              // QObject*, also its objectName
+inline constexpr const char *kZafFormDefaultCategoryProperty = "_defaultCategory"; // QString category id
+inline constexpr const char *kZafFormCategoryCellMethod = "_categoryCell";    // () -> QObject*
+inline constexpr const char *kZafTableCellMethod = "cellForRowInSection";     // (int row, int section) -> QObject*
+inline constexpr const char *kZafCellSetValueMethod = "setValue";             // (QString)
+inline constexpr const char *kZafCellSetPlaceholderMethod = "setPlaceholderText"; // (QString)
+inline constexpr const char *kZafCategoryCellSetLabelMethod = "setCategoryString"; // (QString)
+inline constexpr const char *kZafPickerSelectRowMethod = "selectRowInComponentAnimated"; // (int row, int component, bool animated)
+inline constexpr const char *kZafAgentCancelMethod = "cancelAction";          // ()
+
 // The keys of one entry of the form's "_categories" list (a QVariantMap per category).
 inline constexpr const char *kZafPublishingCategoryIdKey = "id";
 inline constexpr const char *kZafPublishingCategoryLabelKey = "label";

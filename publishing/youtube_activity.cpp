@@ -94,12 +94,26 @@ const AgentClassSlot &agentClassSlot()
     return slot;
 }
 
-QObject *invokeForObject(QObject *target, const char *method)
+// Calls `method` on `target` by name, as the plug-in's objects publish it. A call that cannot be
+// made (no target, a method renamed or gone, other arguments) is logged, never silent.
+template <typename... Arguments>
+bool invokeByName(QObject *target, const char *method, Arguments... arguments)
 {
-    QObject *result = nullptr;
-    if (!target || !QMetaObject::invokeMethod(target, method, Q_RETURN_ARG(QObject *, result)))
-        return nullptr;
-    return result;
+    if (target && QMetaObject::invokeMethod(target, method, arguments...))
+        return true;
+    zaf::log::error(lcYouTubeActivity(), QStringLiteral("the publishing form does not answer %1 on %2")
+                                             .arg(QString::fromLatin1(method),
+                                                  target ? QString::fromLatin1(target->metaObject()->className()) : QStringLiteral("nothing")));
+    return false;
+}
+
+// A QObject* the form publishes as a property; logged when it is missing.
+QObject *objectProperty(QObject *form, const char *name)
+{
+    QObject *object = form->property(name).value<QObject *>();
+    if (!object)
+        zaf::log::error(lcYouTubeActivity(), QStringLiteral("the publishing form has no %1").arg(QString::fromLatin1(name)));
+    return object;
 }
 
 bool exportHasEnded(zaf::media::ExportStatus status)
@@ -321,13 +335,12 @@ zaf::ui::ViewController *ZafYouTubeActivity::activityViewController()
 
     if (form) {
         form->view();
-        QObject *table = form->property("_table").value<QObject *>();
         QObject *cell = nullptr;
-        if (table)
-            QMetaObject::invokeMethod(table, "cellForRowInSection", Q_RETURN_ARG(QObject *, cell), Q_ARG(int, 1), Q_ARG(int, 0));
+        if (QObject *table = objectProperty(form, kZafFormTableProperty))
+            invokeByName(table, kZafTableCellMethod, Q_RETURN_ARG(QObject *, cell), Q_ARG(int, 1), Q_ARG(int, 0));
         if (cell) {
-            QMetaObject::invokeMethod(cell, "setValue", Q_ARG(QString, m_descriptionText));
-            QMetaObject::invokeMethod(cell, "setPlaceholderText", Q_ARG(QString, QString()));
+            invokeByName(cell, kZafCellSetValueMethod, Q_ARG(QString, m_descriptionText));
+            invokeByName(cell, kZafCellSetPlaceholderMethod, Q_ARG(QString, QString()));
         }
     }
 
@@ -339,21 +352,24 @@ void ZafYouTubeActivity::selectDefaultCategoryOfForm(QObject *form)
 {
     if (!form)
         return;
-    const QVariantList categories = form->property("_categories").toList();
-    QObject *picker = form->property("_picker").value<QObject *>();
-    if (categories.isEmpty())
+    const QVariantList categories = form->property(kZafFormCategoriesProperty).toList();
+    if (categories.isEmpty()) {
+        zaf::log::error(lcYouTubeActivity(), QStringLiteral("the publishing form lists no categories"));
         return;
+    }
+    QObject *picker = objectProperty(form, kZafFormPickerProperty);
     for (int row = 0; row < categories.size(); ++row) {
         const QVariantMap entry = categories.at(row).toMap();
         const QString categoryId = entry.value(QLatin1String(kZafPublishingCategoryIdKey)).toString();
         if (categoryId.toLower() != defaultCategoryId())
             continue;
         const QString label = entry.value(QLatin1String(kZafPublishingCategoryLabelKey)).toString();
-        if (QObject *cell = invokeForObject(form, "_categoryCell"))
-            QMetaObject::invokeMethod(cell, "setCategoryString", Q_ARG(QString, label));
-        form->setProperty("_defaultCategory", categoryId);
+        QObject *cell = nullptr;
+        if (invokeByName(form, kZafFormCategoryCellMethod, Q_RETURN_ARG(QObject *, cell)) && cell)
+            invokeByName(cell, kZafCategoryCellSetLabelMethod, Q_ARG(QString, label));
+        form->setProperty(kZafFormDefaultCategoryProperty, categoryId);
         if (picker)
-            QMetaObject::invokeMethod(picker, "selectRowInComponentAnimated", Q_ARG(int, row), Q_ARG(int, 0), Q_ARG(bool, false));
+            invokeByName(picker, kZafPickerSelectRowMethod, Q_ARG(int, row), Q_ARG(int, 0), Q_ARG(bool, false));
         return;
     }
 }
@@ -497,10 +513,8 @@ void ZafYouTubeActivity::cancelFromOverlay()
     if (!agent)
         return;
     // The agent's Cancel stops its sign-in or upload and then reports the Cancel to us.
-    if (!QMetaObject::invokeMethod(agent, "cancelAction")) {
-        zaf::log::error(lcYouTubeActivity(), QStringLiteral("ZafYouTubeActivity: the publishing agent has no cancelAction"));
+    if (!invokeByName(agent, kZafAgentCancelMethod))
         publishingAgentCancelButtonClicked(agent);
-    }
 }
 
 void ZafYouTubeActivity::removeMovieCopy() const

@@ -27,7 +27,7 @@ ZafYouTubeTextCell::ZafYouTubeTextCell(QWidget *parent) : QPlainTextEdit(parent)
 
 ZafYouTubeFormTable::ZafYouTubeFormTable(QWidget *parent) : QTableWidget(RowCount, 1, parent)
 {
-    setObjectName(QStringLiteral("_table"));
+    setObjectName(QString::fromLatin1(kZafFormTableProperty));
     horizontalHeader()->setVisible(false);
     horizontalHeader()->setStretchLastSection(true);
     setVerticalHeaderLabels({tr("Title"), tr("Description"), tr("Category"), tr("Privacy")});
@@ -44,7 +44,7 @@ QObject *ZafYouTubeFormTable::cellForRowInSection(int row, int section) const
 
 ZafYouTubeCategoryPicker::ZafYouTubeCategoryPicker(QWidget *parent) : QListWidget(parent)
 {
-    setObjectName(QStringLiteral("_picker"));
+    setObjectName(QString::fromLatin1(kZafFormPickerProperty));
     setSelectionMode(QAbstractItemView::SingleSelection);
 }
 

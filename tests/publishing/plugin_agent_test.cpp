@@ -5,6 +5,7 @@
 #include "publishing/publishing_agent.h"
 #include "publishing/youtube_activity.h"
 #include "tests/publishing/sign_in_support.h"
+#include "tests/support/log_capture.h"
 #include "tests/support/temp_dir.h"
 #include "tests/support/wait_until.h"
 
@@ -164,6 +165,21 @@ TEST(PublishingPluginTest, AReplacedDefaultCategoryRoutineRunsForEveryLaterForm)
     auto agent = makeAgent();
     EXPECT_EQ(invokeForString(formOf(agent.get()), "categoryId"), QStringLiteral("22"));
     EXPECT_EQ(calls, 2);
+}
+
+// A form that lacks what the activity reaches by name (a renamed method, a missing property) is
+// told in the log, and what can still be done is done.
+TEST(PublishingPluginTest, AFormMissingANamedMemberIsLoggedNotSilent)
+{
+    QObject form;
+    form.setProperty(kZafFormCategoriesProperty, QVariantList{QVariantMap{{kZafPublishingCategoryIdKey, QStringLiteral("20")},
+                                                                          {kZafPublishingCategoryLabelKey, QStringLiteral("Gaming")}}});
+    zaf::test::LogCapture log;
+    ZafYouTubeActivity::selectDefaultCategoryOfForm(&form);
+    EXPECT_EQ(form.property(kZafFormDefaultCategoryProperty).toString(), QStringLiteral("20"));
+    EXPECT_EQ(log.messages(QStringLiteral("zaf.publishing.activity")),
+              (QStringList{QStringLiteral("the publishing form has no _picker"),
+                           QStringLiteral("the publishing form does not answer _categoryCell on QObject")}));
 }
 
 TEST_F(PublishingAgentTest, DisplayDoneAndCancelCallTheDelegate)

@@ -223,8 +223,9 @@ TEST_P(PublishingTheCopy, EndsWithTheSuccessAlertTheWholeCopyUploadedAndTheCopyR
 
     EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
     EXPECT_EQ(fileDigest(prepared.movie), prepared.recorded);
-    if (interruptedTwice)
+    if (interruptedTwice) {
         EXPECT_EQ(server.count(QStringLiteral("PUT"), true), 2) << "a status query after each drop";
+    }
     EXPECT_TRUE(prepared.finishes.isEmpty());
     QAbstractButton *close = buttonWithText(alert->buttons(), tableText("CLOSE"));
     ASSERT_NE(close, nullptr);
