@@ -1,6 +1,5 @@
 #include "platform/media/export/export_video_splicer.h"
 
-#include "platform/log.h"
 #include "platform/media/export/export_video_encoder.h"
 #include "platform/media/export/h264_bitstream.h"
 

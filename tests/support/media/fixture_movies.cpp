@@ -4,12 +4,10 @@
 #include "tools/fixture/frame_pattern.h"
 
 #include <QCoreApplication>
-#include <QDeadlineTimer>
 #include <QDir>
 #include <QFileInfo>
 #include <QJsonArray>
 #include <QJsonDocument>
-#include <QTemporaryDir>
 
 #include <gtest/gtest.h>
 
@@ -17,9 +15,7 @@
 #include <atomic>
 #include <cmath>
 #include <cstring>
-#include <map>
 #include <functional>
-#include <tuple>
 
 #include <unistd.h>
 
