@@ -117,7 +117,7 @@ struct BackdropView::Private {
     bool drawingMasks = false;  // mask views paint only into the masks, never on screen
 };
 
-BackdropView::BackdropView(int style, QWidget *parent) : QWidget(parent), d(new Private)
+BackdropView::BackdropView(int style, QWidget *parent) : QWidget(parent), d(std::make_unique<Private>())
 {
     d->style = style;
     setAttribute(Qt::WA_NoSystemBackground);
@@ -134,7 +134,6 @@ BackdropView::~BackdropView()
         if (dynamic_cast<MaskViewEffect *>(view->graphicsEffect()))
             view->setGraphicsEffect(nullptr);
     }
-    delete d;
 }
 
 int BackdropView::style() const

@@ -20,6 +20,8 @@
 #include <QPointer>
 #include <QWidget>
 
+#include <memory>
+
 class QPainter;
 
 namespace zaf::ui {
@@ -58,7 +60,7 @@ private:
     QPoint positionOf(const QWidget *view) const;
     QPixmap grabMask(QWidget *view);
     struct Private;
-    Private *d;
+    std::unique_ptr<Private> d;
 };
 
 } // namespace zaf::ui

@@ -214,7 +214,7 @@ struct Toolbar::Private {
     QVBoxLayout *layout = nullptr;
 };
 
-Toolbar::Toolbar(QWidget *parent) : QWidget(parent), d(new Private)
+Toolbar::Toolbar(QWidget *parent) : QWidget(parent), d(std::make_unique<Private>())
 {
     d->layout = new QVBoxLayout(this);
     d->layout->setContentsMargins(0, 0, 0, 0);
@@ -230,7 +230,6 @@ Toolbar::~Toolbar()
         if (auto *host = dynamic_cast<CustomHost *>(widget.data()))
             host->release();
     }
-    delete d;
 }
 
 void Toolbar::setItems(const QList<BarButtonItem *> &items, bool animated)

@@ -10,6 +10,8 @@
 #include <QList>
 #include <QWidget>
 
+#include <memory>
+
 namespace zaf::ui {
 
 class BarButtonItem;
@@ -43,7 +45,7 @@ protected:
 private:
     void itemChanged(BarButtonItem *item);
     struct Private;
-    Private *d;
+    std::unique_ptr<Private> d;
 };
 
 } // namespace zaf::ui

@@ -43,7 +43,7 @@ struct ViewController::Private {
     QPointer<QDialog> presentationWindow;
 };
 
-ViewController::ViewController(QObject *parent) : QObject(parent), d(new Private)
+ViewController::ViewController(QObject *parent) : QObject(parent), d(std::make_unique<Private>())
 {
 }
 
@@ -74,7 +74,6 @@ ViewController::~ViewController()
     }
     // The controller owns its view (and with it the view's subviews).
     delete d->view.data();
-    delete d;
 }
 
 QWidget *ViewController::view()

@@ -25,6 +25,7 @@
 #include <QSizeF>
 
 #include <functional>
+#include <memory>
 
 class QWidget;
 
@@ -118,7 +119,7 @@ protected:
 
 private:
     struct Private;
-    Private *d;
+    std::unique_ptr<Private> d;
 };
 
 } // namespace zaf::ui

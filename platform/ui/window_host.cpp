@@ -15,7 +15,7 @@ struct WindowHost::Private {
     std::function<void()> closeHandler;
 };
 
-WindowHost::WindowHost(ViewController *root, QWidget *parent) : QWidget(parent, Qt::Window), d(new Private)
+WindowHost::WindowHost(ViewController *root, QWidget *parent) : QWidget(parent, Qt::Window), d(std::make_unique<Private>())
 {
     d->root = root;
     if (root) {
@@ -39,7 +39,6 @@ WindowHost::~WindowHost()
         d->root->view()->hide();
         d->root->view()->setParent(nullptr);
     }
-    delete d;
 }
 
 ViewController *WindowHost::rootViewController() const

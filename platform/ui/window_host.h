@@ -17,6 +17,7 @@
 #include <QWidget>
 
 #include <functional>
+#include <memory>
 
 namespace zaf::ui {
 
@@ -46,7 +47,7 @@ protected:
 private:
     bool belongsToThisWindow(ViewController *controller) const;
     struct Private;
-    Private *d;
+    std::unique_ptr<Private> d;
 };
 
 } // namespace zaf::ui
