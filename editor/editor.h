@@ -115,9 +115,10 @@ public:
     // The "status" observation of the current player item.
     void observeValueForKeyPathOfObjectChangeContext(const QString &keyPath, QObject *object,
                                                      const QVariantMap &change, void *context);
-    Q_INVOKABLE void itemDidFinishPlaying(QObject *notificationObject);
+    void itemDidFinishPlaying(QObject *notificationObject);
+    // Reached by name too: the overlay play button's target-action.
     Q_INVOKABLE void playAction();
-    Q_INVOKABLE void pauseAction();
+    void pauseAction();
     void reloadMvLayerWithURL(const QUrl &url);
     // The current item failed to load, or holds no picture (unplayable movie file).
     bool currentItemIsUnplayable() const;
@@ -129,6 +130,7 @@ public:
     QSizeF getVideoSize() const;
 
     // --- Preview and edit modes ---
+    // Reached by name: the tap gesture recognizer's target-action.
     Q_INVOKABLE void handleSingleTap(QObject *recognizer);
     void configureReplayUIHidden();
     void showUI();
@@ -143,7 +145,7 @@ public:
     // with the first free counter after it ("-2", "-3", ...).
     QUrl freeTrimFileURL() const;
     void trimVideo();
-    Q_INVOKABLE void undoAction();
+    void undoAction();
     void movieScrubberValueDidChange(zaf::ui::MovieScrubber *scrubber, double value) override;
     void movieScrubberDidBeginScrubbingWithHandle(zaf::ui::MovieScrubber *scrubber, zaf::ui::MovieScrubberHandle handle) override;
     void movieScrubberDidEndScrubbingWithHandle(zaf::ui::MovieScrubber *scrubber, zaf::ui::MovieScrubberHandle handle) override;
@@ -174,11 +176,11 @@ public:
     void refreshMvRotation();
 
     // --- Save and done ---
-    Q_INVOKABLE void saveAction();
-    Q_INVOKABLE void doneAction();
+    void saveAction();
+    void doneAction();
 
     // --- Share ---
-    Q_INVOKABLE void shareAction();
+    void shareAction();
     void displayShareSheetWithVideoURL(const QUrl &url);
     // The share sheet's completion (main thread): the sheet is down, and a completed activity's
     // type is recorded for the report.
@@ -192,9 +194,10 @@ public:
     // extension is not installed and the publishing plug-in is there.
     static bool offersPublishingActivity();
 
-    // --- Data model: plain getters and setters, no side effects ---
+    // --- Data model: plain getters, no side effects ---
+    // The editor's state flags, edit range and files change only through its own operations, so
+    // they have no public setters; the host-facing properties below keep theirs.
     QUrl videoURL() const { return m_videoURL; }
-    void setVideoURL(const QUrl &url) { m_videoURL = url; }
     zaf::media::Player *mvPlayer() const { return m_mvPlayer.get(); }
     zaf::media::PlayerLayer *mvPlayerLayer() const { return m_mvPlayerLayer; }
     std::shared_ptr<zaf::media::PlayerItem> mvPlayerItem() const { return m_mvPlayerItem; }
@@ -207,19 +210,12 @@ public:
     void setBundleIdentifier(const QString &identifier) { m_bundleIdentifier = identifier; }
     zaf::media::TimeObserverToken timeObserver() const { return m_timeObserver; }
     bool isExporting() const { return m_exporting; }
-    void setExporting(bool v) { m_exporting = v; }
     bool isScrubbing() const { return m_scrubbing; }
-    void setScrubbing(bool v) { m_scrubbing = v; }
     bool isTrimming() const { return m_trimming; }
-    void setTrimming(bool v) { m_trimming = v; }
     bool isPadMode() const { return m_padMode; }
-    void setPadMode(bool v) { m_padMode = v; }
     bool isIntroMode() const { return m_introMode; }
-    void setIntroMode(bool v) { m_introMode = v; }
     bool isUIHidden() const { return m_uiHidden; }
-    void setUiHidden(bool v) { m_uiHidden = v; }
     bool isShareSheetUp() const { return m_shareSheetUp; }
-    void setShareSheetUp(bool v) { m_shareSheetUp = v; }
     zaf::ui::Toolbar *bottomToolBar() const { return m_bottomToolBar; }
     zaf::ui::Toolbar *topToolBar() const { return m_topToolBar; }
     zaf::ui::BarButtonItem *shareButton() const { return m_shareButton; }
@@ -238,11 +234,8 @@ public:
     QWidget *videoOverlay() const { return m_videoOverlay; }
     QLabel *titleLabel() const { return m_titleLabel; }
     double editStartTime() const { return m_editStartTime; }
-    void setEditStartTime(double v) { m_editStartTime = v; }
     double editEndTime() const { return m_editEndTime; }
-    void setEditEndTime(double v) { m_editEndTime = v; }
     QUrl trimFilePath() const { return m_trimFilePath; }
-    void setTrimFilePath(const QUrl &url) { m_trimFilePath = url; }
     QUrl originalVideoURL() const { return m_originalVideoURL; }
     std::shared_ptr<zaf::media::ExportSession> exportSession() const { return m_exportSession; }
     zaf::ui::MovieScrubber *mvTrimmer() const { return m_mvTrimmer; }
@@ -251,7 +244,6 @@ public:
     const std::optional<QHash<double, QImage>> &cachedTimeStamps() const { return m_cachedTimeStamps; }
     const QStringList &activityTypes() const { return m_activityTypes; }
     bool hasEdit() const { return m_hasEdit; }
-    void setHasEdit(bool v) { m_hasEdit = v; }
     bool hasHomeButton() const { return m_hasHomeButton; }
     QObject *delegate() const { return m_delegate.data(); }
     // Must implement ZafVideoEditorViewControllerDelegate; kept weakly.

@@ -211,17 +211,17 @@ QLabel *ZafVideoEditorViewController::makeTitleLabel()
 
 void ZafVideoEditorViewController::createBarButtonItems()
 {
-    m_shareButton = new BarButtonItem(SystemItem::Action, this, "shareAction", this);
-    m_undoButton = new BarButtonItem(SystemItem::Undo, this, "undoAction", this);
-    m_pauseButton = new BarButtonItem(SystemItem::Pause, this, "pauseAction", this);
-    m_playButton = new BarButtonItem(SystemItem::Play, this, "playAction", this);
-    m_doneButton = new BarButtonItem(SystemItem::Done, this, "doneAction", this);
-    m_saveButton = new BarButtonItem(SystemItem::Save, this, "saveAction", this);
-    m_cancelButton = new BarButtonItem(SystemItem::Cancel, this, "doneAction", this);
-    m_cancelTrimButton = new BarButtonItem(SystemItem::Cancel, this, "undoAction", this);
-    m_trimButton = new BarButtonItem(SystemItem::Done, this, "saveAction", this);
-    m_flexSpace = new BarButtonItem(SystemItem::FlexibleSpace, nullptr, QByteArray(), this);
-    m_fixSpace = new BarButtonItem(SystemItem::FixedSpace, nullptr, QByteArray(), this);
+    m_shareButton = new BarButtonItem(SystemItem::Action, this, &ZafVideoEditorViewController::shareAction, this);
+    m_undoButton = new BarButtonItem(SystemItem::Undo, this, &ZafVideoEditorViewController::undoAction, this);
+    m_pauseButton = new BarButtonItem(SystemItem::Pause, this, &ZafVideoEditorViewController::pauseAction, this);
+    m_playButton = new BarButtonItem(SystemItem::Play, this, &ZafVideoEditorViewController::playAction, this);
+    m_doneButton = new BarButtonItem(SystemItem::Done, this, &ZafVideoEditorViewController::doneAction, this);
+    m_saveButton = new BarButtonItem(SystemItem::Save, this, &ZafVideoEditorViewController::saveAction, this);
+    m_cancelButton = new BarButtonItem(SystemItem::Cancel, this, &ZafVideoEditorViewController::doneAction, this);
+    m_cancelTrimButton = new BarButtonItem(SystemItem::Cancel, this, &ZafVideoEditorViewController::undoAction, this);
+    m_trimButton = new BarButtonItem(SystemItem::Done, this, &ZafVideoEditorViewController::saveAction, this);
+    m_flexSpace = new BarButtonItem(SystemItem::FlexibleSpace, this);
+    m_fixSpace = new BarButtonItem(SystemItem::FixedSpace, this);
 
     // Tooltips say what each item does and its key.
     m_shareButton->setToolTip(tr("Share"));

@@ -90,12 +90,10 @@ struct BarButtonItem::Private {
     TargetAction targetAction;
 };
 
-BarButtonItem::BarButtonItem(SystemItem kind, QObject *target, const QByteArray &action, QObject *parent)
-    : QObject(parent), d(new Private)
+BarButtonItem::BarButtonItem(SystemItem kind, QObject *parent) : QObject(parent), d(std::make_unique<Private>())
 {
     d->system = true;
     d->kind = kind;
-    d->targetAction.set(target, action);
     d->title = standardTitle(kind);
     d->toolTip = d->title;
     if (isIconKind(kind))
@@ -106,11 +104,18 @@ BarButtonItem::BarButtonItem(SystemItem kind, QObject *target, const QByteArray 
         d->action->setToolTip(d->toolTip);
         if (!d->icon.isNull())
             d->action->setIcon(d->icon);
-        connect(d->action, &QAction::triggered, this, [this] { d->targetAction.send(this); });
     }
 }
 
-BarButtonItem::BarButtonItem(QWidget *customView, QObject *parent) : QObject(parent), d(new Private)
+BarButtonItem::BarButtonItem(SystemItem kind, QObject *target, const QByteArray &action, QObject *parent)
+    : BarButtonItem(kind, parent)
+{
+    d->targetAction.set(target, action);
+    if (d->action)
+        connect(d->action, &QAction::triggered, this, [this] { d->targetAction.send(this); });
+}
+
+BarButtonItem::BarButtonItem(QWidget *customView, QObject *parent) : QObject(parent), d(std::make_unique<Private>())
 {
     d->customView = customView;
     if (customView)
@@ -122,7 +127,6 @@ BarButtonItem::~BarButtonItem()
     // A custom view that no toolbar holds any more is the item's to delete.
     if (d->customView && !d->customView->parentWidget())
         delete d->customView.data();
-    delete d;
 }
 
 bool BarButtonItem::isSystemItem() const

@@ -2,15 +2,21 @@
 
 // BarButtonItem: one item of a toolbar, made from a system kind (with the desktop's themed icon and
 // Qt's own translated standard texts), from a custom widget, or a flexible/fixed space.
-// Target-action as in target_action.h. Main thread only.
+//
+// A system item that is not a space carries a QAction; its action is a member function connected
+// to that QAction's triggered() signal, checked by the compiler. The by-name target-action form of
+// target_action.h stays as an adapter for callers that only know a method's name (a plug-in's
+// object reached across the plug-in boundary). Main thread only.
 
 #include "platform/ui/target_action.h"
 
+#include <QAction>
 #include <QObject>
 #include <QPointer>
 #include <QString>
 
-class QAction;
+#include <memory>
+
 class QIcon;
 class QWidget;
 
@@ -29,7 +35,19 @@ struct EdgeInsets {
 class BarButtonItem : public QObject {
     Q_OBJECT
 public:
-    // A system item; target and action may be null/empty (spaces have none).
+    // A system item with nothing to call (spaces, or an item whose action() is connected later).
+    explicit BarButtonItem(SystemItem kind, QObject *parent = nullptr);
+    // A system item that calls receiver->method() on the main thread each time it is triggered.
+    // The connection ends when the receiver is destroyed; the item never keeps it alive.
+    template <typename Receiver>
+    BarButtonItem(SystemItem kind, Receiver *receiver, void (Receiver::*method)(), QObject *parent = nullptr)
+        : BarButtonItem(kind, parent)
+    {
+        if (QAction *triggering = action())
+            QObject::connect(triggering, &QAction::triggered, receiver, method);
+    }
+    // Target-action adapter: calls the method named `action` on `target` (held weakly), as in
+    // target_action.h.
     BarButtonItem(SystemItem kind, QObject *target, const QByteArray &action, QObject *parent = nullptr);
     // An item showing a custom widget (the item does not own it until it is placed on a toolbar).
     BarButtonItem(QWidget *customView, QObject *parent = nullptr);
@@ -71,7 +89,7 @@ Q_SIGNALS:
 
 private:
     struct Private;
-    Private *d;
+    std::unique_ptr<Private> d;
 };
 
 } // namespace zaf::ui

@@ -203,6 +203,22 @@ TEST(BarButtonItemTest, SystemKindsHaveStandardTextsIconsAndAccessibleNames)
     EXPECT_EQ(space.action(), nullptr);
 }
 
+// A member-function item calls its receiver, and stops calling it once the receiver is gone.
+TEST(BarButtonItemTest, MemberFunctionActionReachesItsReceiverWhileItLives)
+{
+    struct Receiver : QObject {
+        int calls = 0;
+        void act() { ++calls; }
+    };
+    auto receiver = std::make_unique<Receiver>();
+    BarButtonItem item(SystemItem::Save, receiver.get(), &Receiver::act);
+    item.trigger();
+    item.action()->trigger();
+    EXPECT_EQ(receiver->calls, 2);
+    receiver.reset();
+    item.trigger();
+}
+
 TEST_F(ToolbarTest, ClickingAButtonSendsTheActionEvenWhenItReplacesTheItems)
 {
     onPlay = [&] { top->setItems({&flex, &save}); };
