@@ -55,7 +55,6 @@ TEST_F(EditorTest, RotationMovesTheTimelineAndRebuildsTheItemsForTheNewLayout)
     auto editor = makeEditor(noMovie());
     QWidget *container = editor->scrubberContainterView();
     EXPECT_EQ(container->geometry(), QRect(0, 700 - 44 - 38, 400, 38));
-    editor->setIntroMode(false);
     editor->playAction();
 
     rotate(*editor, 900, 500);
@@ -64,7 +63,7 @@ TEST_F(EditorTest, RotationMovesTheTimelineAndRebuildsTheItemsForTheNewLayout)
     EXPECT_EQ(container->geometry(), QRect(0, 500 - 38, 900, 38));
     EXPECT_EQ(itemNames(*editor, editor->topToolBar()), words("cancel flex title flex play fix share fix save"));
 
-    editor->setTrimming(true);
+    editor->movieScrubberDidBeginEditing(editor->mvTrimmer());
     rotate(*editor, 400, 700);
     EXPECT_FALSE(editor->isPadMode());
     EXPECT_EQ(ui::superview(editor->bottomToolBar()), editor->view());

@@ -31,9 +31,7 @@ protected:
 TEST_F(EditorPlaybackTest, TrimmedPlaybackStartsAtTheRangeStartAndPausesAtItsEnd)
 {
     auto e = ready(movie(12));
-    e->setTrimming(true);
-    e->setEditStartTime(5);
-    e->setEditEndTime(10);
+    selectRange(*e, 5, 10);
     e->playAction();
     spin();
     EXPECT_NEAR(e->mvPlayer()->currentTime().seconds(), 5.0, 1e-6);
@@ -81,7 +79,8 @@ TEST_F(EditorPlaybackTest, ReadinessSetsUpTheTimelineWhosePlayheadFollowsPlaybac
     run(1.0);
     EXPECT_NEAR(e->mvTrimmer()->value(), e->mvPlayer()->currentTime().seconds(), 0.05);
     EXPECT_GT(e->mvTrimmer()->value(), 0.9);
-    e->setScrubbing(true);
+    e->movieScrubberDidBeginScrubbingWithHandle(e->mvTrimmer(), ui::MovieScrubberHandle::Playhead);
+    EXPECT_TRUE(e->isScrubbing());
     e->mvTrimmer()->setValue(0.2);
     run(0.5);
     EXPECT_EQ(e->mvTrimmer()->value(), 0.2);

@@ -73,17 +73,6 @@ TEST_F(EditorSaveTest, CompletedShareComesBeforeTheSaveInTheReport)
     EXPECT_EQ(delegate.reports.first(), (QStringList{QStringLiteral("com.zafrel.activity.Mail"), kSave}));
 }
 
-TEST_F(EditorSaveTest, WithTheShareSheetUpSaveAndDoneDoNothing)
-{
-    auto e = open(movie(1));
-    e->setShareSheetUp(true);
-    e->saveAction();
-    e->doneAction();
-    spin(300);
-    EXPECT_TRUE(delegate.reports.isEmpty());
-    EXPECT_TRUE(e->activityTypes().isEmpty());
-}
-
 // Saves that meet a fault: a library that cannot be made (a file where its parent folder should
 // be), a library on a read-only volume, a temporary directory that fills up while the mix writes.
 // The editor still finishes with the save reported and the error logged; the host's movie is kept

@@ -132,6 +132,8 @@ TEST_F(EditorShareTest, SheetOffersPublishingRightAfterMailExcludesCopyAndCancel
 {
     installPlugin();
     auto e = makeEditor(movie(1));
+    RecordingDelegate delegate;
+    e->setDelegate(&delegate);
     e->shareAction();
     ui::ShareSheet *sheet = presentedSheet(*e);
     ASSERT_NE(sheet, nullptr);
@@ -143,8 +145,11 @@ TEST_F(EditorShareTest, SheetOffersPublishingRightAfterMailExcludesCopyAndCancel
     EXPECT_EQ(types.at(1), QStringLiteral("ZafPublishToYouTube")) << "the message type has no performer here";
     EXPECT_EQ(itemNames(*e, e->topToolBar()), words("done flex title flex save"));
 
+    // With the sheet up, save and done do nothing.
     e->saveAction();
     e->doneAction();
+    spin(300);
+    EXPECT_TRUE(delegate.reports.isEmpty());
     sheet->cancelButton()->click();
     spin(100);
     EXPECT_FALSE(e->isShareSheetUp());

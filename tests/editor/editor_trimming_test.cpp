@@ -147,38 +147,5 @@ TEST_F(EditorTest, DestroyingTheEditorDuringItsTrimExportStopsItAndLeavesTheDire
     }
 }
 
-// A completion of an older trim export that ends after a newer one began changes nothing: the
-// editor shows the newer trim.
-TEST_F(EditorTest, CompletionOfAnOlderTrimExportIsIgnoredOnceANewerOneBegan)
-{
-    // One group of pictures for the whole movie: a trim that starts after its keyframe re-encodes
-    // every kept picture, so the older export is still running when the newer one begins.
-    auto e = ready(makeFixtureMovie(scratch.path(), {.seconds = 10, .gop = 300}));
-    selectRange(*e, 0.5, 10);
-    // The two exports must not share a name (the older would fail): the older takes a counter.
-    const QString plainName = e->trimFileURL().toLocalFile();
-    QFile placeholder(plainName);
-    ASSERT_TRUE(placeholder.open(QIODevice::WriteOnly));
-    e->trimButton()->trigger();
-    const auto older = e->exportSession();
-    ASSERT_TRUE(placeholder.remove());
-    e->setExporting(false); // as if the older one had ended: a newer trim may start
-    selectRange(*e, 2, 3);
-    e->trimButton()->trigger();
-    const auto newer = e->exportSession();
-    ASSERT_TRUE(older && newer && older != newer);
-    ASSERT_NE(older->outputURL(), newer->outputURL());
-    const auto ended = [](const std::shared_ptr<media::ExportSession> &s) {
-        return s->status() == media::ExportStatus::Completed || s->status() == media::ExportStatus::Failed
-            || s->status() == media::ExportStatus::Cancelled;
-    };
-    ASSERT_TRUE(waitUntil([&] { return ended(older) && ended(newer) && !e->isExporting(); }, 60000));
-    spin(200);
-    EXPECT_EQ(older->status(), media::ExportStatus::Completed) << "the older export's completion was exercised";
-    EXPECT_EQ(e->videoURL(), newer->outputURL());
-    ASSERT_TRUE(waitUntilReady(*e));
-    EXPECT_NEAR(e->editEndTime(), 1.0, 0.05);
-}
-
 } // namespace
 } // namespace zaf::test
