@@ -6,6 +6,12 @@
 //
 // Threads: every function may be called from any thread; bundles are immutable once opened (their
 // tables are read on first use under a lock).
+//
+// A bundle reads its desktop entries through desktop_entry.h and picks its localization through
+// localization_matching.h; the latter's functions (the user's languages, the order of localizations)
+// are part of this API and come with this header.
+
+#include "platform/bundle/localization_matching.h"
 
 #include <QString>
 #include <QStringList>
@@ -62,25 +68,16 @@ public:
     // resource directory.
     QString localizedStringForKey(const QString &key, const QString &value, const QString &table) const;
 
+    ~Bundle();
+    Bundle(const Bundle &) = delete;
+    Bundle &operator=(const Bundle &) = delete;
+
 private:
-    Bundle() = default;
+    Bundle();
     struct Private;
-    std::shared_ptr<Private> d;
+    std::unique_ptr<Private> d;
 };
 
-// The localization the texts are written in before translation.
-inline constexpr const char *kDevelopmentLocalization = "en";
-
-// The user's preferred languages, best first, as BCP 47 tags ("de-CH", "en"): QLocale::uiLanguages
-// (which honours LANGUAGE and LANG); the C and POSIX locales count as the development language.
-QStringList preferredLanguages();
-// Tests only: makes preferredLanguages() return `languages` instead (an empty list restores the
-// system's). Qt reads LANG once per process, so tests cannot switch languages through it.
-void setPreferredLanguagesForTesting(const QStringList &languages);
-// The localizations ordered by how well they serve the preferences (ICU's LocaleMatcher), best
-// first; localizations that serve no preference follow, the development localization first and the
-// others in their given order.
-QStringList preferredLocalizationsFromArray(const QStringList &localizations, const QStringList &preferences);
 // The executable of a running process: /proc/PID/exe read into a 4096-byte buffer. Returns the
 // length in bytes of the UTF-8 path decoded into `path` (0 when it cannot be read or does not fit the
 // buffer). `path` may be null.
