@@ -1,6 +1,7 @@
 #include "tests/support/temp_dir.h"
 
 #include <QCryptographicHash>
+#include <QDir>
 #include <QFile>
 
 #include <fcntl.h>
@@ -17,6 +18,17 @@ QString ScratchDir::write(const QString &name, qint64 bytes) const
     if (f.open(QIODevice::WriteOnly))
         f.write(QByteArray(int(bytes), 'z'));
     return path;
+}
+
+QStringList entryNames(const QString &directory)
+{
+    return QDir(directory).entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot, QDir::Name);
+}
+
+QByteArray fileContents(const QString &path)
+{
+    QFile f(path);
+    return f.open(QIODevice::ReadOnly) ? f.readAll() : QByteArray();
 }
 
 QByteArray fileDigest(const QString &path)

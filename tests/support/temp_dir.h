@@ -3,6 +3,7 @@
 // A private scratch directory for one test, removed with everything in it afterwards.
 
 #include <QString>
+#include <QStringList>
 #include <QTemporaryDir>
 
 namespace zaf::test {
@@ -20,6 +21,12 @@ public:
 private:
     QTemporaryDir m_dir;
 };
+
+// Every name in a directory, hidden ones too (so a temporary left behind shows), sorted.
+QStringList entryNames(const QString &directory);
+
+// A file's bytes; empty when it cannot be read.
+QByteArray fileContents(const QString &path);
 
 // SHA-256 of a file's bytes, to tell that a user's movie came through a fault untouched; empty
 // when the file cannot be read.

@@ -4,6 +4,7 @@
 // and never sleep.
 #include "platform/media/playback/playback_audio_ring.h"
 #include "platform/media/playback/playback_frame_queue.h"
+#include "tests/support/named_cases.h"
 
 #include <gtest/gtest.h>
 
@@ -40,13 +41,7 @@ std::function<bool()> giveUpAfter(int falseCalls)
     return [calls = 0, falseCalls]() mutable { return calls++ >= falseCalls; };
 }
 
-// The cases below print as their names.
-template <typename Case>
-    requires requires(Case c) { c.name; }
-void PrintTo(const Case &c, std::ostream *os)
-{
-    *os << c.name;
-}
+ZAF_PRINT_CASES_AS_NAMES
 
 // --- AudioRing: writes and reads on one thread, against a model of the bytes held -------------------
 
@@ -94,7 +89,7 @@ INSTANTIATE_TEST_SUITE_P(
                       RingCase{"WriteWrapsPastTheEnd", {{48, 40}, {40, 0}, {0, kRing}}},
                       RingCase{"ReadWrapsPastTheEnd", {{60, 50}, {30, 25}, {0, 15}}},
                       RingCase{"ManyLaps", {{50, 33}, {33, 41}, {41, 47}, {47, 49}, {50, 63}, {0, kRing}}}),
-    [](const auto &info) { return std::string(info.param.name); });
+    test::caseName);
 
 TEST(AudioRing, IsNeverSmallerThan64Bytes)
 {
@@ -187,7 +182,7 @@ INSTANTIATE_TEST_SUITE_P(
                                       ring.read(out, kRing);
                                   },
                                   true, 100 - kRing}),
-    [](const auto &info) { return std::string(info.param.name); });
+    test::caseName);
 
 // One producer and one consumer on their own threads, in chunk sizes that never line up with the
 // ring: every byte arrives once, in order.
@@ -254,7 +249,7 @@ INSTANTIATE_TEST_SUITE_P(
                       DueCase{"LastOfSeveralDue", {frame(100), frame(200), frame(300)}, 1, 250, 200, 1},
                       DueCase{"SeekResultDueAtOnce", {frame(500, 1, true), frame(600)}, 1, 0, 500, 1},
                       DueCase{"OtherGenerationDropped", {frame(100, 1), frame(200, 1)}, 2, 1000, std::nullopt, 0}),
-    [](const auto &info) { return std::string(info.param.name); });
+    test::caseName);
 
 TEST(FrameQueue, PushOfANewGenerationDropsTheOldOnesInsteadOfWaiting)
 {
@@ -314,7 +309,7 @@ INSTANTIATE_TEST_SUITE_P(
                       FrameReleaseCase{"ClearMakesRoom", [](FrameQueue &queue, std::atomic<bool> &) { queue.clear(); }, true, 1},
                       FrameReleaseCase{"TakeMakesRoom",
                                        [](FrameQueue &queue, std::atomic<bool> &) { queue.takeDue(1, 100); }, true, 2}),
-    [](const auto &info) { return std::string(info.param.name); });
+    test::caseName);
 
 // A decoder thread pushing into a small queue while the consumer takes whatever is due: the queue
 // never holds more than its bound, and the pictures come out in order, ending with the last.
