@@ -39,7 +39,7 @@ test: build
 SANITIZER_JOB_TESTS := media_asset_tests media_export_tests media_player_tests media_image_tests \
   media_writer_tests media_odd_size_tests audio_mix_utility_tests tools_tests \
   extensionkit_codec_tests extensionkit_channel_tests extensionkit_runtime_tests extension_tests host_tests \
-  bundle_tests store_lookup_tests photos_tests tempstore_tests platform_tests publishing_upload_tests \
+  bundle_tests store_lookup_tests photos_tests tempstore_tests platform_tests thread_rules_tests publishing_upload_tests \
   corpus_engine_tests corpus_editor_tests
 empty :=
 space := $(empty) $(empty)

@@ -5,6 +5,7 @@
 #include "platform/log.h"
 #include "platform/media/thumbnails/image_frame_source.h"
 #include "platform/media/media_asset.h"
+#include "platform/thread_rules.h"
 
 #include <QLoggingCategory>
 
@@ -211,6 +212,7 @@ void ImageGenerator::runQueue()
             OptionalError error = answer.error;
             if (result == Result::Failed && !error)
                 error = makeMediaError(kMediaErrorDecodeFailed, QStringLiteral("no picture"));
+            ZAF_ASSERT_WORKER_THREAD();
             batch.handler(time, answer.image, result == Result::Succeeded ? answer.actualTime : MediaTime::invalid(), result,
                           result == Result::Succeeded ? OptionalError() : error);
         }

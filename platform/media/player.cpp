@@ -8,6 +8,7 @@
 #include "platform/media/playback/playback_frame_queue.h"
 #include "platform/media/core/media_log.h"
 #include "platform/media/playback/playback_video_decoder.h"
+#include "platform/thread_rules.h"
 
 #include <QPointer>
 
@@ -45,6 +46,7 @@ Player::Player(std::shared_ptr<PlayerItem> item, QObject *parent)
     , m_item(std::move(item))
     , m_framesNotifyPending(std::make_shared<std::atomic<bool>>(false))
 {
+    ZAF_ASSERT_MAIN_THREAD();
     installTimeSource(std::make_shared<MonotonicTimeSource>());
     if (!m_item)
         return;
@@ -56,6 +58,7 @@ Player::Player(std::shared_ptr<PlayerItem> item, QObject *parent)
 
 Player::~Player()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     stopRunning(true);
     QObject::disconnect(m_sourceConnection);
     stopPipeline();
@@ -63,6 +66,7 @@ Player::~Player()
 
 void Player::itemStatusChanged()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (m_item->status() == PlayerItem::Status::Failed) {
         stopRunning(true);
         m_rate = 0;
@@ -153,6 +157,7 @@ void Player::installTimeSource(std::shared_ptr<TimeSource> source)
 
 void Player::setTimeSource(std::shared_ptr<TimeSource> source)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (source) {
         m_customTimeSource = true;
         installTimeSource(std::move(source));
@@ -174,6 +179,7 @@ void Player::audioFailed(const QString &message)
 
 void Player::framesReady()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     m_framesNotifyPending->store(false);
     presentDueFrame();
 }
@@ -217,6 +223,7 @@ void Player::stopRunning(bool keepTime)
 
 void Player::play()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (!m_item || m_item->status() == PlayerItem::Status::Failed) {
         zaf::log::info(lcPlayback(), QStringLiteral("play() ignored: the item cannot be played"));
         return;
@@ -231,6 +238,7 @@ void Player::play()
 
 void Player::pause()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (m_rate == 0)
         return;
     m_rate = 0;
@@ -242,6 +250,7 @@ void Player::pause()
 
 void Player::seekToTime(const MediaTime &time)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     std::int64_t ns = 0;
     if (!toNanoseconds(time, &ns)) {
         zaf::log::error(lcPlayback(), QStringLiteral("seek to %1 ignored: not a numeric time").arg(time.debugDescription()));
@@ -269,6 +278,7 @@ MediaTime Player::currentTime() const
 
 TimeObserverToken Player::addPeriodicTimeObserver(const MediaTime &interval, std::function<void(const MediaTime &)> block)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     std::int64_t ns = 0;
     if (!block || !toNanoseconds(interval, &ns) || ns <= 0) {
         zaf::log::error(lcPlayback(), QStringLiteral("periodic time observer refused: interval %1").arg(interval.debugDescription()));
@@ -281,6 +291,7 @@ TimeObserverToken Player::addPeriodicTimeObserver(const MediaTime &interval, std
 
 TimeObserverToken Player::addBoundaryTimeObserver(const QList<MediaTime> &times, std::function<void()> block)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     QList<std::int64_t> ns;
     for (const MediaTime &time : times) {
         std::int64_t value = 0;
@@ -299,12 +310,14 @@ TimeObserverToken Player::addBoundaryTimeObserver(const QList<MediaTime> &times,
 
 void Player::removeTimeObserver(TimeObserverToken token)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     m_periodic.erase(token);
     m_boundary.erase(token);
 }
 
 void Player::timeSourceAdvanced()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (m_running && !m_inStep)
         advanceTo(clockNs());
 }

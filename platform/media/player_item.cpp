@@ -5,6 +5,7 @@
 #include "platform/media/core/ffmpeg_ptr.h"
 #include "platform/media/core/media_log.h"
 #include "platform/media/player.h"
+#include "platform/thread_rules.h"
 
 namespace zaf::media {
 
@@ -13,6 +14,7 @@ PlayerItem::PlayerItem(std::shared_ptr<MediaAsset> asset, QObject *parent)
     : QObject(parent)
     , m_asset(std::move(asset))
 {
+    ZAF_ASSERT_MAIN_THREAD();
     QPointer<PlayerItem> self(this);
     if (!m_asset) {
         dispatch::main([self] {
@@ -34,6 +36,7 @@ PlayerItem::~PlayerItem() = default;
 
 void PlayerItem::finishLoading()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (m_status != Status::Unknown)
         return;
     if (!m_asset) {

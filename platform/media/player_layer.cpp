@@ -1,6 +1,7 @@
 #include "platform/media/player_layer.h"
 
 #include "platform/media/player.h"
+#include "platform/thread_rules.h"
 
 #include <QPainter>
 #include <QPaintEvent>
@@ -11,6 +12,7 @@ namespace zaf::media {
 PlayerLayer::PlayerLayer(QWidget *parent)
     : QWidget(parent)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     setAttribute(Qt::WA_OpaquePaintEvent);
 }
 
@@ -18,6 +20,7 @@ PlayerLayer::~PlayerLayer() = default;
 
 void PlayerLayer::setPlayer(Player *player)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (m_player == player)
         return;
     QObject::disconnect(m_frameConnection);

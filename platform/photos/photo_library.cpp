@@ -4,6 +4,7 @@
 #include "platform/dispatch.h"
 #include "platform/log.h"
 #include "platform/media/media_asset.h"
+#include "platform/thread_rules.h"
 
 #include <QDateTime>
 #include <QDir>
@@ -86,6 +87,7 @@ void PhotoLibrary::performChanges(ChangeBlock changes, Completion completion)
         }
         if (failure)
             log::error(lcPhotos(), QStringLiteral("cannot add the video to %1: %2").arg(m_directory, failure->message));
+        ZAF_ASSERT_WORKER_THREAD();
         if (completion)
             completion(!failure, failure);
     });

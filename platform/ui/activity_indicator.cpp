@@ -1,4 +1,5 @@
 #include "platform/ui/activity_indicator.h"
+#include "platform/thread_rules.h"
 
 #include <QPaintEvent>
 #include <QPainter>
@@ -13,6 +14,7 @@ namespace zaf::ui {
 ActivityIndicator::ActivityIndicator(int style, QWidget *parent)
     : QWidget(parent), m_style(style)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (m_style < LargeWhite || m_style > Gray)
         m_style = LargeWhite;
     setAttribute(Qt::WA_TranslucentBackground);
@@ -48,6 +50,7 @@ QSize ActivityIndicator::minimumSizeHint() const
 
 void ActivityIndicator::startAnimating()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (m_animating)
         return;
     m_animating = true;

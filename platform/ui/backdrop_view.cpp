@@ -1,4 +1,5 @@
 #include "platform/ui/backdrop_view.h"
+#include "platform/thread_rules.h"
 
 #include <QEvent>
 #include <QGraphicsEffect>
@@ -119,6 +120,7 @@ struct BackdropView::Private {
 
 BackdropView::BackdropView(int style, QWidget *parent) : QWidget(parent), d(std::make_unique<Private>())
 {
+    ZAF_ASSERT_MAIN_THREAD();
     d->style = style;
     setAttribute(Qt::WA_NoSystemBackground);
     d->refreshTimer.setInterval(kRefreshIntervalMs);

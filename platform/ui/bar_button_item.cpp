@@ -1,6 +1,7 @@
 #include "platform/ui/bar_button_item.h"
 
 #include "platform/ui/bundled_icons.h"
+#include "platform/thread_rules.h"
 
 #include <QAction>
 #include <QCoreApplication>
@@ -92,6 +93,7 @@ struct BarButtonItem::Private {
 
 BarButtonItem::BarButtonItem(SystemItem kind, QObject *parent) : QObject(parent), d(std::make_unique<Private>())
 {
+    ZAF_ASSERT_MAIN_THREAD();
     d->system = true;
     d->kind = kind;
     d->title = standardTitle(kind);
@@ -117,6 +119,7 @@ BarButtonItem::BarButtonItem(SystemItem kind, QObject *target, const QByteArray 
 
 BarButtonItem::BarButtonItem(QWidget *customView, QObject *parent) : QObject(parent), d(std::make_unique<Private>())
 {
+    ZAF_ASSERT_MAIN_THREAD();
     d->customView = customView;
     if (customView)
         d->title = customView->accessibleName();

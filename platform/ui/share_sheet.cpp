@@ -4,6 +4,7 @@
 #include "platform/ui/bar_button_item.h"
 #include "platform/ui/share_activities.h"
 #include "platform/ui/share_activity.h"
+#include "platform/thread_rules.h"
 
 #include <QAction>
 #include <QGridLayout>
@@ -51,6 +52,7 @@ QWidget *widgetOfItem(BarButtonItem *item)
 ShareSheet::ShareSheet(QVariantList activityItems, QList<ShareActivity *> applicationActivities, QObject *parent)
     : ViewController(parent), m_items(std::move(activityItems))
 {
+    ZAF_ASSERT_MAIN_THREAD();
     for (ShareActivity *activity : applicationActivities) {
         if (activity)
             m_applicationActivities.append(activity);
@@ -258,6 +260,7 @@ void ShareSheet::cancel()
 
 void ShareSheet::chooseActivity(ShareActivity *activity)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (!activity || m_done || m_chosen) {
         log::info(lcShare(), QStringLiteral("Activity choice ignored: the sheet is not waiting for one"));
         return;
@@ -310,6 +313,7 @@ void ShareSheet::chooseActivity(ShareActivity *activity)
 
 void ShareSheet::activityFinished(ShareActivity *activity, bool completed)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     disconnect(activity, nullptr, this, nullptr);
     if (activity != m_chosen)
         return;

@@ -1,4 +1,5 @@
 #include "platform/ui/tap_gesture_recognizer.h"
+#include "platform/thread_rules.h"
 
 #include <QApplication>
 #include <QMouseEvent>
@@ -9,6 +10,7 @@ namespace zaf::ui {
 TapGestureRecognizer::TapGestureRecognizer(QObject *target, const QByteArray &action, QObject *parent)
     : QObject(parent), m_targetAction(target, action)
 {
+    ZAF_ASSERT_MAIN_THREAD();
 }
 
 void TapGestureRecognizer::attachToView(QWidget *view)

@@ -1,4 +1,5 @@
 #include "platform/ui/target_action.h"
+#include "platform/thread_rules.h"
 
 #include <QMetaMethod>
 #include <QMetaObject>
@@ -30,6 +31,7 @@ bool TargetAction::targetRespondsToAction() const
 
 bool TargetAction::send(QObject *sender) const
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (!m_target || m_action.isEmpty())
         return false;
     bool takesSender;

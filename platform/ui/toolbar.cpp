@@ -1,6 +1,7 @@
 #include "platform/ui/toolbar.h"
 
 #include "platform/ui/bar_button_item.h"
+#include "platform/thread_rules.h"
 
 #include <QIcon>
 #include <QPainter>
@@ -216,6 +217,7 @@ struct Toolbar::Private {
 
 Toolbar::Toolbar(QWidget *parent) : QWidget(parent), d(std::make_unique<Private>())
 {
+    ZAF_ASSERT_MAIN_THREAD();
     d->layout = new QVBoxLayout(this);
     d->layout->setContentsMargins(0, 0, 0, 0);
     d->layout->setSpacing(0);
@@ -234,6 +236,7 @@ Toolbar::~Toolbar()
 
 void Toolbar::setItems(const QList<BarButtonItem *> &items, bool animated)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     // The change is immediate either way; `animated` exists for callers that ask for a transition.
     Q_UNUSED(animated);
 

@@ -2,6 +2,7 @@
 
 #include "platform/ui/layout_rules.h"
 #include "platform/ui/transition_coordinator.h"
+#include "platform/thread_rules.h"
 
 #include <QDialog>
 #include <QEvent>
@@ -45,6 +46,7 @@ struct ViewController::Private {
 
 ViewController::ViewController(QObject *parent) : QObject(parent), d(std::make_unique<Private>())
 {
+    ZAF_ASSERT_MAIN_THREAD();
 }
 
 ViewController::~ViewController()
@@ -78,6 +80,7 @@ ViewController::~ViewController()
 
 QWidget *ViewController::view()
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (!d->view && !d->loading) {
         d->loading = true;
         loadView();
@@ -157,6 +160,7 @@ void ViewController::layoutView()
 
 void ViewController::addChildViewController(ViewController *child)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (!child || child == this || child->d->parent == this)
         return;
     if (child->d->parent)
@@ -242,6 +246,7 @@ void ViewController::motionEnded(MotionSubtype subtype, const MotionEvent &event
 void ViewController::presentViewController(ViewController *controller, bool animated,
                                            std::function<void()> completion)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (!controller || controller == this)
         return;
     if (d->presented) {
@@ -285,6 +290,7 @@ void ViewController::presentViewController(ViewController *controller, bool anim
 
 void ViewController::dismissViewController(bool animated, std::function<void()> completion)
 {
+    ZAF_ASSERT_MAIN_THREAD();
     if (!d->presented) {
         if (d->presenting) {
             d->presenting->dismissViewController(animated, std::move(completion));

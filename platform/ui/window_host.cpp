@@ -2,6 +2,7 @@
 
 #include "platform/ui/transition_coordinator.h"
 #include "platform/ui/view_controller.h"
+#include "platform/thread_rules.h"
 
 #include <QApplication>
 #include <QCloseEvent>
@@ -17,6 +18,7 @@ struct WindowHost::Private {
 
 WindowHost::WindowHost(ViewController *root, QWidget *parent) : QWidget(parent, Qt::Window), d(std::make_unique<Private>())
 {
+    ZAF_ASSERT_MAIN_THREAD();
     d->root = root;
     if (root) {
         QWidget *view = root->view();
