@@ -60,14 +60,19 @@ std::shared_ptr<ExportSession> ZafAudioMixUtility::exportSessionForMixingAudio(c
         return nullptr;
     session->setOutputURL(outputURL);
     session->setOutputFileType(QLatin1String(kFileTypeMPEG4));
+    // Listing the tracks reads the movie, so it happens on the export's thread, not the caller's.
+    session->setAudioMixBuilder(&audioMixForAsset);
+    return session;
+}
 
+AudioMix ZafAudioMixUtility::audioMixForAsset(const MediaAsset &asset)
+{
     // Every audio track enters the mix at the default (unity) level: no volumes, no ramps. A movie
     // without audio gets an empty mix, and so an output without audio.
     AudioMix mix;
-    for (const AssetTrack &track : asset->tracksWithMediaType(MediaType::Audio))
+    for (const AssetTrack &track : asset.tracksWithMediaType(MediaType::Audio))
         mix.inputParameters.append(AudioMixInputParameters{track.trackID});
-    session->setAudioMix(mix);
-    return session;
+    return mix;
 }
 
 QUrl ZafAudioMixUtility::tempFileURL()

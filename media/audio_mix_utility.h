@@ -16,6 +16,8 @@
 
 namespace zaf::media {
 class ExportSession;
+class MediaAsset;
+struct AudioMix;
 }
 
 Q_DECLARE_LOGGING_CATEGORY(lcAudioMix)
@@ -38,10 +40,13 @@ public:
     static QUrl tempFileURLForTime(double secondsSince1970);
 
     // The export that the mix runs: the whole movie at the highest-quality preset into an MPEG-4
-    // file at outputURL, with one audio-mix input per audio track of the movie, in track order.
-    // None when no session can be made for the movie.
+    // file at outputURL, with the mix of audioMixForAsset. None when no session can be made for the
+    // movie. Reads nothing: the tracks are listed on the export's thread when it starts.
     static std::shared_ptr<zaf::media::ExportSession> exportSessionForMixingAudio(const QUrl &movieURL,
                                                                                  const QUrl &outputURL);
+    // One audio-mix input per audio track of the movie, in track order. Reads the movie's header
+    // when the asset is not loaded yet, so it belongs on a worker thread.
+    static zaf::media::AudioMix audioMixForAsset(const zaf::media::MediaAsset &asset);
 
     ZafAudioMixUtility() = delete;
 };

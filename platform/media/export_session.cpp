@@ -5,6 +5,7 @@
 #include "platform/media/export/export_common.h"
 #include "platform/media/export/export_output_file.h"
 #include "platform/media/export/export_pipeline.h"
+#include "platform/thread_rules.h"
 
 #include <algorithm>
 #include <atomic>
@@ -29,6 +30,7 @@ struct ExportSession::Private {
     QString fileType;
     std::optional<MediaTimeRange> timeRange;
     std::optional<AudioMix> audioMix;
+    ExportSession::AudioMixBuilder audioMixBuilder;
     OptionalError error;
 
     std::atomic<int> status{int(ExportStatus::Unknown)};
@@ -131,6 +133,14 @@ void ExportSession::setAudioMix(std::optional<AudioMix> mix)
 {
     std::lock_guard lock(d->mutex);
     d->audioMix = std::move(mix);
+    d->audioMixBuilder = nullptr;
+}
+
+void ExportSession::setAudioMixBuilder(AudioMixBuilder builder)
+{
+    std::lock_guard lock(d->mutex);
+    d->audioMixBuilder = std::move(builder);
+    d->audioMix.reset();
 }
 
 std::optional<AudioMix> ExportSession::audioMix() const
@@ -279,6 +289,7 @@ std::optional<ExportJob> prepareJob(const MediaAsset &asset, const QUrl &outputU
 
 void ExportSession::run(std::function<void()> completion)
 {
+    ZAF_ASSERT_WORKER_THREAD();
     auto end = [&](ExportStatus final, OptionalError error) {
         if (error && final == ExportStatus::Failed)
             zaf::log::error(lcExport(), QStringLiteral("export to %1 failed: %2")
@@ -298,12 +309,21 @@ void ExportSession::run(std::function<void()> completion)
     QString fileType;
     std::optional<MediaTimeRange> range;
     std::optional<AudioMix> mix;
+    AudioMixBuilder buildMix;
     {
         std::lock_guard lock(d->mutex);
         url = d->outputURL;
         fileType = d->fileType;
         range = d->timeRange;
         mix = d->audioMix;
+        buildMix = d->audioMixBuilder;
+    }
+    // A mix built from the tracks: loading here reads the header on this thread (a movie that
+    // cannot be read fails in prepareJob below, with its load error).
+    if (buildMix && d->asset->load()) {
+        mix = buildMix(*d->asset);
+        std::lock_guard lock(d->mutex);
+        d->audioMix = mix;
     }
     Error error;
     std::optional<ExportJob> job = prepareJob(*d->asset, url, fileType, range, mix, &error);

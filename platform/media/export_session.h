@@ -73,6 +73,13 @@ public:
     std::optional<MediaTimeRange> timeRange() const;
     void setAudioMix(std::optional<AudioMix> mix);
     std::optional<AudioMix> audioMix() const;
+    // A mix that depends on the movie's tracks, built on the export's thread from the loaded asset
+    // just before the export starts, so that a caller on the main thread never reads the file to
+    // list them. It takes the place of any mix set with setAudioMix (and a later setAudioMix, or
+    // a null builder, takes its place). audioMix() answers what the builder made once the export
+    // has started.
+    using AudioMixBuilder = std::function<AudioMix(const MediaAsset &loadedAsset)>;
+    void setAudioMixBuilder(AudioMixBuilder builder);
 
     // Process-unique, increasing with each session made; never 0.
     std::uint64_t sessionID() const;
