@@ -15,16 +15,19 @@
 // DidBeginScrubbing, ValueDidChange for each move, DidEndScrubbing. A handle drag outside editing:
 // DidBeginEditing, then EditingStart/EndValueDidChange for each move.
 
+#include "platform/ui/timeline_model.h" // MovieScrubberHandle
+
 #include <QImage>
 #include <QList>
 #include <QRectF>
 #include <QWidget>
 
+#include <memory>
+
 namespace zaf::ui {
 
 class MovieScrubber;
-
-enum class MovieScrubberHandle { Playhead = 0, Start = 1, End = 2 };
+class TimelineTimer;
 
 // Every operation is optional; the defaults do nothing. All are called on the main thread, from
 // within the scrubber's own event handling or reloadData(); a delegate may call back into the
@@ -94,6 +97,9 @@ public:
     bool isEditable() const;
     void setZoomDelay(double seconds);
     double zoomDelay() const;
+    // The timer that measures the zoom delay (a QTimer unless replaced; tests pass one they fire by
+    // hand). Null keeps the current one.
+    void setZoomTimer(std::unique_ptr<TimelineTimer> timer);
     void setEdgeInset(double points);
     double edgeInset() const;
 
@@ -162,7 +168,7 @@ Q_SIGNALS:
 
 private:
     struct Private;
-    Private *d;
+    std::unique_ptr<Private> d;
 };
 
 } // namespace zaf::ui
