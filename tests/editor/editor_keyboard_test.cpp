@@ -38,14 +38,18 @@ protected:
     std::unique_ptr<ui::WindowHost> host;
 };
 
-TEST_F(EditorKeyboardTest, SpacePlaysAndPausesAndArrowsStepThePlayhead)
+TEST_F(EditorKeyboardTest, SpaceTogglesPlayback)
 {
     press(Qt::Key_Space);
     EXPECT_GT(editor->mvPlayer()->rate(), 0);
     EXPECT_FALSE(editor->isIntroMode());
     press(Qt::Key_Space);
     EXPECT_EQ(editor->mvPlayer()->rate(), 0);
+}
 
+// Right steps one frame, Shift+Left one second back.
+TEST_F(EditorKeyboardTest, ArrowKeysStepThePlayhead)
+{
     editor->mvTrimmer()->setValue(1.0);
     press(Qt::Key_Right);
     EXPECT_NEAR(editor->mvTrimmer()->value(), 1.0 + 1.0 / 30, 1e-6);

@@ -9,42 +9,64 @@
 namespace zaf::test {
 namespace {
 
-TEST_F(EditorTest, PicksThePadLayoutForATabletOrALandscapeFrame)
+struct LayoutChoice {
+    const char *name;
+    int idiom;   // -1 cannot tell, 0 phone, 1 tablet
+    QRectF rect;
+    bool pad;
+};
+
+class EditorLayoutChoiceTest : public EditorTest, public testing::WithParamInterface<LayoutChoice> {};
+
+// The pad layout is for a tablet, or for a landscape frame when the device is not known to be one.
+TEST_P(EditorLayoutChoiceTest, PicksThePadLayoutForATabletOrALandscapeFrame)
 {
-    const struct {
-        int idiom;   // -1 cannot tell, 0 phone, 1 tablet
-        QRectF rect;
-        bool pad;
-    } rows[] = {
-        {0, QRectF(0, 0, 800, 400), true},  {0, QRectF(0, 0, 400, 800), false}, {0, QRectF(0, 0, 500, 500), false},
-        {-1, QRectF(0, 0, 800, 400), true}, {-1, QRectF(0, 0, 500, 500), false}, {1, QRectF(0, 0, 800, 400), true},
-        {1, QRectF(0, 0, 400, 800), true},  {1, QRectF(0, 0, 500, 500), true},
-    };
-    for (const auto &row : rows) {
-        SCOPED_TRACE(testing::Message() << "idiom " << row.idiom << " " << row.rect.width() << "x" << row.rect.height());
-        useCapabilities(scratch, QStringLiteral("{\"device-idiom\": %1}").arg(row.idiom).toUtf8());
-        auto editor = makeEditor(noMovie(), row.rect);
-        EXPECT_EQ(editor->isPadMode(), row.pad);
-        EXPECT_EQ(ui::superview(editor->bottomToolBar()) != nullptr, !row.pad);
-    }
+    useCapabilities(scratch, QStringLiteral("{\"device-idiom\": %1}").arg(GetParam().idiom).toUtf8());
+    auto editor = makeEditor(noMovie(), GetParam().rect);
+    EXPECT_EQ(editor->isPadMode(), GetParam().pad);
+    EXPECT_EQ(ui::superview(editor->bottomToolBar()) != nullptr, !GetParam().pad);
 }
 
-TEST_F(EditorTest, ToolbarsAreTallWithoutAHomeButton)
+INSTANTIATE_TEST_SUITE_P(
+    Frames, EditorLayoutChoiceTest,
+    testing::Values(LayoutChoice{"PhoneLandscape", 0, QRectF(0, 0, 800, 400), true},
+                    LayoutChoice{"PhonePortrait", 0, QRectF(0, 0, 400, 800), false},
+                    LayoutChoice{"PhoneSquare", 0, QRectF(0, 0, 500, 500), false},
+                    LayoutChoice{"UnknownLandscape", -1, QRectF(0, 0, 800, 400), true},
+                    LayoutChoice{"UnknownSquare", -1, QRectF(0, 0, 500, 500), false},
+                    LayoutChoice{"TabletLandscape", 1, QRectF(0, 0, 800, 400), true},
+                    LayoutChoice{"TabletPortrait", 1, QRectF(0, 0, 400, 800), true},
+                    LayoutChoice{"TabletSquare", 1, QRectF(0, 0, 500, 500), true}),
+    [](const testing::TestParamInfo<LayoutChoice> &info) { return std::string(info.param.name); });
+
+struct ToolbarHeights {
+    const char *name;
+    const char *capabilities;
+    bool homeButton;
+    int top, bottom;
+};
+
+class EditorToolbarHeightTest : public EditorTest, public testing::WithParamInterface<ToolbarHeights> {};
+
+// The toolbars are short on a device with a home button and tall without one.
+TEST_P(EditorToolbarHeightTest, ToolbarHeightsFollowTheHomeButton)
 {
-    useCapabilities(scratch, R"({"home-button-type": 2})");
+    useCapabilities(scratch, GetParam().capabilities);
     auto editor = makeEditor(noMovie());
-    EXPECT_FALSE(editor->hasHomeButton());
-    EXPECT_EQ(editor->topToolBar()->geometry(), QRect(0, 0, 400, 85));
-    EXPECT_EQ(editor->bottomToolBar()->geometry(), QRect(0, 700 - 64, 400, 64));
+    EXPECT_EQ(editor->hasHomeButton(), GetParam().homeButton);
+    EXPECT_EQ(editor->topToolBar()->geometry(), QRect(0, 0, 400, GetParam().top));
+    EXPECT_EQ(editor->bottomToolBar()->geometry(), QRect(0, 700 - GetParam().bottom, 400, GetParam().bottom));
 }
 
-TEST_F(EditorTest, ToolbarsAreShortWithAHomeButtonAndFixedSpaceFollowsTheWidth)
+INSTANTIATE_TEST_SUITE_P(
+    HomeButton, EditorToolbarHeightTest,
+    testing::Values(ToolbarHeights{"WithHomeButton", R"({"home-button-type": 1})", true, 60, 44},
+                    ToolbarHeights{"WithoutHomeButton", R"({"home-button-type": 2})", false, 85, 64}),
+    [](const testing::TestParamInfo<ToolbarHeights> &info) { return std::string(info.param.name); });
+
+TEST_F(EditorTest, FixedSpaceIsAFractionOfTheViewsWidth)
 {
-    useCapabilities(scratch, R"({"home-button-type": 1})");
     auto editor = makeEditor(noMovie());
-    EXPECT_TRUE(editor->hasHomeButton());
-    EXPECT_EQ(editor->topToolBar()->geometry(), QRect(0, 0, 400, 60));
-    EXPECT_EQ(editor->bottomToolBar()->geometry(), QRect(0, 700 - 44, 400, 44));
     EXPECT_DOUBLE_EQ(editor->fixSpace()->width(), 0.005 * 400);
 }
 
@@ -96,12 +118,15 @@ TEST_F(EditorTest, OverlayPlayButtonIsCentredInTheViewAndStaysCentredOnResize)
     expectCentred(1280, 720);
 }
 
-TEST_F(EditorTest, ShortInitializerLeavesTheFrameAndTintGoesToTheTopToolbarOnly)
+TEST_F(EditorTest, ShortInitializerLeavesTheFrameAndTintUnset)
 {
     ZafVideoEditorViewController plain(QStringLiteral("id"), QUrl::fromLocalFile(noMovie()), QStringLiteral("Recorder"));
     EXPECT_EQ(plain.view()->geometry(), QWidget().geometry());
     EXPECT_FALSE(plain.topToolBar()->tintColor().isValid());
+}
 
+TEST_F(EditorTest, TintGoesToTheTopToolbarOnly)
+{
     auto tinted = makeEditor(noMovie(), QRectF(10, 20, 400, 700), QColor(0xff, 0x40, 0x00));
     EXPECT_EQ(tinted->view()->geometry(), QRect(10, 20, 400, 700));
     EXPECT_EQ(tinted->topToolBar()->tintColor(), QColor(0xff, 0x40, 0x00));
