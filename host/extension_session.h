@@ -13,7 +13,10 @@
 // channelClosed() comes at most once, before finished() when the process closed its end by exiting.
 // finished() is the last signal. Slots must not delete the session directly (use deleteLater()).
 //
-// Writes never raise SIGPIPE (MSG_NOSIGNAL): a dead extension makes a write fail with a logged error.
+// Built from a ChildProcess (child_process.h) and the host's end of the channel, a FramedSocket
+// (platform/extensionkit/framed_socket.h) that queues what a full socket buffer does not take, so
+// the host's thread never waits for the extension to read. Writes never raise SIGPIPE: a dead
+// extension makes a write fail with a logged error.
 
 #include "host/input_items.h"
 
@@ -25,13 +28,6 @@
 #include <sys/types.h>
 
 #include <memory>
-
-class QSocketNotifier;
-class QTimer;
-
-namespace zaf::extensionkit {
-class FrameDecoder;
-}
 
 namespace zaf::host {
 
@@ -48,8 +44,8 @@ public:
     explicit ExtensionSession(QObject *parent = nullptr);
     // Ends an extension that is still running: closes the channel (which the extension takes as the
     // removal of its view), waits up to the grace period for it to exit, then SIGTERM, another grace
-    // period, then SIGKILL. Always reaps the process. Blocks the calling thread for at most about
-    // twice the grace period.
+    // period, then SIGKILL. Always reaps the process. The waits end when the process does (nothing
+    // sleeps); they block the calling thread for at most about twice the grace period.
     ~ExtensionSession() override;
 
     // Starts `extensionExecutable` (a path; no PATH search) and sends `beginExtensionRequest` with
@@ -63,12 +59,12 @@ public:
     void removeView();
 
     // The grace period of the destructor's termination steps (default 3000 ms).
-    void setTerminationGracePeriod(int milliseconds) { m_graceMs = milliseconds; }
+    void setTerminationGracePeriod(int milliseconds);
 
     // The extension's process ID while started, 0 before start(); kept after finished().
-    pid_t processId() const { return m_pid; }
-    bool isRunning() const { return m_pid > 0 && !m_reaped; }
-    bool isChannelOpen() const { return m_fd >= 0; }
+    pid_t processId() const;
+    bool isRunning() const;
+    bool isChannelOpen() const;
 
 Q_SIGNALS:
     // Main thread: the extension answered beginExtensionRequest with {"accepted": true}.
@@ -90,33 +86,8 @@ Q_SIGNALS:
     void finished(int exitCode, bool crashed);
 
 private:
-    void onReadable();
-    void onWritable();
-    void pollProcess();
-    void readAvailable();
-    void handleMessage(const QByteArray &payload);
-    void handleResponse(const QJsonObject &message);
-    void handleNotification(const QString &method, const QJsonObject &message);
-    bool sendMessage(const QJsonObject &message, QString *error = nullptr);
-    bool flushOutgoing();
-    void reportProtocolError(const QString &message);
-    void closeChannel();
-    void markReaped(int status);
-    void terminateAndReap();
-
-    int m_fd = -1;
-    pid_t m_pid = 0;
-    int m_pidFd = -1;
-    bool m_reaped = false;
-    bool m_started = false;
-    int m_graceMs = 3000;
-    int m_requestId = 1;
-    QByteArray m_outgoing;
-    std::unique_ptr<zaf::extensionkit::FrameDecoder> m_decoder;
-    QSocketNotifier *m_readNotifier = nullptr;
-    QSocketNotifier *m_writeNotifier = nullptr;
-    QSocketNotifier *m_exitNotifier = nullptr;
-    QTimer *m_exitPoll = nullptr;
+    struct Private;
+    std::unique_ptr<Private> d;
 };
 
 } // namespace zaf::host

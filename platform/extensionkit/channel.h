@@ -1,12 +1,11 @@
 #pragma once
 
-// Channel: the extension's end of the host connection, a connected stream socket carrying framed
-// JSON-RPC 2.0 messages (see frame_codec.h and json_rpc.h).
+// Channel: the extension's end of the host connection, a FramedSocket (framed_socket.h) carrying
+// JSON-RPC 2.0 messages (json_rpc.h).
 //
-// Threads: created, started, closed and destroyed on the main thread, which reads the socket
-// through a QSocketNotifier; every signal is emitted there. The send functions may be called from
-// any thread: writes are serialised under a mutex and each frame is written completely (partial
-// writes are continued; a full socket buffer is waited on with a bounded poll). Writes never raise
+// Threads: created, started, closed and destroyed on the main thread, which reads the socket; every
+// signal is emitted there. The send functions may be called from any thread: each frame is written
+// whole, and a full socket buffer is waited on for at most the write timeout. Writes never raise
 // SIGPIPE; a failed write returns an Error in the POSIX domain whose code is the errno.
 //
 // Incoming messages: valid requests and notifications are emitted; responses are logged (this side
@@ -20,6 +19,7 @@
 
 #include "platform/error.h"
 #include "platform/extensionkit/frame_codec.h"
+#include "platform/extensionkit/framed_socket.h"
 
 #include <QJsonArray>
 #include <QJsonObject>
@@ -28,9 +28,6 @@
 #include <QString>
 
 #include <memory>
-#include <mutex>
-
-class QSocketNotifier;
 
 namespace zaf::extensionkit {
 
@@ -57,7 +54,7 @@ public:
     OptionalError sendFrame(const QByteArray &payload);
 
     // The longest a send waits for room in a full socket buffer before failing with ETIMEDOUT.
-    void setWriteTimeout(int milliseconds) { m_writeTimeoutMs = milliseconds; }
+    void setWriteTimeout(int milliseconds) { m_socket.setWriteTimeout(milliseconds); }
 
 Q_SIGNALS:
     // Main thread: a request; answer it with sendResult or sendError using `id`.
@@ -72,18 +69,10 @@ Q_SIGNALS:
 
 private:
     Channel(int fd, std::uint32_t maxIncomingFrameLength);
-    void onReadable();
     void handlePayload(const QByteArray &payload);
     void reportProtocolError(const QString &text);
 
-    mutable std::mutex m_writeMutex;
-    int m_fd = -1;              // guarded by m_writeMutex for writes and closing
-    bool m_writeBroken = false; // a frame was cut off mid-way: the stream can no longer be written
-    int m_writeTimeoutMs = 5000;
-    bool m_started = false;
-    bool m_closed = false;
-    FrameDecoder m_decoder;
-    QSocketNotifier *m_notifier = nullptr;
+    FramedSocket m_socket;
 };
 
 } // namespace zaf::extensionkit

@@ -174,7 +174,7 @@ TEST(ExtensionSessionProtocol, MalformedMessagesAndUnknownCallsAreLoggedAndTheCh
     ASSERT_TRUE(s.run("accept garbage bad-params call-unknown expect-error report after.errors exit 0"));
     EXPECT_EQ(s.exitCode, 0);
     ASSERT_EQ(s.protocolErrors.size(), 3);
-    EXPECT_TRUE(s.protocolErrors[0].contains("not JSON")) << s.protocolErrors[0].toStdString();
+    EXPECT_TRUE(s.protocolErrors[0].contains("invalid JSON")) << s.protocolErrors[0].toStdString();
     EXPECT_TRUE(s.protocolErrors[1].contains("extensionDidFinishWithActivityTypes"));
     EXPECT_TRUE(s.protocolErrors[2].contains("openTheDoor"));
     EXPECT_EQ(s.reports, QList<QStringList>{{"after.errors"}});
@@ -187,7 +187,7 @@ TEST(ExtensionSessionProtocol, OversizedOrTruncatedMessageIsOneProtocolErrorThen
     // After the bad length the fake still sends a report; the host must have closed the channel by
     // then, which the fake sees as its end (await-eof exits 0).
     const std::pair<const char *, const char *> cases[] = {{"accept oversized report too.late await-eof", "1048577"},
-                                                           {"accept partial exit 0", "middle of a message"}};
+                                                           {"accept partial exit 0", "inside a frame"}};
     for (const auto &[steps, error] : cases) {
         SCOPED_TRACE(steps);
         RecordedSession s;
