@@ -86,16 +86,18 @@ TEST_F(EditorPlaybackTest, ReadinessSetsUpTheTimelineWhosePlayheadFollowsPlaybac
     EXPECT_EQ(e->mvTrimmer()->value(), 0.2);
 }
 
-TEST_F(EditorPlaybackTest, VideoSizeAndThumbnailAspectFollowTheRotation)
+class EditorRotationTest : public EditorPlaybackTest, public testing::WithParamInterface<int> {};
+
+TEST_P(EditorRotationTest, VideoSizeAndThumbnailAspectFollowTheRotation)
 {
-    for (const int rotation : {0, 90}) {
-        SCOPED_TRACE(rotation);
-        auto e = ready(movie(1, 192, 108, rotation));
-        const QSizeF shown = rotation ? QSizeF(108, 192) : QSizeF(192, 108);
-        EXPECT_EQ(e->getVideoSize(), shown);
-        EXPECT_DOUBLE_EQ(e->movieScrubberThumbnailAspectRatio(e->mvTrimmer()), shown.width() / shown.height());
-    }
+    const int rotation = GetParam();
+    auto e = ready(movie(1, 192, 108, rotation));
+    const QSizeF shown = rotation ? QSizeF(108, 192) : QSizeF(192, 108);
+    EXPECT_EQ(e->getVideoSize(), shown);
+    EXPECT_DOUBLE_EQ(e->movieScrubberThumbnailAspectRatio(e->mvTrimmer()), shown.width() / shown.height());
 }
+
+INSTANTIATE_TEST_SUITE_P(Degrees, EditorRotationTest, testing::Values(0, 90));
 
 // Files the editor cannot play: it says so in the video area with the file's name and a plain
 // reason, leaves only Cancel (nothing to play, trim, save or share), and Cancel reports nothing.

@@ -120,10 +120,12 @@ TEST_F(EditorTest, SecondTrimWithinTheSameSecondGetsAFreeNameAndRetiresTheFirstF
 // Destroying the editor while its trim export writes, or while the finished export's completion
 // waits for the main thread to reload (the main thread handles no events here), stops the export
 // before the temporary directory is emptied and leaves the completion nothing to wait for.
-TEST_F(EditorTest, DestroyingTheEditorDuringItsTrimExportStopsItAndLeavesTheDirectoryEmpty)
+class EditorTrimTeardownTest : public EditorTest, public testing::WithParamInterface<bool> {};
+
+TEST_P(EditorTrimTeardownTest, DestroyingTheEditorDuringItsTrimExportStopsItAndLeavesTheDirectoryEmpty)
 {
-    for (const bool finishing : {false, true}) {
-        SCOPED_TRACE(finishing ? "finishing" : "writing");
+    const bool finishing = GetParam();
+    {
         auto e = ready(movie(finishing ? 3 : 10, 640, 480));
         selectRange(*e, 0.5, finishing ? 2.5 : 9.5);
         e->trimButton()->trigger();
@@ -146,6 +148,11 @@ TEST_F(EditorTest, DestroyingTheEditorDuringItsTrimExportStopsItAndLeavesTheDire
         EXPECT_TRUE(tempEntries().isEmpty()) << "nothing is written after the editor has gone";
     }
 }
+
+INSTANTIATE_TEST_SUITE_P(Moments, EditorTrimTeardownTest, testing::Bool(),
+                         [](const testing::TestParamInfo<bool> &info) {
+                             return std::string(info.param ? "WhileItsCompletionWaits" : "WhileItWrites");
+                         });
 
 } // namespace
 } // namespace zaf::test
