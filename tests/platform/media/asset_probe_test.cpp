@@ -1,6 +1,7 @@
 #include "platform/media/media_asset.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/named_cases.h"
 #include "tests/support/temp_dir.h"
 
 #include <QCoreApplication>
@@ -29,16 +30,11 @@ std::shared_ptr<MediaAsset> openAsset(const QString &path)
 
 // Made by ffmpeg, not by our writer: 2 s of test pattern (libx264, 30 fps) and two AAC tracks, with
 // the header (moov) at the end as ffmpeg writes it by default.
-const QString &twoAudioMovie()
+QString twoAudioMovie()
 {
-    static const ScratchDir dir;
-    static const QString path = dir.file(QStringLiteral("two-audio.mp4"));
-    static const bool made = ffmpeg(words("-f lavfi -i testsrc2=size=320x240:rate=30 -f lavfi -i sine=frequency=440:sample_rate=48000"
-                                          " -f lavfi -i sine=frequency=660:sample_rate=48000 -map 0:v -map 1:a -map 2:a -t 2"
-                                          " -c:v libx264 -preset ultrafast -g 30 -pix_fmt yuv420p -c:a aac -ac 2")
-                                    << path);
-    EXPECT_TRUE(made);
-    return path;
+    return zaf::test::sharedFfmpegOutput(words("-f lavfi -i testsrc2=size=320x240:rate=30 -f lavfi -i sine=frequency=440:sample_rate=48000"
+                                               " -f lavfi -i sine=frequency=660:sample_rate=48000 -map 0:v -map 1:a -map 2:a -t 2"
+                                               " -c:v libx264 -preset ultrafast -g 30 -pix_fmt yuv420p -c:a aac -ac 2"));
 }
 
 // Expects our track to say what ffprobe says about the same stream.
@@ -64,24 +60,32 @@ void expectTrackMatchesProbe(const AssetTrack &track, const QJsonObject &stream)
     }
 }
 
-// Quarter turns give the expected matrix, the shown size, and map every corner into the shown rectangle.
-TEST(AffineTransformTest, RotationByQuarterTurnsGivesUprightTransformsInPositiveQuadrant)
+TEST(AffineTransformTest, RotationMatrices)
 {
     EXPECT_EQ(AffineTransform::rotation(0, 320, 240), AffineTransform::identity());
     EXPECT_EQ(AffineTransform::rotation(90, 320, 240), (AffineTransform{0, 1, -1, 0, 240, 0}));
     EXPECT_EQ(AffineTransform::rotation(-270, 320, 240), AffineTransform::rotation(90, 320, 240));
-    for (int degrees : {0, 90, 180, 270}) {
-        SCOPED_TRACE(degrees);
-        const AffineTransform t = AffineTransform::rotation(degrees, 320, 240);
-        EXPECT_EQ(t.rotationDegrees(), degrees);
-        const QSizeF shown = t.mapSize(QSizeF(320, 240));
-        EXPECT_EQ(shown, degrees % 180 ? QSizeF(240, 320) : QSizeF(320, 240));
-        for (const auto &[x, y] : {std::pair{0.0, 0.0}, {320.0, 0.0}, {0.0, 240.0}, {320.0, 240.0}}) {
-            const double mx = t.a * x + t.c * y + t.tx, my = t.b * x + t.d * y + t.ty;
-            EXPECT_TRUE(mx >= 0 && my >= 0 && mx <= shown.width() && my <= shown.height()) << x << "," << y;
-        }
+}
+
+class QuarterTurn : public ::testing::TestWithParam<int> {};
+
+const auto kDegreesName = [](const auto &info) { return "Degrees" + std::to_string(info.param); };
+
+// A quarter turn tells its angle, gives the shown size, and maps every corner into the shown rectangle.
+TEST_P(QuarterTurn, MapsTheFrameOntoTheShownRectangle)
+{
+    const int degrees = GetParam();
+    const AffineTransform t = AffineTransform::rotation(degrees, 320, 240);
+    EXPECT_EQ(t.rotationDegrees(), degrees);
+    const QSizeF shown = t.mapSize(QSizeF(320, 240));
+    EXPECT_EQ(shown, degrees % 180 ? QSizeF(240, 320) : QSizeF(320, 240));
+    for (const auto &[x, y] : {std::pair{0.0, 0.0}, {320.0, 0.0}, {0.0, 240.0}, {320.0, 240.0}}) {
+        const double mx = t.a * x + t.c * y + t.tx, my = t.b * x + t.d * y + t.ty;
+        EXPECT_TRUE(mx >= 0 && my >= 0 && mx <= shown.width() && my <= shown.height()) << x << "," << y;
     }
 }
+
+INSTANTIATE_TEST_SUITE_P(Angles, QuarterTurn, ::testing::Values(0, 90, 180, 270), kDegreesName);
 
 // Tracks come in stream order and agree with ffprobe on every field.
 TEST(AssetProbeTest, LoadListsTracksInStreamOrderMatchingProbeForTwoAudioTracks)
@@ -129,28 +133,25 @@ TEST(AssetProbeTest, DurationIsTheLongestTrackInItsOwnTimescale)
 }
 
 // A display matrix written by ffmpeg becomes the video track's preferred transform.
-TEST(AssetProbeTest, PreferredTransformFollowsDisplayMatrixForEachRotation)
-{
-    ScratchDir scratch;
-    for (int clockwise : {90, 180, 270}) {
-        SCOPED_TRACE(clockwise);
-        // ffmpeg turns the stream-copy tag "rotate=R" into a matrix of R degrees counter-clockwise.
-        const QString rotated = scratch.file(QStringLiteral("rot%1.mp4").arg(clockwise));
-        ASSERT_TRUE(ffmpeg(QStringList{QStringLiteral("-i"), twoAudioMovie()} << words("-map 0 -c copy -metadata:s:v:0")
-                           << QStringLiteral("rotate=%1").arg(360 - clockwise) << rotated));
-        const auto probed = zaf::test::probeStreams(rotated, "video");
-        ASSERT_EQ(probed.size(), 1);
-        ASSERT_EQ(zaf::test::probeRotation(probed[0]), clockwise);
+class DisplayMatrix : public ::testing::TestWithParam<int> {};
 
-        const auto video = openAsset(rotated)->tracksWithMediaType(MediaType::Video);
-        ASSERT_EQ(video.size(), 1);
-        EXPECT_EQ(video[0].naturalSize, QSizeF(320, 240));
-        EXPECT_EQ(video[0].preferredTransform, AffineTransform::rotation(clockwise, 320, 240));
-    }
+TEST_P(DisplayMatrix, BecomesThePreferredTransform)
+{
+    const int clockwise = GetParam();
+    // ffmpeg turns the stream-copy tag "rotate=R" into a matrix of R degrees counter-clockwise.
+    const QString rotated = zaf::test::sharedFfmpegOutput(QStringList{QStringLiteral("-i"), twoAudioMovie()} << words("-map 0 -c copy -metadata:s:v:0")
+                                                          << QStringLiteral("rotate=%1").arg(360 - clockwise));
+    ASSERT_EQ(zaf::test::probeRotation(zaf::test::probeStreams(rotated, "video").value(0)), clockwise);
+    const auto video = openAsset(rotated)->tracksWithMediaType(MediaType::Video);
+    ASSERT_EQ(video.size(), 1);
+    EXPECT_EQ(video[0].naturalSize, QSizeF(320, 240));
+    EXPECT_EQ(video[0].preferredTransform, AffineTransform::rotation(clockwise, 320, 240));
 }
 
+INSTANTIATE_TEST_SUITE_P(Angles, DisplayMatrix, ::testing::Values(90, 180, 270), kDegreesName);
+
 // A cover picture is a track of its own kind, not a video track, and the song stays playable.
-TEST(AssetProbeTest, AudioOnlyFileIsPlayableAndCoverArtIsNotAVideoTrack)
+TEST(AssetProbeTest, CoverArtOfASongIsNotAVideoTrack)
 {
     ScratchDir scratch;
     const QString cover = scratch.file(QStringLiteral("cover.png"));
@@ -167,42 +168,52 @@ TEST(AssetProbeTest, AudioOnlyFileIsPlayableAndCoverArtIsNotAVideoTrack)
 }
 
 // Unusable files fail to load with the right code, and the failure is logged once.
-TEST(AssetProbeTest, LoadFailsWithLoggedErrorForMissingEmptyTruncatedAndNonMovieFiles)
+struct UnusableFile {
+    const char *name;
+    std::function<QString(const ScratchDir &)> make; // the file's path
+    int code;
+};
+ZAF_PRINT_CASES_AS_NAMES
+
+class AssetLoadFailure : public ::testing::TestWithParam<UnusableFile> {};
+
+TEST_P(AssetLoadFailure, FailsWithALoggedError)
 {
     ScratchDir scratch;
-    const QString truncated = scratch.file(QStringLiteral("truncated.mp4")); // loses the header at the end
-    ASSERT_TRUE(QFile::copy(twoAudioMovie(), truncated) && QFile::resize(truncated, QFileInfo(truncated).size() / 2));
-    QFile srt(scratch.file(QStringLiteral("subs.srt")));
-    ASSERT_TRUE(srt.open(QIODevice::WriteOnly) && srt.write("1\n00:00:00,000 --> 00:00:01,000\nhello\n\n") > 0);
-    srt.close();
-    const QString subtitles = scratch.file(QStringLiteral("subs.mkv"));
-    ASSERT_TRUE(ffmpeg(QStringList{QStringLiteral("-i"), srt.fileName()} << words("-c:s srt") << subtitles));
-
-    const QList<std::pair<QString, int>> cases{
-        {scratch.file(QStringLiteral("nothing-here.mp4")), kMediaErrorCannotOpen},
-        {scratch.write(QStringLiteral("empty.mp4"), 0), kMediaErrorCannotOpen},
-        {scratch.write(QStringLiteral("text.mp4"), 5000), kMediaErrorCannotOpen},
-        {scratch.path(), kMediaErrorCannotOpen},
-        {truncated, kMediaErrorCannotOpen},
-        {subtitles, kMediaErrorNoTracks},
-    };
-    for (const auto &[path, code] : cases) {
-        SCOPED_TRACE(path.toStdString());
-        zaf::test::LogCapture log;
-        const auto asset = openAsset(path);
-        EXPECT_FALSE(asset->load());
-        EXPECT_TRUE(asset->isLoaded());
-        EXPECT_FALSE(asset->isPlayable());
-        ASSERT_TRUE(asset->loadError().has_value());
-        EXPECT_EQ(asset->loadError()->domain, QString::fromLatin1(kMediaErrorDomain));
-        EXPECT_EQ(asset->loadError()->code, code);
-        EXPECT_FALSE(asset->duration().isNumeric() && code == kMediaErrorCannotOpen);
-        EXPECT_EQ(log.messages(QStringLiteral("zaf.media")).size(), 1);
-    }
+    const QString path = GetParam().make(scratch);
+    ASSERT_FALSE(path.isEmpty());
+    zaf::test::LogCapture log;
+    const auto asset = openAsset(path);
+    EXPECT_FALSE(asset->load());
+    EXPECT_TRUE(asset->isLoaded());
+    EXPECT_FALSE(asset->isPlayable());
+    ASSERT_TRUE(asset->loadError().has_value());
+    EXPECT_EQ(asset->loadError()->domain, QString::fromLatin1(kMediaErrorDomain));
+    EXPECT_EQ(asset->loadError()->code, GetParam().code);
+    EXPECT_FALSE(asset->duration().isNumeric() && GetParam().code == kMediaErrorCannotOpen);
+    EXPECT_EQ(log.messages(QStringLiteral("zaf.media")).size(), 1);
 }
 
-// The asynchronous load completes off the main thread even when the asset is released first, and
-// a loaded asset answers from any thread.
+INSTANTIATE_TEST_SUITE_P(
+    Files, AssetLoadFailure,
+    ::testing::Values(UnusableFile{"NothingThere", [](const ScratchDir &s) { return s.file("nothing-here.mp4"); }, kMediaErrorCannotOpen},
+                      UnusableFile{"Empty", [](const ScratchDir &s) { return s.write("empty.mp4", 0); }, kMediaErrorCannotOpen},
+                      UnusableFile{"Text", [](const ScratchDir &s) { return s.write("text.mp4", 5000); }, kMediaErrorCannotOpen},
+                      UnusableFile{"Directory", [](const ScratchDir &s) { return s.path(); }, kMediaErrorCannotOpen},
+                      UnusableFile{"Truncated", [](const ScratchDir &s) { // loses the header at the end
+                                       const QString path = s.file("truncated.mp4");
+                                       return QFile::copy(twoAudioMovie(), path) && QFile::resize(path, QFileInfo(path).size() / 2) ? path : QString();
+                                   }, kMediaErrorCannotOpen},
+                      UnusableFile{"OnlySubtitles", [](const ScratchDir &s) {
+                                       QFile srt(s.file("subs.srt"));
+                                       srt.open(QIODevice::WriteOnly);
+                                       srt.write("1\n00:00:00,000 --> 00:00:01,000\nhello\n\n");
+                                       srt.close();
+                                       return ffmpeg(QStringList{"-i", srt.fileName(), "-c:s", "srt", s.file("subs.mkv")}) ? s.file("subs.mkv") : QString();
+                                   }, kMediaErrorNoTracks}),
+    zaf::test::caseName);
+
+// The asynchronous load completes off the main thread even when the asset is released first.
 TEST(AssetProbeTest, LoadAsynchronouslyCompletesOffTheMainThreadEvenWhenAssetIsReleased)
 {
     std::promise<bool> onMainThread;
@@ -218,12 +229,15 @@ TEST(AssetProbeTest, LoadAsynchronouslyCompletesOffTheMainThreadEvenWhenAssetIsR
     asset.reset();
     ASSERT_EQ(future.wait_for(std::chrono::seconds(30)), std::future_status::ready);
     EXPECT_FALSE(future.get());
+}
 
-    auto again = openAsset(twoAudioMovie());
+TEST(AssetProbeTest, AssetAnswersFromAnyThread)
+{
+    auto asset = openAsset(twoAudioMovie());
     std::atomic<int> playable{0};
     std::vector<std::thread> readers;
     for (int i = 0; i < 4; ++i)
-        readers.emplace_back([&] { playable += again->isPlayable() ? 1 : 0; });
+        readers.emplace_back([&] { playable += asset->isPlayable() ? 1 : 0; });
     for (auto &t : readers)
         t.join();
     EXPECT_EQ(playable.load(), 4);

@@ -21,7 +21,7 @@ ZAF_PRINT_CASES_AS_NAMES
 // second.
 QString clicksMovie()
 {
-    return sharedToolMovie(QStringList{QStringLiteral("-i"), sharedFixtureMovie({.seconds = 4, .audioTracks = 0})}
+    return sharedFfmpegOutput(QStringList{QStringLiteral("-i"), sharedFixtureMovie({.seconds = 4, .audioTracks = 0})}
                            << words("-f lavfi -i aevalsrc=if(between(t\\,2\\,2.0005)\\,0.9\\,0):s=48000:d=4"
                                     " -f lavfi -i aevalsrc=if(between(t\\,2.5\\,2.5005)\\,0.9\\,0):s=48000:d=4"
                                     " -map 0:v -map 1 -map 2 -c:v copy -c:a aac -b:a 256k"));
@@ -31,7 +31,7 @@ QString clicksMovie()
 // cut in samples.
 QString clicksMatroska()
 {
-    return sharedToolMovie(QStringList{QStringLiteral("-i"), clicksMovie()} << words("-map 0 -c copy"), QStringLiteral("mkv"));
+    return sharedFfmpegOutput(QStringList{QStringLiteral("-i"), clicksMovie()} << words("-map 0 -c copy"), QStringLiteral("mkv"));
 }
 
 struct ClickCase {
@@ -104,7 +104,7 @@ QList<float> decodedSamples(const QString &path, int audioIndex)
 // source's samples even when exact.
 QString noiseMovie()
 {
-    return sharedToolMovie(QStringList{QStringLiteral("-i"), sharedFixtureMovie({.seconds = 4, .audioTracks = 0})}
+    return sharedFfmpegOutput(QStringList{QStringLiteral("-i"), sharedFixtureMovie({.seconds = 4, .audioTracks = 0})}
                            << words("-f lavfi -i anoisesrc=d=4:c=pink:r=48000:a=0.3 -f lavfi -i aevalsrc=if(between(t\\,2\\,2.0005)\\,0.9\\,0):s=48000:d=4"
                                     " -map 0:v -map 1 -map 2 -c:v copy -c:a:0 aac -b:a:0 192k -aac_pns 0 -c:a:1 libmp3lame"));
 }
@@ -228,7 +228,7 @@ TEST_F(ExportTest, EmptyMixOfMovieWithoutAudioGivesMovieWithoutAudioTrack)
 // Two in-phase tracks at 0.9 would sum to twice full scale: the mix is summed yet limited below it.
 TEST_F(ExportTest, MixOfLoudTracksIsLimitedBelowFullScale)
 {
-    const QString source = sharedToolMovie(words("-f lavfi -i testsrc2=size=160x120:rate=30:duration=2 -f lavfi -i aevalsrc=0.9*sin(2*PI*200*t):s=48000:d=2"
+    const QString source = sharedFfmpegOutput(words("-f lavfi -i testsrc2=size=160x120:rate=30:duration=2 -f lavfi -i aevalsrc=0.9*sin(2*PI*200*t):s=48000:d=2"
                                                  " -f lavfi -i aevalsrc=0.9*sin(2*PI*200*t):s=48000:d=2 -map 0 -map 1 -map 2"
                                                  " -c:v libx264 -preset ultrafast -c:a pcm_s16le"),
                                            QStringLiteral("mov"));

@@ -1,7 +1,7 @@
 #pragma once
 
 // What the ExportSession tests share: sessions on fixture movies, a waiter for their one completion,
-// re-encoded sources kept in the fixture cache, and a fixture that exports into a scratch directory.
+// re-encoded fixtures kept in the fixture cache, and a fixture that exports into a scratch directory.
 
 #include "platform/media/export_session.h"
 #include "tests/support/media/fixture_movies.h"
@@ -9,7 +9,6 @@
 #include "tests/support/temp_dir.h"
 
 #include <QCoreApplication>
-#include <QCryptographicHash>
 #include <QFileInfo>
 #include <QThread>
 
@@ -38,20 +37,10 @@ inline MediaTimeRange secondsRange(double start, double end, int timescale = 100
     return MediaTimeRange::fromStartEnd(MediaTime::fromSeconds(start, timescale), MediaTime::fromSeconds(end, timescale));
 }
 
-// A file the ffmpeg tool makes from `arguments` (which name the output last), made once into the
-// fixture cache; `arguments` may name fixture movies, whose cache names carry their shape.
-inline QString sharedToolMovie(const QStringList &arguments, const QString &suffix = QStringLiteral("mp4"))
-{
-    const QString key = arguments.join(u' ');
-    const QString digest = QString::fromLatin1(QCryptographicHash::hash(key.toUtf8(), QCryptographicHash::Md5).toHex().left(12));
-    return test::sharedGeneratedFile(QStringLiteral("export-source-%1.%2").arg(digest, suffix),
-                                     [&](const QString &path) { return test::ffmpeg(QStringList(arguments) << path); });
-}
-
 // A fixture movie re-encoded by the ffmpeg options `encode`, made once into the fixture cache.
 inline QString sharedReencodedFixture(const fixture::FixtureSpec &spec, const char *encode)
 {
-    return sharedToolMovie(QStringList{QStringLiteral("-i"), test::sharedFixtureMovie(spec)} << test::words(encode));
+    return test::sharedFfmpegOutput(QStringList{QStringLiteral("-i"), test::sharedFixtureMovie(spec)} << test::words(encode));
 }
 
 inline std::shared_ptr<ExportSession> makeSession(const QString &source, const QString &output)

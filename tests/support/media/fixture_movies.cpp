@@ -4,6 +4,7 @@
 #include "tools/fixture/frame_pattern.h"
 
 #include <QCoreApplication>
+#include <QCryptographicHash>
 #include <QDir>
 #include <QFileInfo>
 #include <QJsonArray>
@@ -138,6 +139,13 @@ QString cachedFixture(const QString &name, const std::function<bool(const QStrin
 QString sharedGeneratedFile(const QString &name, const std::function<bool(const QString &path)> &make)
 {
     return cachedFixture(name, make);
+}
+
+QString sharedFfmpegOutput(const QStringList &arguments, const QString &suffix)
+{
+    const QByteArray digest = QCryptographicHash::hash(arguments.join(u' ').toUtf8(), QCryptographicHash::Md5).toHex().left(12);
+    return cachedFixture(QStringLiteral("ffmpeg-%1.%2").arg(QString::fromLatin1(digest), suffix),
+                         [&](const QString &path) { return ffmpeg(QStringList(arguments) << path); });
 }
 
 QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape)

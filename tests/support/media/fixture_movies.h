@@ -27,6 +27,9 @@ QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape);
 // The file `name` of the fixture cache, made once by `make` into the path it is given when missing,
 // for generators of their own; `name` must change whenever what `make` writes does.
 QString sharedGeneratedFile(const QString &name, const std::function<bool(const QString &path)> &make);
+// What the ffmpeg tool writes from `arguments` (the output's path is added last), made once into
+// the fixture cache under a digest of the arguments; `suffix` names the container.
+QString sharedFfmpegOutput(const QStringList &arguments, const QString &suffix = QStringLiteral("mp4"));
 
 // The colour of every pixel of a flat-colour movie.
 inline constexpr QRgb kFlatColour = 0xff3366cc;
