@@ -1,5 +1,6 @@
 #include "tests/corpus/hostile_movies.h"
 
+#include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
 
 #include <QFile>
@@ -246,6 +247,15 @@ QString unavailableReason(const HostileMovie &movie)
     if (encoders.contains(wanted))
         return {};
     return QStringLiteral("this ffmpeg has no %1 encoder to make the movie with").arg(QLatin1String(movie.encoder));
+}
+
+bool loggedWarning(const LogCapture &log)
+{
+    for (const LogEntry &entry : log.entries()) {
+        if (entry.type >= QtWarningMsg && entry.category.startsWith(QLatin1String("zaf.")))
+            return true;
+    }
+    return false;
 }
 
 } // namespace zaf::test::corpus

@@ -15,6 +15,10 @@
 #include <functional>
 #include <vector>
 
+namespace zaf::test {
+class LogCapture;
+}
+
 namespace zaf::test::corpus {
 
 // What a kind is, and so what every command must make of it.
@@ -52,5 +56,8 @@ std::vector<std::string> hostileMovieNames();
 QString hostileMoviePath(const HostileMovie &movie);
 // Why the kind cannot be made with the installed ffmpeg (its encoder is missing), or "".
 QString unavailableReason(const HostileMovie &movie);
+
+// Whether one of our own categories ("zaf.") logged a warning or worse: how a failure is reported.
+bool loggedWarning(const LogCapture &log);
 
 } // namespace zaf::test::corpus
