@@ -4,6 +4,7 @@
 #include "platform/media/core/decoder_setup.h"
 #include "platform/media/core/media_input.h"
 #include "platform/media/core/media_log.h"
+#include "platform/media/playback/playback_audio_mix.h"
 
 #include <algorithm>
 #include <cmath>
@@ -13,24 +14,22 @@ namespace zaf::media::playback {
 
 namespace {
 
+// A stalled source (EAGAIN over and over) ends the stream after this many attempts in a row.
 constexpr int kMaxConsecutiveReadRetries = 1000;
-// A stream that starts later than the requested time is padded with silence, at most this long.
-constexpr double kMaxLeadingSilenceSeconds = 10;
 // When one stream has this much audio waiting while another has none, the silent one is taken as
 // having a gap and the mix goes on without it.
 constexpr double kMaxStreamSkewSeconds = 2;
 
-struct StreamDecoder {
+// One audio stream of the movie, decoded and resampled to the output format.
+struct AudioStream {
     int index = -1;
     double timeBase = 0;
     ff::CodecContextPtr codec;
     ff::SwrContextPtr swr;
-    std::vector<float> pending; // interleaved output-format samples waiting to be mixed
-    bool started = false;       // a frame arrived since the last seek
-    bool ended = false;
+    bool started = false; // a frame arrived since the last seek
 };
 
-bool makeResampler(StreamDecoder &s, const AudioOutputFormat &out)
+bool makeResampler(AudioStream &s, const AudioOutputFormat &out)
 {
     AVChannelLayout inLayout;
     if (s.codec->ch_layout.order == AV_CHANNEL_ORDER_UNSPEC || s.codec->ch_layout.nb_channels <= 0)
@@ -52,6 +51,54 @@ bool makeResampler(StreamDecoder &s, const AudioOutputFormat &out)
 
 } // namespace
 
+// One run of the decoder thread: the opened input and its audio streams, the mix of what they
+// decoded, and where the request under way stands. Every step runs on the decoder thread.
+struct AudioDecoder::DecodeRun {
+    explicit DecodeRun(AudioDecoder &owner)
+        : d(owner)
+        , mix(owner.m_format.channels, std::size_t(kMaxStreamSkewSeconds * owner.m_format.sampleRate))
+    {
+    }
+
+    // Opens the input and a decoder and resampler for each of the requested audio streams that has
+    // them; says why not through `failed` when none has.
+    bool open();
+    // Takes a new request, if one came: empties the ring and seeks to a start's target; while there
+    // is nothing to decode, waits for one. False once the thread is to stop.
+    bool takeRequest();
+    void seek(std::int64_t targetNs);
+    enum class Read { Packet, Retry, Ended };
+    // Reads the next packet; a stalled read is to be tried again, up to a limit.
+    Read readPacket();
+    // Decodes the packet read into its stream, then mixes and writes what every stream has.
+    void decodePacket();
+    // The end of the input: drains every stream, writes all that is left and marks the ring's end.
+    void endOfInput();
+    // Receives the frames the stream's decoder has ready into its lane of the mix.
+    void receive(std::size_t lane);
+    void resample(std::size_t lane, const AVFrame *frame);
+    // Writes the mix into the ring, waiting for room. False when abandoned while waiting.
+    bool writeMix(bool all);
+    bool abandoned() const { return d.m_thread.stopping() || d.m_thread.hasNewerRequest(); }
+
+    AudioDecoder &d;
+
+    // The input, from open() on.
+    ff::InputFormatContextPtr format;
+    std::vector<AudioStream> streams; // the lanes of the mix, in this order
+    double startSeconds = 0;
+    ff::AVPacketPtr packet;
+    ff::AVFramePtr frame;
+
+    // The request under way.
+    bool active = false; // false: nothing to decode until the next request
+    double targetSeconds = 0;
+    int readRetries = 0;
+    AudioMix mix;
+    std::vector<float> resampled;
+    std::vector<std::int16_t> converted;
+};
+
 AudioDecoder::AudioDecoder(QString path, QList<int> streamIndexes, AudioOutputFormat format, AudioRing *ring,
     std::function<void(const QString &)> failed)
     : m_path(std::move(path))
@@ -59,237 +106,213 @@ AudioDecoder::AudioDecoder(QString path, QList<int> streamIndexes, AudioOutputFo
     , m_format(format)
     , m_ring(ring)
     , m_failed(std::move(failed))
+    , m_thread([this] { m_ring->wake(); })
 {
-    m_thread = std::thread([this] { run(); });
+    m_thread.start([this] { run(); });
 }
 
 AudioDecoder::~AudioDecoder()
 {
-    m_stop.cancel();
-    m_wake.notify_all();
-    m_ring->wake();
-    if (m_thread.joinable())
-        m_thread.join();
+    m_thread.stop();
 }
 
 std::uint64_t AudioDecoder::start(std::int64_t targetNs)
 {
-    std::uint64_t number;
-    {
-        std::lock_guard lock(m_mutex);
-        m_target = targetNs;
-        m_hasRequest = true;
-        number = ++m_latest;
-    }
-    m_wake.notify_all();
-    m_ring->wake();
-    return number;
+    return m_thread.post(Request{targetNs});
 }
 
 void AudioDecoder::stop()
 {
-    {
-        std::lock_guard lock(m_mutex);
-        m_target.reset();
-        m_hasRequest = true;
-        ++m_latest;
-    }
-    m_wake.notify_all();
-    m_ring->wake();
+    m_thread.post(Request{std::nullopt});
 }
 
 void AudioDecoder::run()
 {
-    QString error;
-    ff::InputFormatContextPtr format = openInput(m_path, m_stop, &error);
-    if (!format) {
-        if (!m_stop.isCancelled())
-            m_failed(QStringLiteral("no audio playback: %1").arg(error));
+    DecodeRun run(*this);
+    if (!run.open())
         return;
+    while (run.takeRequest()) {
+        if (!run.active)
+            continue;
+        switch (run.readPacket()) {
+        case DecodeRun::Read::Retry:
+            break;
+        case DecodeRun::Read::Ended:
+            run.endOfInput();
+            break;
+        case DecodeRun::Read::Packet:
+            run.decodePacket();
+            break;
+        }
     }
-    std::vector<StreamDecoder> streams;
-    for (int index : m_streams) {
+}
+
+bool AudioDecoder::DecodeRun::open()
+{
+    QString error;
+    format = openInput(d.m_path, d.m_thread.stopToken(), &error);
+    if (!format) {
+        if (!d.m_thread.stopping())
+            d.m_failed(QStringLiteral("no audio playback: %1").arg(error));
+        return false;
+    }
+    for (int index : d.m_streams) {
         if (index < 0 || index >= int(format->nb_streams) || format->streams[index]->codecpar->codec_type != AVMEDIA_TYPE_AUDIO)
             continue;
-        StreamDecoder s;
+        AudioStream s;
         s.index = index;
         s.timeBase = av_q2d(format->streams[index]->time_base);
         s.codec = openDecoder(format->streams[index], DecoderOptions{2}, &error);
         if (!s.codec) {
-            zaf::log::error(lcPlayback(), QStringLiteral("audio stream %1 of %2 is skipped: %3").arg(index).arg(m_path, error));
+            zaf::log::error(lcPlayback(), QStringLiteral("audio stream %1 of %2 is skipped: %3").arg(index).arg(d.m_path, error));
             continue;
         }
-        if (!makeResampler(s, m_format)) {
-            zaf::log::error(lcPlayback(), QStringLiteral("audio stream %1 of %2 cannot be resampled").arg(index).arg(m_path));
+        if (!makeResampler(s, d.m_format)) {
+            zaf::log::error(lcPlayback(), QStringLiteral("audio stream %1 of %2 cannot be resampled").arg(index).arg(d.m_path));
             continue;
         }
         streams.push_back(std::move(s));
     }
     if (streams.empty()) {
-        m_failed(QStringLiteral("%1 has no playable audio").arg(m_path));
-        return;
+        d.m_failed(QStringLiteral("%1 has no playable audio").arg(d.m_path));
+        return false;
     }
     for (unsigned i = 0; i < format->nb_streams; ++i) {
-        const bool used = std::any_of(streams.begin(), streams.end(), [i](const StreamDecoder &s) { return s.index == int(i); });
+        const bool used = std::any_of(streams.begin(), streams.end(), [i](const AudioStream &s) { return s.index == int(i); });
         if (!used)
             format->streams[i]->discard = AVDISCARD_ALL;
     }
+    startSeconds = containerStartSeconds(format.get());
+    packet = ff::makePacket();
+    frame = ff::makeFrame();
+    return packet && frame;
+}
 
-    const double startSeconds = containerStartSeconds(format.get());
-    const int channels = m_format.channels;
-    ff::AVPacketPtr packet = ff::makePacket();
-    ff::AVFramePtr frame = ff::makeFrame();
-    if (!packet || !frame)
-        return;
+bool AudioDecoder::DecodeRun::takeRequest()
+{
+    const std::optional<DecoderThread<Request>::Taken> next = d.m_thread.take(!active);
+    if (d.m_thread.stopping())
+        return false;
+    if (!next)
+        return true;
+    d.m_ring->clear();
+    d.m_serving = next->number;
+    active = next->request.targetNs.has_value();
+    if (active)
+        seek(*next->request.targetNs);
+    return true;
+}
 
-    std::uint64_t request = 0;
-    bool active = false;
-    bool draining = false;
-    double targetSeconds = 0;
-    int readRetries = 0;
-    std::vector<float> mixed;
-    std::vector<std::int16_t> converted;
+// The demuxer goes to the packet before the target; each stream's first frame is then lined up
+// with the target sample by sample (see resample()).
+void AudioDecoder::DecodeRun::seek(std::int64_t targetNs)
+{
+    targetSeconds = double(targetNs) / 1e9;
+    const std::int64_t ts = std::llround((targetSeconds + startSeconds) * AV_TIME_BASE);
+    const int rc = av_seek_frame(format.get(), -1, ts, AVSEEK_FLAG_BACKWARD);
+    if (rc < 0 && !d.m_thread.stopping())
+        zaf::log::error(lcPlayback(), QStringLiteral("cannot seek the audio of %1: %2").arg(d.m_path, ff::errorString(rc)));
+    for (AudioStream &s : streams) {
+        avcodec_flush_buffers(s.codec.get());
+        makeResampler(s, d.m_format);
+        s.started = false;
+    }
+    mix.reset(streams.size());
+    readRetries = 0;
+}
 
-    auto giveUp = [&] { return m_stop.isCancelled() || m_latest.load() != request; };
+AudioDecoder::DecodeRun::Read AudioDecoder::DecodeRun::readPacket()
+{
+    const int rc = av_read_frame(format.get(), packet.get());
+    if (rc == AVERROR(EAGAIN) && ++readRetries < kMaxConsecutiveReadRetries)
+        return Read::Retry;
+    if (rc < 0) {
+        if (rc != AVERROR_EOF && rc != AVERROR(EAGAIN) && !d.m_thread.stopping())
+            zaf::log::error(lcPlayback(), QStringLiteral("reading the audio of %1 stopped: %2").arg(d.m_path, ff::errorString(rc)));
+        return Read::Ended;
+    }
+    readRetries = 0;
+    return Read::Packet;
+}
 
-    // Mixes and writes what every live stream has; with `all`, everything that is left.
-    auto writeMix = [&](bool all) {
-        std::size_t frames = SIZE_MAX;
-        std::size_t most = 0;
-        for (const StreamDecoder &s : streams) {
-            most = std::max(most, s.pending.size() / channels);
-            if (!s.ended)
-                frames = std::min(frames, s.pending.size() / channels);
-        }
-        if (all || frames == SIZE_MAX || most > std::size_t(kMaxStreamSkewSeconds * m_format.sampleRate))
-            frames = most;
-        if (frames == 0)
-            return true;
-        mixed.assign(frames * channels, 0.0f);
-        for (StreamDecoder &s : streams) {
-            const std::size_t take = std::min(frames * channels, s.pending.size());
-            for (std::size_t i = 0; i < take; ++i)
-                mixed[i] += s.pending[i];
-            s.pending.erase(s.pending.begin(), s.pending.begin() + qsizetype(take));
-        }
-        for (float &v : mixed)
-            v = std::clamp(v, -1.0f, 1.0f);
-        if (m_format.float32)
-            return m_ring->write(reinterpret_cast<const char *>(mixed.data()), qsizetype(mixed.size() * sizeof(float)), giveUp);
-        converted.resize(mixed.size());
-        for (std::size_t i = 0; i < mixed.size(); ++i)
-            converted[i] = std::int16_t(std::lrint(mixed[i] * 32767.0f));
-        return m_ring->write(reinterpret_cast<const char *>(converted.data()), qsizetype(converted.size() * sizeof(std::int16_t)), giveUp);
-    };
-
-    auto resampleInto = [&](StreamDecoder &s, const AVFrame *f) {
-        const int capacity = swr_get_out_samples(s.swr.get(), f ? f->nb_samples : 0);
-        if (capacity <= 0)
-            return;
-        std::vector<float> out(std::size_t(capacity) * channels);
-        uint8_t *dst[1] = {reinterpret_cast<uint8_t *>(out.data())};
-        const int produced = swr_convert(s.swr.get(), dst, capacity,
-            f ? const_cast<const uint8_t **>(f->extended_data) : nullptr, f ? f->nb_samples : 0);
-        if (produced <= 0)
-            return;
-        out.resize(std::size_t(produced) * channels);
-        std::size_t skip = 0;
-        if (!s.started && f) {
-            s.started = true;
-            const std::int64_t ts = f->best_effort_timestamp != AV_NOPTS_VALUE ? f->best_effort_timestamp : f->pts;
-            if (ts != AV_NOPTS_VALUE) {
-                const double offset = targetSeconds - (double(ts) * s.timeBase - startSeconds);
-                if (offset > 0)
-                    skip = std::size_t(std::llround(offset * m_format.sampleRate)) * channels;
-                else if (offset < 0)
-                    s.pending.assign(std::size_t(std::llround(std::min(-offset, kMaxLeadingSilenceSeconds) * m_format.sampleRate)) * channels, 0.0f);
-            }
-        }
-        if (skip >= out.size())
-            return;
-        s.pending.insert(s.pending.end(), out.begin() + qsizetype(skip), out.end());
-    };
-
-    auto drainStream = [&](StreamDecoder &s) {
-        for (;;) {
-            const int rc = avcodec_receive_frame(s.codec.get(), frame.get());
-            if (rc == AVERROR_EOF) {
-                resampleInto(s, nullptr);
-                s.ended = true;
-                return;
-            }
-            if (rc < 0)
-                return;
-            resampleInto(s, frame.get());
-            av_frame_unref(frame.get());
-        }
-    };
-
-    while (!m_stop.isCancelled()) {
-        {
-            std::unique_lock lock(m_mutex);
-            if (!m_hasRequest && !active)
-                m_wake.wait(lock, [this] { return m_stop.isCancelled() || m_hasRequest; });
-            if (m_stop.isCancelled())
-                break;
-            if (m_hasRequest) {
-                m_hasRequest = false;
-                request = m_latest.load();
-                const std::optional<std::int64_t> target = m_target;
-                lock.unlock();
-                m_ring->clear();
-                m_serving = request;
-                active = target.has_value();
-                if (!active)
-                    continue;
-                targetSeconds = double(*target) / 1e9;
-                const std::int64_t ts = std::llround((targetSeconds + startSeconds) * AV_TIME_BASE);
-                const int rc = av_seek_frame(format.get(), -1, ts, AVSEEK_FLAG_BACKWARD);
-                if (rc < 0 && !m_stop.isCancelled())
-                    zaf::log::error(lcPlayback(), QStringLiteral("cannot seek the audio of %1: %2").arg(m_path, ff::errorString(rc)));
-                for (StreamDecoder &s : streams) {
-                    avcodec_flush_buffers(s.codec.get());
-                    makeResampler(s, m_format);
-                    s.pending.clear();
-                    s.started = false;
-                    s.ended = false;
-                }
-                draining = false;
-                readRetries = 0;
-            }
-        }
-
-        if (!draining) {
-            int rc = av_read_frame(format.get(), packet.get());
-            if (rc == AVERROR(EAGAIN)) {
-                if (++readRetries < kMaxConsecutiveReadRetries)
-                    continue;
-                rc = AVERROR_EOF;
-            }
-            if (rc < 0) {
-                if (rc != AVERROR_EOF && !m_stop.isCancelled())
-                    zaf::log::error(lcPlayback(), QStringLiteral("reading the audio of %1 stopped: %2").arg(m_path, ff::errorString(rc)));
-                draining = true;
-                for (StreamDecoder &s : streams) {
-                    avcodec_send_packet(s.codec.get(), nullptr);
-                    drainStream(s);
-                }
-                if (writeMix(true) && !giveUp())
-                    m_ring->setEnded();
-                active = false;
-                continue;
-            }
-            readRetries = 0;
-            for (StreamDecoder &s : streams) {
-                if (s.index == packet->stream_index) {
-                    avcodec_send_packet(s.codec.get(), packet.get());
-                    drainStream(s);
-                }
-            }
-            av_packet_unref(packet.get());
-            writeMix(false);
+void AudioDecoder::DecodeRun::decodePacket()
+{
+    for (std::size_t lane = 0; lane < streams.size(); ++lane) {
+        if (streams[lane].index == packet->stream_index) {
+            avcodec_send_packet(streams[lane].codec.get(), packet.get());
+            receive(lane);
         }
     }
+    av_packet_unref(packet.get());
+    writeMix(false);
+}
+
+void AudioDecoder::DecodeRun::endOfInput()
+{
+    for (std::size_t lane = 0; lane < streams.size(); ++lane) {
+        avcodec_send_packet(streams[lane].codec.get(), nullptr);
+        receive(lane);
+    }
+    if (writeMix(true) && !abandoned())
+        d.m_ring->setEnded();
+    active = false;
+}
+
+void AudioDecoder::DecodeRun::receive(std::size_t lane)
+{
+    for (;;) {
+        const int rc = avcodec_receive_frame(streams[lane].codec.get(), frame.get());
+        if (rc == AVERROR_EOF) {
+            resample(lane, nullptr); // what the resampler still holds
+            mix.end(lane);
+            return;
+        }
+        if (rc < 0)
+            return;
+        resample(lane, frame.get());
+        av_frame_unref(frame.get());
+    }
+}
+
+void AudioDecoder::DecodeRun::resample(std::size_t lane, const AVFrame *decoded)
+{
+    AudioStream &s = streams[lane];
+    const int channels = d.m_format.channels;
+    const int capacity = swr_get_out_samples(s.swr.get(), decoded ? decoded->nb_samples : 0);
+    if (capacity <= 0)
+        return;
+    resampled.resize(std::size_t(capacity) * channels);
+    uint8_t *dst[1] = {reinterpret_cast<uint8_t *>(resampled.data())};
+    const int produced = swr_convert(s.swr.get(), dst, capacity,
+        decoded ? const_cast<const uint8_t **>(decoded->extended_data) : nullptr, decoded ? decoded->nb_samples : 0);
+    if (produced <= 0)
+        return;
+    const std::size_t count = std::size_t(produced) * channels;
+    std::size_t skip = 0;
+    if (!s.started && decoded) {
+        s.started = true;
+        const std::int64_t ts = decoded->best_effort_timestamp != AV_NOPTS_VALUE ? decoded->best_effort_timestamp : decoded->pts;
+        if (ts != AV_NOPTS_VALUE) {
+            const LeadIn lead = leadIn(targetSeconds, double(ts) * s.timeBase - startSeconds, d.m_format.sampleRate, channels);
+            mix.appendSilence(lane, lead.silenceSamples);
+            skip = lead.dropSamples;
+        }
+    }
+    if (skip >= count)
+        return;
+    mix.append(lane, resampled.data() + skip, count - skip);
+}
+
+bool AudioDecoder::DecodeRun::writeMix(bool all)
+{
+    const std::vector<float> &mixed = mix.take(all);
+    if (mixed.empty())
+        return true;
+    const auto giveUp = [this] { return abandoned(); };
+    if (d.m_format.float32)
+        return d.m_ring->write(reinterpret_cast<const char *>(mixed.data()), qsizetype(mixed.size() * sizeof(float)), giveUp);
+    toSigned16(mixed, converted);
+    return d.m_ring->write(reinterpret_cast<const char *>(converted.data()), qsizetype(converted.size() * sizeof(std::int16_t)), giveUp);
 }
 
 } // namespace zaf::media::playback

@@ -7,19 +7,16 @@
 // Input: start(time) and stop() requests. Output: PCM in the ring, starting at exactly the requested
 // time, then the end mark at the end of the longest stream.
 
-#include "platform/media/core/cancel_token.h"
 #include "platform/media/playback/playback_audio_ring.h"
+#include "platform/media/playback/playback_decoder_thread.h"
 
 #include <QList>
 #include <QString>
 
 #include <atomic>
-#include <condition_variable>
 #include <cstdint>
 #include <functional>
-#include <mutex>
 #include <optional>
-#include <thread>
 
 namespace zaf::media::playback {
 
@@ -32,7 +29,7 @@ struct AudioOutputFormat {
 
 class AudioDecoder {
 public:
-    // `failed` runs on the decoder's thread when the movie cannot be opened for audio.
+    // `failed` runs on the decoder thread when the movie cannot be opened for audio.
     AudioDecoder(QString path, QList<int> streamIndexes, AudioOutputFormat format, AudioRing *ring,
         std::function<void(const QString &)> failed);
     ~AudioDecoder(); // stops the thread and waits for it
@@ -47,22 +44,20 @@ public:
     std::uint64_t servingRequest() const { return m_serving.load(); }
 
 private:
+    struct Request {
+        std::optional<std::int64_t> targetNs; // none for a stop
+    };
+    struct DecodeRun; // what one run of the thread holds, and its steps
     void run();
 
     const QString m_path;
     const QList<int> m_streams;
     const AudioOutputFormat m_format;
     AudioRing *const m_ring;
-    const std::function<void(const QString &)> m_failed;
+    const std::function<void(const QString &)> m_failed; // decoder thread
 
-    CancelToken m_stop;
-    std::atomic<std::uint64_t> m_latest{0};  // the latest request
     std::atomic<std::uint64_t> m_serving{0};
-    std::mutex m_mutex;
-    std::condition_variable m_wake;
-    std::optional<std::int64_t> m_target; // pending start, or none for a stop
-    bool m_hasRequest = false;
-    std::thread m_thread;
+    DecoderThread<Request> m_thread;
 };
 
 } // namespace zaf::media::playback

@@ -10,26 +10,21 @@
 // in order until the end of the stream. A newer request abandons an older one at once, so a burst
 // of requests costs one decode.
 
-#include "platform/media/core/cancel_token.h"
+#include "platform/media/playback/playback_decoder_thread.h"
 #include "platform/media/playback/playback_frame_queue.h"
 
 #include <QString>
 
-#include <atomic>
-#include <condition_variable>
 #include <cstdint>
 #include <functional>
-#include <mutex>
-#include <optional>
-#include <thread>
 
 namespace zaf::media::playback {
 
 class VideoDecoder {
 public:
-    // `framesReady` runs on the decoder's thread after each picture it queues; it must be cheap and
-    // must not call back into the decoder. `failed` runs on the decoder's thread once when the
-    // stream cannot be opened or decoded, with a message.
+    // `framesReady` runs on the decoder thread after each picture it queues; it must be cheap and
+    // must not call back into the decoder. `failed` runs on the decoder thread once when the stream
+    // cannot be opened or decoded, with a message.
     VideoDecoder(QString path, int streamIndex, FrameQueue *queue, std::function<void()> framesReady,
         std::function<void(const QString &)> failed);
     // Stops the thread (interrupting any blocking read) and waits for it.
@@ -45,21 +40,15 @@ private:
         std::int64_t targetNs;
         std::uint64_t generation;
     };
+    struct DecodeRun; // what one run of the thread holds, and its steps
     void run();
-    bool hasNewerRequest() const;
 
     const QString m_path;
     const int m_streamIndex;
     FrameQueue *const m_queue;
-    const std::function<void()> m_framesReady;
-    const std::function<void(const QString &)> m_failed;
-
-    CancelToken m_stop;
-    std::atomic<bool> m_requestPending{false};
-    mutable std::mutex m_mutex;
-    std::condition_variable m_wake;
-    std::optional<Request> m_request;
-    std::thread m_thread;
+    const std::function<void()> m_framesReady;             // decoder thread
+    const std::function<void(const QString &)> m_failed;  // decoder thread
+    DecoderThread<Request> m_thread;
 };
 
 } // namespace zaf::media::playback
