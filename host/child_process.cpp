@@ -167,8 +167,8 @@ bool ChildProcess::start(const ChildSpec &spec, QString *error)
     // close-on-exec set: it is handed over from a copy instead.
     UniqueFd copy;
     int handed = spec.handedFd;
-    if (handed >= 0 && handed == spec.childFd) {
-        copy.reset(::fcntl(handed, F_DUPFD_CLOEXEC, spec.childFd + 1));
+    if (handed == kHandedFd) {
+        copy.reset(::fcntl(handed, F_DUPFD_CLOEXEC, kHandedFd + 1));
         if (!copy.isValid())
             return fail(QStringLiteral("cannot hand descriptor %1 to %2: %3").arg(handed).arg(spec.program, errnoText(errno)));
         handed = copy.get();
@@ -183,7 +183,9 @@ bool ChildProcess::start(const ChildSpec &spec, QString *error)
     posix_spawn_file_actions_t actions;
     posix_spawn_file_actions_init(&actions);
     if (handed >= 0)
-        posix_spawn_file_actions_adddup2(&actions, handed, spec.childFd);
+        posix_spawn_file_actions_adddup2(&actions, handed, kHandedFd);
+    // Whatever else the host left open without close-on-exec stays behind.
+    posix_spawn_file_actions_addclosefrom_np(&actions, handed >= 0 ? kHandedFd + 1 : kHandedFd);
     posix_spawnattr_t attributes;
     posix_spawnattr_init(&attributes);
     sigset_t none;

@@ -9,8 +9,8 @@
 // joins it.
 //
 // The child starts with no blocked signals and SIGPIPE at its default, whatever the host does, and
-// with none of the host's descriptors but its standard three and the one handed over (the host's
-// own must be close-on-exec).
+// with none of the host's descriptors but the standard three and the one handed over, which it
+// finds as descriptor 3 (kHandedFd).
 
 #include <QByteArray>
 #include <QList>
@@ -24,12 +24,14 @@
 
 namespace zaf::host {
 
+// The number the handed descriptor has in the child.
+inline constexpr int kHandedFd = 3;
+
 struct ChildSpec {
-    QString program;                  // a path; no PATH search
-    QStringList arguments;            // after the program's name
-    QList<QByteArray> environment;    // NAME=VALUE entries set over the host's own environment
-    int handedFd = -1;                // a descriptor of the host's, given to the child as childFd
-    int childFd = 3;
+    QString program;               // a path; no PATH search
+    QStringList arguments;         // after the program's name
+    QList<QByteArray> environment; // NAME=VALUE entries set over the host's own environment
+    int handedFd = -1;             // a descriptor of the host's, given to the child as kHandedFd; -1: none
 };
 
 class ChildProcess : public QObject {

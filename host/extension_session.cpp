@@ -21,6 +21,8 @@ Q_LOGGING_CATEGORY(lcHost, "zaf.host")
 
 namespace zaf::host {
 
+static_assert(kChildChannelFd == kHandedFd);
+
 namespace {
 
 namespace rpc = zaf::extensionkit::jsonrpc;
@@ -220,7 +222,6 @@ bool ExtensionSession::start(const QString &extensionExecutable, const QList<Inp
     spec.program = extensionExecutable;
     spec.environment = {QByteArray(kChannelFdVariable) + '=' + QByteArray::number(kChildChannelFd)};
     spec.handedFd = extensionEnd.get();
-    spec.childFd = kChildChannelFd;
     QString spawnError;
     if (!d->child.start(spec, &spawnError))
         return fail(spawnError);

@@ -2,21 +2,20 @@
 // testing the host side against a real process over a real socket pair. The steps come from
 // $ZAF_FAKE_STEPS, split at spaces (the host passes no arguments); it exits 0 after the last one.
 //
-//   accept / reject   read beginExtensionRequest, answer {"accepted": true} / a JSON-RPC error
+//   take              read beginExtensionRequest and leave it unanswered
+//   accept / reject   take, then answer {"accepted": true} / a JSON-RPC error
 //   report A,B,...    send extensionDidFinishWithActivityTypes with these types ("-": none)
 //   report-slowly A   the same, written one byte at a time
 //   report-big N      a report of N activity types of 100 characters each
-//   garbage           a frame whose payload is not JSON
-//   bad-params        an extensionDidFinishWithActivityTypes whose params are not an array of arrays
+//   send PAYLOAD      a frame carrying PAYLOAD as it is (JSON or not)
 //   oversized         a length prefix of 1 MiB + 1 followed by a few bytes
 //   partial           a length prefix of 100 followed by 10 bytes, then the channel is closed
-//   call-unknown      a request (id 7) for a method the host does not have
 //   expect-error      read one message; exit 4 unless it is a JSON-RPC error answer with id 7
 //   await-remove      read until the removeExtensionView notification (exit 0); exit 3 at end of channel
 //   await-eof         read until the end of the channel
-//   close / hang / ignore-term / crash / exit N
-// With $ZAF_FAKE_DUMP set, the request, the channel and marker variables, whether descriptor 3 is a
-// socket and whether SIGPIPE was at its default at start are written there as JSON.
+//   close / hang / crash / exit N
+// With $ZAF_FAKE_DUMP set, the request, the channel variable and whether descriptor 3 is a socket
+// are written there as JSON.
 
 #include "platform/extensionkit/frame_codec.h"
 
@@ -28,7 +27,6 @@
 #include <QtEndian>
 
 #include <cerrno>
-#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <optional>
@@ -101,14 +99,12 @@ std::optional<QJsonObject> readMessage()
     return document.object();
 }
 
-void dump(const QString &path, const QJsonObject &request, bool sigpipeDefault)
+void dump(const QString &path, const QJsonObject &request)
 {
     struct stat info {};
     const QJsonObject out{{"request", request},
                           {"channelVariable", qEnvironmentVariable("ZAF_EXTENSION_CHANNEL_FD")},
-                          {"marker", qEnvironmentVariable("ZAF_FAKE_MARKER")},
-                          {"fd3IsSocket", ::fstat(3, &info) == 0 && S_ISSOCK(info.st_mode)},
-                          {"sigpipeDefault", sigpipeDefault}};
+                          {"fd3IsSocket", ::fstat(3, &info) == 0 && S_ISSOCK(info.st_mode)}};
     QFile file(path);
     if (!file.open(QIODevice::WriteOnly) || file.write(QJsonDocument(out).toJson()) < 0)
         die("cannot write the dump", 9);
@@ -118,8 +114,6 @@ void dump(const QString &path, const QJsonObject &request, bool sigpipeDefault)
 
 int main()
 {
-    struct sigaction atStart {};
-    ::sigaction(SIGPIPE, nullptr, &atStart);
     const QStringList args = qEnvironmentVariable("ZAF_FAKE_STEPS").split(' ', Qt::SkipEmptyParts);
     for (int i = 0; i < args.size(); ++i) {
         const QString &step = args[i];
@@ -128,12 +122,14 @@ int main()
                 die("a step lacks its argument", 2);
             return args[++i];
         };
-        if (step == "accept" || step == "reject") {
+        if (step == "take" || step == "accept" || step == "reject") {
             const std::optional<QJsonObject> request = readMessage();
             if (!request || request->value("method") != "beginExtensionRequest" || !request->contains("id"))
                 die("expected beginExtensionRequest", 8);
             if (!qEnvironmentVariableIsEmpty("ZAF_FAKE_DUMP"))
-                dump(qEnvironmentVariable("ZAF_FAKE_DUMP"), *request, atStart.sa_handler == SIG_DFL);
+                dump(qEnvironmentVariable("ZAF_FAKE_DUMP"), *request);
+            if (step == "take")
+                continue;
             if (step == "accept")
                 writeAll(frame({{"id", request->value("id")}, {"result", QJsonObject{{"accepted", true}}}}));
             else
@@ -151,18 +147,14 @@ int main()
             for (int n = 0, count = argument().toInt(); n < count; ++n)
                 types << QString("%1").arg(n, 100, 10, QLatin1Char('0'));
             writeAll(report(types));
-        } else if (step == "garbage") {
-            writeAll(zaf::extensionkit::encodeFrame("this is not JSON {"));
-        } else if (step == "bad-params") {
-            writeAll(frame({{"method", "extensionDidFinishWithActivityTypes"}, {"params", QJsonArray{"not an array"}}}));
+        } else if (step == "send") {
+            writeAll(zaf::extensionkit::encodeFrame(argument().toUtf8()));
         } else if (step == "oversized") {
             writeAll(lengthPrefix(1024 * 1024 + 1) + QByteArray(64, 'x'));
         } else if (step == "partial" || step == "close") {
             if (step == "partial")
                 writeAll(lengthPrefix(100) + QByteArray(10, '{'));
             ::close(std::exchange(g_fd, -1));
-        } else if (step == "call-unknown") {
-            writeAll(frame({{"id", 7}, {"method", "openTheDoor"}}));
         } else if (step == "expect-error") {
             const std::optional<QJsonObject> answer = readMessage();
             if (!answer || answer->value("id").toInt() != 7 || !answer->value("error").isObject())
@@ -179,8 +171,6 @@ int main()
         } else if (step == "hang") {
             for (;;)
                 ::pause();
-        } else if (step == "ignore-term") {
-            std::signal(SIGTERM, SIG_IGN);
         } else if (step == "crash") {
             const rlimit noCore{0, 0};
             ::setrlimit(RLIMIT_CORE, &noCore);
