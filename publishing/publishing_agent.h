@@ -14,7 +14,6 @@
 #include <QtPlugin>
 
 #include <functional>
-#include <functional>
 #include <optional>
 
 namespace zaf::ui {

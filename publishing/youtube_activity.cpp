@@ -3,30 +3,32 @@
 #include "identity/framework_strings.h"
 #include "media/audio_mix_utility.h"
 #include "platform/capability/capability_service.h"
-#include "platform/log.h"
 #include "platform/dispatch.h"
+#include "platform/log.h"
 #include "platform/media/export_session.h"
 #include "platform/media/media_asset.h"
 #include "platform/text/object_format.h"
-#include "platform/ui/view_controller.h"
-#include "publishing/plugin_loader.h"
 #include "platform/ui/screen.h"
+#include "platform/ui/view_controller.h"
+#include "publishing/activity_items.h"
+#include "publishing/agent_class_slot.h"
+#include "publishing/form_reflection.h"
 #include "tempstore/temp_directory.h"
 #include "tempstore/temp_store.h"
 
 #include <QAbstractButton>
-#include <QPushButton>
 #include <QCoreApplication>
 #include <QDateTime>
 #include <QDesktopServices>
-#include <QMessageBox>
 #include <QFile>
-#include <QMetaType>
+#include <QMessageBox>
 #include <QPixmap>
+#include <QPushButton>
 #include <QSvgRenderer>
-#include <QVariantMap>
 
 #include <mutex>
+
+using namespace zaf::publishing;
 
 namespace {
 Q_LOGGING_CATEGORY(lcYouTubeActivity, "zaf.publishing.activity")
@@ -37,22 +39,6 @@ const QString &imageBundlePath()
 {
     static const QString path = QStringLiteral(":/zaf/publishing/");
     return path;
-}
-
-bool isLocalFileURL(const QVariant &item)
-{
-    return item.typeId() == QMetaType::QUrl && item.toUrl().isLocalFile();
-}
-
-bool isString(const QVariant &item)
-{
-    return item.typeId() == QMetaType::QString;
-}
-
-bool opensAsPlayableMovie(const QUrl &url)
-{
-    const std::shared_ptr<zaf::media::MediaAsset> asset = zaf::media::MediaAsset::assetWithURL(url);
-    return asset && asset->load() && asset->isPlayable();
 }
 
 // The category the form pre-selects.
@@ -67,53 +53,6 @@ QString localized(const char *key)
 {
     const QString name = QLatin1String(key);
     return ZafLocalizedFrameworkString(name).value_or(name);
-}
-
-// The process-wide slot of the agent class. The first use loads the plug-in and looks the class up;
-// the plug-in stays loaded and the class stays stored for the life of the process. Either failure
-// stops the process: without the plug-in there is nothing to publish with.
-struct AgentClassSlot {
-    ZafPublishingPluginInterface *plugin = nullptr;
-    const QMetaObject *agentClass = nullptr;
-};
-
-const AgentClassSlot &agentClassSlot()
-{
-    static AgentClassSlot slot;
-    if (slot.agentClass)
-        return slot;
-    const QString path = zaf::publishing::defaultPublishingPluginPath();
-    const auto plugin = zaf::publishing::loadPublishingPlugin(path);
-    if (!plugin.ok())
-        qFatal("%s", qPrintable(plugin.errorText));
-    const auto agentClass = zaf::publishing::publishingAgentClass(path, QLatin1String(kZafYouTubePublishingAgentClassName));
-    if (!agentClass.ok())
-        qFatal("Unable to find class %s", kZafYouTubePublishingAgentClassName);
-    slot.plugin = plugin.value;
-    slot.agentClass = agentClass.value;
-    return slot;
-}
-
-// Calls `method` on `target` by name, as the plug-in's objects publish it. A call that cannot be
-// made (no target, a method renamed or gone, other arguments) is logged, never silent.
-template <typename... Arguments>
-bool invokeByName(QObject *target, const char *method, Arguments... arguments)
-{
-    if (target && QMetaObject::invokeMethod(target, method, arguments...))
-        return true;
-    zaf::log::error(lcYouTubeActivity(), QStringLiteral("the publishing form does not answer %1 on %2")
-                                             .arg(QString::fromLatin1(method),
-                                                  target ? QString::fromLatin1(target->metaObject()->className()) : QStringLiteral("nothing")));
-    return false;
-}
-
-// A QObject* the form publishes as a property; logged when it is missing.
-QObject *objectProperty(QObject *form, const char *name)
-{
-    QObject *object = form->property(name).value<QObject *>();
-    if (!object)
-        zaf::log::error(lcYouTubeActivity(), QStringLiteral("the publishing form has no %1").arg(QString::fromLatin1(name)));
-    return object;
 }
 
 bool exportHasEnded(zaf::media::ExportStatus status)
@@ -233,74 +172,81 @@ QUrl ZafYouTubeActivity::tempFileURLForTime(double secondsSince1970)
     return QUrl::fromLocalFile(ZafTempMovieFileNameAt(stem, secondsSince1970));
 }
 
-QUrl ZafYouTubeActivity::movieInItems(const QVariantList &activityItems)
-{
-    // The share flow puts the movie before any attachment, in both of its lists (position 2 of the
-    // usual one, position 1 of a list led by the host's message). A later file is the attachment:
-    // it is never taken instead, even when the movie does not play.
-    for (const QVariant &item : activityItems) {
-        if (!isLocalFileURL(item))
-            continue;
-        const QUrl url = item.toUrl();
-        return opensAsPlayableMovie(url) ? url : QUrl();
-    }
-    return {};
-}
-
-QString ZafYouTubeActivity::descriptionForItems(const QVariantList &activityItems)
-{
-    const bool textFirst = !activityItems.isEmpty() && isString(activityItems.at(0));
-    const bool textSecond = activityItems.size() > 1 && isString(activityItems.at(1));
-    if (textFirst && textSecond)
-        return activityItems.at(0).toString() + QLatin1Char(' ') + activityItems.at(1).toString();
-    if (textFirst)
-        return activityItems.at(0).toString();
-    if (textSecond)
-        return activityItems.at(1).toString();
-    return {};
-}
-
 void ZafYouTubeActivity::prepareWithActivityItems(const QVariantList &activityItems)
 {
     zaf::ui::ShareActivity::prepareWithActivityItems(activityItems);
 
+    const std::uint64_t preparation = ++m_preparation;
     m_movieURL = tempFileURL();
-    // The editor names its movie; the items are only searched when it did not.
-    m_sourceMovieURL = m_editorMovieURL.isEmpty() ? movieInItems(activityItems) : m_editorMovieURL;
+    m_descriptionText = descriptionForItems(activityItems);
     m_exportSession.reset();
+    m_probingMovie = false;
+    // The editor names its movie; the items are only searched when it did not.
+    m_sourceMovieURL = m_editorMovieURL;
+    const QUrl candidate = m_sourceMovieURL.isEmpty() ? movieCandidateInItems(activityItems) : QUrl();
+    const std::shared_ptr<zaf::media::MediaAsset> asset = candidate.isEmpty() ? nullptr : zaf::media::MediaAsset::assetWithURL(candidate);
+    if (!asset) {
+        startCopy();
+        return;
+    }
+    // Whether the candidate plays is only known once it has been opened and read, which the main
+    // thread must not wait for: the asset loads on the global queue, and the answer hops back.
+    m_probingMovie = true;
+    const QPointer<ZafYouTubeActivity> self(this);
+    asset->loadAsynchronously([asset, candidate, self, preparation] {
+        // A thread of the default-priority global queue.
+        const QUrl movie = asset->isPlayable() ? candidate : QUrl();
+        zaf::dispatch::onThreadOf(QCoreApplication::instance(), [self, preparation, movie] {
+            if (self)
+                self->movieProbeDidEnd(preparation, movie);
+        });
+    });
+}
 
+void ZafYouTubeActivity::movieProbeDidEnd(std::uint64_t preparation, const QUrl &movie)
+{
+    if (preparation != m_preparation || !m_probingMovie)
+        return;
+    m_probingMovie = false;
+    m_sourceMovieURL = movie;
+    startCopy();
+    // A press of Publish waited for the probe; without an export there is nothing more to wait for.
+    if (m_waitingForExport && !m_exportSession)
+        startPublishing();
+}
+
+void ZafYouTubeActivity::startCopy()
+{
     if (m_sourceMovieURL.isEmpty()) {
         zaf::log::notice(lcYouTubeActivity(), QStringLiteral("ZafYouTubeActivity: no movie among the activity items"));
-    } else {
-        m_exportSession = ZafAudioMixUtility::exportSessionForMixingAudio(m_sourceMovieURL, m_movieURL);
-        if (!m_exportSession) {
-            zaf::log::notice(lcYouTubeActivity(), QStringLiteral("ZafYouTubeActivity: no export session for the movie"));
-        } else {
-            // The session keeps itself alive until its completion has run; the completion must not
-            // keep it alive beyond that, so it looks at the session through a weak reference.
-            // The end of the export also hops to the main thread, where a press of Publish may be
-            // waiting for the copy; the session's id tells a stale export from the current one.
-            const std::weak_ptr<zaf::media::ExportSession> weakSession = m_exportSession;
-            const std::uint64_t sessionID = m_exportSession->sessionID();
-            const QPointer<ZafYouTubeActivity> self(this);
-            m_exportSession->exportAsynchronously([weakSession, sessionID, self] {
-                zaf::dispatch::onThreadOf(QCoreApplication::instance(), [self, sessionID] {
-                    if (self)
-                        self->exportDidEnd(sessionID);
-                });
-                const std::shared_ptr<zaf::media::ExportSession> session = weakSession.lock();
-                if (!session)
-                    return;
-                const zaf::media::ExportStatus status = session->status();
-                if (status == zaf::media::ExportStatus::Failed || status == zaf::media::ExportStatus::Cancelled)
-                    return;
-                zaf::log::info(lcYouTubeActivity(),
-                               QStringLiteral("ZafYouTubeActivity: Export Mixed YouTube Video Complete."));
-            });
-        }
+        return;
     }
-
-    m_descriptionText = descriptionForItems(activityItems);
+    m_exportSession = ZafAudioMixUtility::exportSessionForMixingAudio(m_sourceMovieURL, m_movieURL);
+    if (!m_exportSession) {
+        zaf::log::notice(lcYouTubeActivity(), QStringLiteral("ZafYouTubeActivity: no export session for the movie"));
+        return;
+    }
+    // The session keeps itself alive until its completion has run; the completion must not keep it
+    // alive beyond that, so it looks at the session through a weak reference. The end of the export
+    // also hops to the main thread, where a press of Publish may be waiting for the copy; the
+    // session's id tells a stale export from the current one.
+    const std::weak_ptr<zaf::media::ExportSession> weakSession = m_exportSession;
+    const std::uint64_t sessionID = m_exportSession->sessionID();
+    const QPointer<ZafYouTubeActivity> self(this);
+    m_exportSession->exportAsynchronously([weakSession, sessionID, self] {
+        // The export's thread.
+        zaf::dispatch::onThreadOf(QCoreApplication::instance(), [self, sessionID] {
+            if (self)
+                self->exportDidEnd(sessionID);
+        });
+        const std::shared_ptr<zaf::media::ExportSession> session = weakSession.lock();
+        if (!session)
+            return;
+        const zaf::media::ExportStatus status = session->status();
+        if (status == zaf::media::ExportStatus::Failed || status == zaf::media::ExportStatus::Cancelled)
+            return;
+        zaf::log::info(lcYouTubeActivity(), QStringLiteral("ZafYouTubeActivity: Export Mixed YouTube Video Complete."));
+    });
 }
 
 zaf::ui::ViewController *ZafYouTubeActivity::activityViewController()
@@ -311,13 +257,8 @@ zaf::ui::ViewController *ZafYouTubeActivity::activityViewController()
         m_publishingAgent->setDelegate(nullptr);
         QObject::disconnect(m_progressConnection);
     }
-    QObject *instance = slot.agentClass->newInstance();
-    auto *agent = qobject_cast<ZafPublishingAgent *>(instance);
-    if (!agent) {
-        delete instance;
-        qFatal("Unable to find class %s", kZafYouTubePublishingAgentClassName);
-    }
-    m_publishingAgent.reset(agent);
+    m_publishingAgent = newPublishingAgent();
+    ZafPublishingAgent *agent = m_publishingAgent.get();
     agent->setDelegate(this);
     agent->setMediaPath(m_movieURL.toLocalFile());
     m_progressConnection = connect(agent, &ZafPublishingAgent::uploadProgress, this, [this](qint64 sent, qint64 total) {
@@ -335,13 +276,7 @@ zaf::ui::ViewController *ZafYouTubeActivity::activityViewController()
 
     if (form) {
         form->view();
-        QObject *cell = nullptr;
-        if (QObject *table = objectProperty(form, kZafFormTableProperty))
-            invokeByName(table, kZafTableCellMethod, Q_RETURN_ARG(QObject *, cell), Q_ARG(int, 1), Q_ARG(int, 0));
-        if (cell) {
-            invokeByName(cell, kZafCellSetValueMethod, Q_ARG(QString, m_descriptionText));
-            invokeByName(cell, kZafCellSetPlaceholderMethod, Q_ARG(QString, QString()));
-        }
+        fillDescriptionOfForm(form, m_descriptionText);
     }
 
     m_waitingForExport = false;
@@ -350,28 +285,8 @@ zaf::ui::ViewController *ZafYouTubeActivity::activityViewController()
 
 void ZafYouTubeActivity::selectDefaultCategoryOfForm(QObject *form)
 {
-    if (!form)
-        return;
-    const QVariantList categories = form->property(kZafFormCategoriesProperty).toList();
-    if (categories.isEmpty()) {
-        zaf::log::error(lcYouTubeActivity(), QStringLiteral("the publishing form lists no categories"));
-        return;
-    }
-    QObject *picker = objectProperty(form, kZafFormPickerProperty);
-    for (int row = 0; row < categories.size(); ++row) {
-        const QVariantMap entry = categories.at(row).toMap();
-        const QString categoryId = entry.value(QLatin1String(kZafPublishingCategoryIdKey)).toString();
-        if (categoryId.toLower() != defaultCategoryId())
-            continue;
-        const QString label = entry.value(QLatin1String(kZafPublishingCategoryLabelKey)).toString();
-        QObject *cell = nullptr;
-        if (invokeByName(form, kZafFormCategoryCellMethod, Q_RETURN_ARG(QObject *, cell)) && cell)
-            invokeByName(cell, kZafCategoryCellSetLabelMethod, Q_ARG(QString, label));
-        form->setProperty(kZafFormDefaultCategoryProperty, categoryId);
-        if (picker)
-            invokeByName(picker, kZafPickerSelectRowMethod, Q_ARG(int, row), Q_ARG(int, 0), Q_ARG(bool, false));
-        return;
-    }
+    if (form)
+        selectCategoryOfForm(form, defaultCategoryId());
 }
 
 void ZafYouTubeActivity::publishingAgentWillBeDisplayed(ZafPublishingAgent *agent)
@@ -449,6 +364,12 @@ void ZafYouTubeActivity::publishingAgentWillBeginPublishing(ZafPublishingAgent *
     m_proceedWithPublishing = std::move(proceed);
     if (m_waitingForExport || !m_publishingAgent)
         return;
+    if (m_probingMovie) {
+        // The movie is still being probed: cover the form and publish once its copy is complete.
+        m_waitingForExport = true;
+        showProgressOverlay();
+        return;
+    }
     const std::shared_ptr<zaf::media::ExportSession> session = m_exportSession;
     if (session) {
         const zaf::media::ExportStatus status = session->status();
@@ -517,8 +438,11 @@ void ZafYouTubeActivity::cancelFromOverlay()
         publishingAgentCancelButtonClicked(agent);
 }
 
-void ZafYouTubeActivity::removeMovieCopy() const
+void ZafYouTubeActivity::removeMovieCopy()
 {
+    // A probe still running would start the export after the removal: its answer is dropped.
+    m_probingMovie = false;
+    ++m_preparation;
     if (m_movieURL.isEmpty())
         return;
     // The copy's export may still be writing it (Cancel while it runs): it is cancelled, and the
@@ -527,6 +451,7 @@ void ZafYouTubeActivity::removeMovieCopy() const
     const std::shared_ptr<zaf::media::ExportSession> session = m_exportSession;
     const QUrl copy = m_movieURL;
     zaf::dispatch::async(zaf::dispatch::Priority::Background, [session, copy] {
+        // A thread of the background global queue.
         if (session)
             session->cancelExportAndWait();
         ZafTempStore::defaultStore()._srRemoveFile(copy);

@@ -1,6 +1,7 @@
 // The publishing plug-in as the editor uses it: loaded from its file, its agent class found by name,
 // the form's interior reached by name and the agent's delegate calls. Uploads: see the flow tests.
 #include "platform/ui/view_controller.h"
+#include "publishing/form_reflection.h"
 #include "publishing/plugin_loader.h"
 #include "publishing/publishing_agent.h"
 #include "publishing/youtube_activity.h"
@@ -16,6 +17,11 @@
 #include <memory>
 
 namespace {
+
+// Test names show a case's name, not its bytes.
+template <typename Case>
+    requires requires(const Case &c) { c.name; }
+void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
 
 const QString kPluginPath = QStringLiteral(ZAF_PUBLISHING_PLUGIN_PATH);
 
@@ -80,68 +86,94 @@ protected:
     RecordingDelegate m_delegate;
 };
 
-// The plug-in loads with the expected API version and gives its agent class by name (cached); a
-// wrong class name, a file that is no plug-in and a missing file are refused with a reason.
-TEST(PublishingPluginTest, LoadsThePluginAndFindsTheAgentClassByName)
+// The plug-in loads with the API version this program needs.
+TEST(PublishingPluginTest, LoadsWithTheExpectedApiVersion)
 {
     const auto plugin = zaf::publishing::loadPublishingPlugin(kPluginPath);
     ASSERT_TRUE(plugin.ok()) << plugin.errorText.toStdString();
     EXPECT_EQ(plugin.value->apiVersion(), kZafPublishingPluginApiVersion);
+}
 
-    const auto agentClass = zaf::publishing::publishingAgentClass(kPluginPath, QStringLiteral("ZafYouTubePublishingAgent"));
+// The agent class is found by name, once: a later look-up gives the same class, which makes agents.
+TEST(PublishingPluginTest, FindsTheAgentClassByName)
+{
+    const auto agentClass = zaf::publishing::publishingAgentClass(kPluginPath, QLatin1String(kZafYouTubePublishingAgentClassName));
     ASSERT_TRUE(agentClass.ok()) << agentClass.errorText.toStdString();
-    EXPECT_STREQ(agentClass.value->className(), "ZafYouTubePublishingAgent");
-    EXPECT_EQ(zaf::publishing::publishingAgentClass(kPluginPath, QStringLiteral("ZafYouTubePublishingAgent")).value,
+    EXPECT_STREQ(agentClass.value->className(), kZafYouTubePublishingAgentClassName);
+    EXPECT_EQ(zaf::publishing::publishingAgentClass(kPluginPath, QLatin1String(kZafYouTubePublishingAgentClassName)).value,
               agentClass.value);
     std::unique_ptr<QObject> agent(agentClass.value->newInstance());
     EXPECT_NE(qobject_cast<ZafPublishingAgent *>(agent.get()), nullptr);
-
-    const auto missing = zaf::publishing::publishingAgentClass(kPluginPath, QStringLiteral("NoSuchAgent"));
-    EXPECT_FALSE(missing.ok());
-    EXPECT_TRUE(missing.errorText.contains(QLatin1String("NoSuchAgent")));
-
-    zaf::test::ScratchDir scratch;
-    const auto refused = zaf::publishing::loadPublishingPlugin(scratch.write(QStringLiteral("libnot_a_plugin.so"), 64));
-    EXPECT_FALSE(refused.ok());
-    EXPECT_FALSE(refused.errorText.isEmpty());
-    const auto absent = zaf::publishing::publishingAgentClass(scratch.file(QStringLiteral("absent.so")),
-                                                               QStringLiteral("ZafYouTubePublishingAgent"));
-    EXPECT_FALSE(absent.ok());
-    EXPECT_FALSE(absent.errorText.isEmpty());
 }
 
-// The names the share action relies on reach the form's table, description cell and categories;
-// the form's own routine pre-selects "22" (the picker and cell names are used by the routine below).
-TEST_F(PublishingAgentTest, TheFormsNamedInteriorIsReachable)
+struct RefusedLookup {
+    const char *name;
+    const char *file;      // "" for the built plug-in; else a scratch file, written when `written`
+    bool written;
+    const char *className; // the name that is looked up, and so named by the reason
+};
+
+class RefusedLookupTest : public ::testing::TestWithParam<RefusedLookup> {};
+
+// A wrong class name, a file that is no plug-in and a missing file are refused with a reason.
+TEST_P(RefusedLookupTest, IsRefusedWithAReason)
+{
+    const RefusedLookup &c = GetParam();
+    zaf::test::ScratchDir scratch;
+    const QString file = QString::fromLatin1(c.file);
+    const QString path = file.isEmpty() ? kPluginPath : c.written ? scratch.write(file, 64) : scratch.file(file);
+    const auto lookup = zaf::publishing::publishingAgentClass(path, QString::fromLatin1(c.className));
+    EXPECT_FALSE(lookup.ok());
+    EXPECT_FALSE(lookup.errorText.isEmpty());
+    if (file.isEmpty()) {
+        EXPECT_TRUE(lookup.errorText.contains(QLatin1String(c.className))) << lookup.errorText.toStdString();
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Lookups, RefusedLookupTest, ::testing::Values(
+    RefusedLookup{"WrongClassName", "", false, "NoSuchAgent"},
+    RefusedLookup{"NotAPlugin", "libnot_a_plugin.so", true, kZafYouTubePublishingAgentClassName},
+    RefusedLookup{"MissingFile", "absent.so", false, kZafYouTubePublishingAgentClassName}),
+    [](const auto &info) { return std::string(info.param.name); });
+
+// The description cell is reached through the form's table, as the share action reaches it; row 3
+// has no such cell.
+TEST_F(PublishingAgentTest, TheDescriptionCellIsReachedThroughTheTable)
 {
     QObject *form = formOf(m_agent.get());
     ASSERT_NE(form, nullptr);
-    auto *table = form->property("_table").value<QObject *>();
+    auto *table = form->property(kZafFormTableProperty).value<QObject *>();
     ASSERT_NE(table, nullptr);
     const auto cell = [table](int row) {
         QObject *cell = reinterpret_cast<QObject *>(1);
-        EXPECT_TRUE(QMetaObject::invokeMethod(table, "cellForRowInSection", Q_RETURN_ARG(QObject *, cell), Q_ARG(int, 1), Q_ARG(int, row)));
+        EXPECT_TRUE(QMetaObject::invokeMethod(table, kZafTableCellMethod, Q_RETURN_ARG(QObject *, cell), Q_ARG(int, 1), Q_ARG(int, row)));
         return cell;
     };
     ASSERT_NE(cell(0), nullptr);
-    EXPECT_TRUE(QMetaObject::invokeMethod(cell(0), "setValue", Q_ARG(QString, QStringLiteral("My run"))));
-    EXPECT_TRUE(QMetaObject::invokeMethod(cell(0), "setPlaceholderText", Q_ARG(QString, QString())));
+    EXPECT_TRUE(QMetaObject::invokeMethod(cell(0), kZafCellSetValueMethod, Q_ARG(QString, QStringLiteral("My run"))));
+    EXPECT_TRUE(QMetaObject::invokeMethod(cell(0), kZafCellSetPlaceholderMethod, Q_ARG(QString, QString())));
     EXPECT_EQ(invokeForString(form, "description"), QStringLiteral("My run"));
     EXPECT_EQ(cell(3), nullptr);
+}
 
+// The form lists the assignable categories, "20" among them, and its own routine pre-selects "22".
+TEST_F(PublishingAgentTest, TheFormsOwnRoutinePreselects22)
+{
+    QObject *form = formOf(m_agent.get());
+    ASSERT_NE(form, nullptr);
     QStringList ids;
-    for (const QVariant &entry : form->property("_categories").toList()) {
+    for (const QVariant &entry : form->property(kZafFormCategoriesProperty).toList()) {
         ids << entry.toMap().value(QLatin1String(kZafPublishingCategoryIdKey)).toString();
         EXPECT_FALSE(entry.toMap().value(QLatin1String(kZafPublishingCategoryLabelKey)).toString().isEmpty());
     }
     EXPECT_EQ(ids.size(), 15);
     EXPECT_TRUE(ids.contains(QStringLiteral("20")));
-    EXPECT_EQ(form->property("_defaultCategory").toString(), QStringLiteral("22"));
+    EXPECT_EQ(form->property(kZafFormDefaultCategoryProperty).toString(), QStringLiteral("22"));
     EXPECT_EQ(invokeForString(form, "categoryId"), QStringLiteral("22"));
-    EXPECT_EQ(invokeForString(invokeForObject(form, "_categoryCell"), "categoryString"), QStringLiteral("People & Blogs"));
+    EXPECT_EQ(invokeForString(invokeForObject(form, kZafFormCategoryCellMethod), "categoryString"), QStringLiteral("People & Blogs"));
 }
 
-// A replaced default-category routine runs for every later form; an empty one restores the form's own.
+// A replaced default-category routine runs for every later form.
 TEST(PublishingPluginTest, AReplacedDefaultCategoryRoutineRunsForEveryLaterForm)
 {
     const auto plugin = zaf::publishing::loadPublishingPlugin(kPluginPath);
@@ -155,44 +187,71 @@ TEST(PublishingPluginTest, AReplacedDefaultCategoryRoutineRunsForEveryLaterForm)
         auto agent = makeAgent();
         ASSERT_NE(agent, nullptr);
         QObject *form = formOf(agent.get());
-        EXPECT_EQ(form->property("_defaultCategory").toString(), QStringLiteral("20"));
+        EXPECT_EQ(form->property(kZafFormDefaultCategoryProperty).toString(), QStringLiteral("20"));
         EXPECT_EQ(invokeForString(form, "categoryId"), QStringLiteral("20"));
-        EXPECT_EQ(invokeForString(invokeForObject(form, "_categoryCell"), "categoryString"), QStringLiteral("Gaming"));
+        EXPECT_EQ(invokeForString(invokeForObject(form, kZafFormCategoryCellMethod), "categoryString"), QStringLiteral("Gaming"));
     }
     EXPECT_EQ(calls, 2);
-
     plugin.value->setFormDefaultCategoryRoutine({});
-    auto agent = makeAgent();
-    EXPECT_EQ(invokeForString(formOf(agent.get()), "categoryId"), QStringLiteral("22"));
-    EXPECT_EQ(calls, 2);
 }
 
-// A form that lacks what the activity reaches by name (a renamed method, a missing property) is
-// told in the log, and what can still be done is done.
-TEST(PublishingPluginTest, AFormMissingANamedMemberIsLoggedNotSilent)
+// An empty routine restores the form's own.
+TEST(PublishingPluginTest, AnEmptyRoutineRestoresTheFormsOwn)
+{
+    const auto plugin = zaf::publishing::loadPublishingPlugin(kPluginPath);
+    ASSERT_TRUE(plugin.ok());
+    int calls = 0;
+    plugin.value->setFormDefaultCategoryRoutine([&calls](QObject *) { ++calls; });
+    plugin.value->setFormDefaultCategoryRoutine({});
+    auto agent = makeAgent();
+    ASSERT_NE(agent, nullptr);
+    EXPECT_EQ(invokeForString(formOf(agent.get()), "categoryId"), QStringLiteral("22"));
+    EXPECT_EQ(calls, 0);
+}
+
+struct MissingMemberCase {
+    const char *name;
+    std::function<void(QObject *form)> reach;
+    QStringList logged;
+    const char *defaultCategory; // what the form's default category is afterwards
+};
+
+class MissingMemberTest : public ::testing::TestWithParam<MissingMemberCase> {};
+
+// A form that lacks what the activity reaches by name (a missing property, a method it does not
+// answer) is told in the log, and what can still be done is done.
+TEST_P(MissingMemberTest, IsLoggedNotSilent)
 {
     QObject form;
     form.setProperty(kZafFormCategoriesProperty, QVariantList{QVariantMap{{kZafPublishingCategoryIdKey, QStringLiteral("20")},
                                                                           {kZafPublishingCategoryLabelKey, QStringLiteral("Gaming")}}});
     zaf::test::LogCapture log;
-    ZafYouTubeActivity::selectDefaultCategoryOfForm(&form);
-    EXPECT_EQ(form.property(kZafFormDefaultCategoryProperty).toString(), QStringLiteral("20"));
-    EXPECT_EQ(log.messages(QStringLiteral("zaf.publishing.activity")),
-              (QStringList{QStringLiteral("the publishing form has no _picker"),
-                           QStringLiteral("the publishing form does not answer _categoryCell on QObject")}));
+    GetParam().reach(&form);
+    EXPECT_EQ(form.property(kZafFormDefaultCategoryProperty).toString(), QString::fromLatin1(GetParam().defaultCategory));
+    EXPECT_EQ(log.messages(QStringLiteral("zaf.publishing.activity")), GetParam().logged);
 }
 
-TEST_F(PublishingAgentTest, DisplayDoneAndCancelCallTheDelegate)
+INSTANTIATE_TEST_SUITE_P(Reaches, MissingMemberTest, ::testing::Values(
+    MissingMemberCase{"DefaultCategory", &ZafYouTubeActivity::selectDefaultCategoryOfForm,
+                      {"the publishing form has no _picker", "the publishing form does not answer _categoryCell on QObject"}, "20"},
+    MissingMemberCase{"Description", [](QObject *form) { zaf::publishing::fillDescriptionOfForm(form, QStringLiteral("d")); },
+                      {"the publishing form has no _table"}, ""},
+    MissingMemberCase{"AgentCancel", [](QObject *form) { zaf::publishing::invokeByName(form, kZafAgentCancelMethod); },
+                      {"the publishing form does not answer cancelAction on QObject"}, ""}),
+    [](const auto &info) { return std::string(info.param.name); });
+
+// The form's appearance and its Done and Cancel buttons reach the delegate, in that order.
+TEST_F(PublishingAgentTest, TheFormsEventsReachTheDelegate)
 {
     m_agent->navigationController()->beginAppearanceTransition(true, false);
     m_agent->navigationController()->endAppearanceTransition();
     ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "doneAction"));
-    ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "cancelAction"));
+    ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), kZafAgentCancelMethod));
     EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("displayed"), QStringLiteral("done"), QStringLiteral("cancel")}));
 }
 
 // Without an access token or a client id to sign in with, publishing ends at once, naming the setting.
-TEST_F(PublishingAgentTest, WithoutTokenOrClientIdPublishingEndsAtOnceWithAnError)
+TEST_F(PublishingAgentTest, WithoutCredentialsPublishingEndsAtOnceWithAnError)
 {
     qunsetenv("ZAF_YOUTUBE_ACCESS_TOKEN");
     qunsetenv("ZAF_YOUTUBE_CLIENT_ID");
@@ -205,33 +264,40 @@ TEST_F(PublishingAgentTest, WithoutTokenOrClientIdPublishingEndsAtOnceWithAnErro
     EXPECT_TRUE(m_delegate.error->message.contains(QLatin1String("ZAF_YOUTUBE_CLIENT_ID")));
 }
 
-// The browser sign-in: Cancel during it ends it quietly (no end of publishing, even after the time
-// limit, its loopback listener closed) and a new Publish signs in afresh; a sign-in abandoned in the
-// browser ends publishing with an error after the agent's limit and closes its listener too.
-TEST_F(PublishingAgentTest, CancelEndsASignInQuietlyAndAnAbandonedOneEndsAfterItsLimit)
+// Cancel during the browser sign-in ends it quietly: no end of publishing, even after the time
+// limit, and its loopback listener closed; a new Publish signs in afresh.
+TEST_F(PublishingAgentTest, CancelEndsASignInQuietly)
 {
     zaf::test::SignInEnvironment signIn;
     m_agent->setMediaPath(QStringLiteral("/nonexistent/movie.mp4"));
-    EXPECT_TRUE(m_agent->setProperty("signInTimeoutMs", 100)) << "the limit can be set";
-
+    ASSERT_TRUE(m_agent->setProperty("signInTimeoutMs", 100));
     ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "publishAction"));
     ASSERT_EQ(signIn.browser.opened.size(), 1);
     EXPECT_EQ(signIn.browser.opened.first().host(), QStringLiteral("accounts.google.com"));
-    const quint16 cancelledPort = signIn.browser.redirectPort();
-    ASSERT_NE(cancelledPort, 0);
-    ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "cancelAction"));
-    EXPECT_FALSE(zaf::test::acceptsConnections(cancelledPort));
+    const quint16 port = signIn.browser.redirectPort();
+    ASSERT_NE(port, 0);
+    ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), kZafAgentCancelMethod));
+    EXPECT_FALSE(zaf::test::acceptsConnections(port));
     zaf::test::waitUntil([] { return false; }, 300);
     EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("begin"), QStringLiteral("cancel")}));
-
     ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "publishAction"));
-    ASSERT_EQ(signIn.browser.opened.size(), 2) << "a new sign-in";
-    const quint16 abandonedPort = signIn.browser.redirectPort();
-    ASSERT_TRUE(zaf::test::waitUntil([this] { return m_delegate.events.size() == 4; }, 5000));
-    EXPECT_EQ(m_delegate.events.mid(2), (QStringList{QStringLiteral("begin"), QStringLiteral("end")}));
+    EXPECT_EQ(signIn.browser.opened.size(), 2);
+}
+
+// A sign-in abandoned in the browser ends publishing with an error after the agent's limit, and
+// closes its listener.
+TEST_F(PublishingAgentTest, AnAbandonedSignInEndsAfterItsLimit)
+{
+    zaf::test::SignInEnvironment signIn;
+    m_agent->setMediaPath(QStringLiteral("/nonexistent/movie.mp4"));
+    ASSERT_TRUE(m_agent->setProperty("signInTimeoutMs", 100));
+    ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "publishAction"));
+    const quint16 port = signIn.browser.redirectPort();
+    ASSERT_TRUE(zaf::test::waitUntil([this] { return m_delegate.events.size() == 2; }, 5000));
+    EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("begin"), QStringLiteral("end")}));
     ASSERT_TRUE(m_delegate.error.has_value());
     EXPECT_TRUE(m_delegate.error->message.contains(QLatin1String("sign-in"))) << m_delegate.error->message.toStdString();
-    EXPECT_FALSE(zaf::test::acceptsConnections(abandonedPort));
+    EXPECT_FALSE(zaf::test::acceptsConnections(port));
 }
 
 } // namespace

@@ -60,7 +60,7 @@ protected:
 
 // Showing twice sets up one half-black dimming layer over the frame and fades in from 0; when the
 // fade ends one spinning indicator sits centred above it, the progress bar under it.
-TEST_F(ProgressOverlayTest, ShowingTwiceMakesOneDimmingLayerAndOneIndicator)
+TEST_F(ProgressOverlayTest, ShowingTwiceBuildsTheOverlayOnce)
 {
     m_overlay->setShowingAnimated(true, true);
     m_overlay->setShowingAnimated(true, true);
@@ -103,10 +103,8 @@ TEST_F(ProgressOverlayTest, StopActivityDuringFadeInDoesNothing)
     EXPECT_TRUE(m_overlay->activityIndicator()->isVisible());
 }
 
-// From set-up on, the overlay's own Cancel is on top of it and asks for cancelling. Once the fade-in
-// is over, stopActivity takes the indicator and that Cancel off the screen; dimming, progress and
-// overlay stay.
-TEST_F(ProgressOverlayTest, StopActivityRemovesOnlyTheIndicatorAndTheCancel)
+// From set-up on, the overlay's own Cancel is on top of it and asks for cancelling.
+TEST_F(ProgressOverlayTest, ItsOwnCancelAsksForCancelling)
 {
     m_overlay->setShowingAnimated(true, true);
     QAbstractButton *cancel = m_overlay->cancelButton();
@@ -118,6 +116,14 @@ TEST_F(ProgressOverlayTest, StopActivityRemovesOnlyTheIndicatorAndTheCancel)
     QObject::connect(m_overlay, &ZafYouTubeActivityProgressOverlay::cancelRequested, [&cancels] { ++cancels; });
     cancel->click();
     EXPECT_EQ(cancels, 1);
+}
+
+// Once the fade-in is over, stopActivity takes the indicator and the Cancel off the screen; the
+// dimming, the progress and the overlay stay.
+TEST_F(ProgressOverlayTest, StopActivityLeavesTheDimmingWithTheProgress)
+{
+    m_overlay->setShowingAnimated(true, true);
+    waitMs();
     ActivityIndicator *indicator = m_overlay->activityIndicator();
     ASSERT_NE(indicator, nullptr);
     m_overlay->stopActivity();
@@ -127,7 +133,7 @@ TEST_F(ProgressOverlayTest, StopActivityRemovesOnlyTheIndicatorAndTheCancel)
     EXPECT_TRUE(m_overlay->dimmingView()->isVisible());
     EXPECT_TRUE(m_overlay->progressBar()->isVisible());
     EXPECT_TRUE(m_overlay->isShowing());
-    EXPECT_FALSE(cancel->isVisible());
+    EXPECT_FALSE(m_overlay->cancelButton()->isVisible());
 }
 
 // Not animated, the fade still runs: the indicator is placed by the bounds at its end and stays
@@ -146,34 +152,33 @@ TEST_F(ProgressOverlayTest, IndicatorIsPlacedOnceWhenTheFadeInEnds)
 }
 
 // Hiding takes the indicator away at once and removes the overlay from its parent after the fade;
-// hiding during the fade-in leaves the indicator it still makes off the screen.
-TEST_F(ProgressOverlayTest, HidingRemovesTheOverlayAfterItsFade)
+// hiding during the fade-in (animated) leaves the indicator it still makes off the screen.
+class ProgressOverlayHidingTest : public ProgressOverlayTest, public ::testing::WithParamInterface<int> {};
+
+TEST_P(ProgressOverlayHidingTest, RemovesTheOverlayAfterItsFade)
 {
-    for (int shownMs : {300, 50}) {
-        SCOPED_TRACE(shownMs);
-        SetUp();
-        m_overlay->setShowingAnimated(true, true);
-        waitMs(shownMs);
-        m_overlay->setShowingAnimated(false, shownMs < 300);
-        EXPECT_FALSE(m_overlay->isShowing());
-        ASSERT_NE(m_overlay->activityIndicator(), nullptr);
-        EXPECT_EQ(superview(m_overlay->activityIndicator()), nullptr);
-        EXPECT_EQ(superview(m_overlay), m_host.get());
-        EXPECT_DOUBLE_EQ(zaf::ui::alpha(m_overlay), 0.0);
-        waitMs();
-        EXPECT_EQ(superview(m_overlay), nullptr);
-        EXPECT_FALSE(m_overlay->isVisible());
-        EXPECT_EQ(indicators(), 1);
-    }
+    const int shownMs = GetParam();
+    m_overlay->setShowingAnimated(true, true);
+    waitMs(shownMs);
+    m_overlay->setShowingAnimated(false, shownMs < 300);
+    EXPECT_FALSE(m_overlay->isShowing());
+    ASSERT_NE(m_overlay->activityIndicator(), nullptr);
+    EXPECT_EQ(superview(m_overlay->activityIndicator()), nullptr);
+    EXPECT_EQ(superview(m_overlay), m_host.get());
+    EXPECT_DOUBLE_EQ(zaf::ui::alpha(m_overlay), 0.0);
+    waitMs();
+    EXPECT_EQ(superview(m_overlay), nullptr);
+    EXPECT_FALSE(m_overlay->isVisible());
+    EXPECT_EQ(indicators(), 1);
 }
 
-// Progress set before the display exists is kept; the text rounds down, clamps at 100 % and is
-// empty (with a busy bar) when the total is unknown.
+INSTANTIATE_TEST_SUITE_P(ShownFor, ProgressOverlayHidingTest, ::testing::Values(300, 50),
+                         [](const auto &info) { return info.param < 300 ? "DuringTheFadeIn" : "AfterTheFadeIn"; });
+
+// Progress set before the display exists is kept; the bar follows the progress and is busy when
+// the total is unknown.
 TEST_F(ProgressOverlayTest, ProgressDisplayFollowsSetProgress)
 {
-    const QLocale previous;
-    QLocale::setDefault(QLocale(QLocale::English, QLocale::UnitedStates));
-    const auto restore = qScopeGuard([&] { QLocale::setDefault(previous); });
     m_overlay->setProgress(0.25);
     EXPECT_EQ(m_overlay->progressLabel(), nullptr);
     m_overlay->setShowingAnimated(true, true);
@@ -181,17 +186,27 @@ TEST_F(ProgressOverlayTest, ProgressDisplayFollowsSetProgress)
     QLabel *label = m_overlay->progressLabel();
     QProgressBar *bar = m_overlay->progressBar();
     ASSERT_NE(label, nullptr);
-    EXPECT_EQ(label->text(), QStringLiteral("25%"));
+    EXPECT_EQ(label->text(), ZafYouTubeActivityProgressOverlay::progressText(0.25));
     EXPECT_EQ(bar->value(), bar->maximum() / 4);
     m_overlay->setProgress(0.5);
-    EXPECT_EQ(label->text(), QStringLiteral("50%"));
     EXPECT_EQ(bar->value(), bar->maximum() / 2);
     m_overlay->setProgress(1.7);
-    EXPECT_EQ(label->text(), QStringLiteral("100%"));
     EXPECT_DOUBLE_EQ(m_overlay->progress(), 1.0);
     m_overlay->setProgress(-1.0);
     EXPECT_TRUE(label->text().isEmpty());
     EXPECT_EQ(bar->maximum(), 0);
-    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.29), QStringLiteral("29%"));
-    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(0.999), QStringLiteral("99%"));
 }
+
+// The text rounds down, clamps at 100 % and is empty when the total is unknown.
+class ProgressTextTest : public ::testing::TestWithParam<std::pair<double, const char *>> {};
+
+TEST_P(ProgressTextTest, RoundsDownWithinZeroToAHundred)
+{
+    const QLocale previous;
+    QLocale::setDefault(QLocale(QLocale::English, QLocale::UnitedStates));
+    const auto restore = qScopeGuard([&] { QLocale::setDefault(previous); });
+    EXPECT_EQ(ZafYouTubeActivityProgressOverlay::progressText(GetParam().first), QString::fromLatin1(GetParam().second));
+}
+
+INSTANTIATE_TEST_SUITE_P(Fractions, ProgressTextTest, ::testing::Values(
+    std::pair{0.25, "25%"}, std::pair{0.29, "29%"}, std::pair{0.999, "99%"}, std::pair{1.7, "100%"}, std::pair{-1.0, ""}));

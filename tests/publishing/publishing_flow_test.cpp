@@ -5,6 +5,7 @@
 #include "platform/media/export_session.h"
 #include "platform/text/object_format.h"
 #include "platform/ui/view_controller.h"
+#include "publishing/publishing_agent.h"
 #include "publishing/youtube_activity.h"
 #include "tests/publishing/sign_in_support.h"
 #include "tests/publishing/upload_test_support.h"
@@ -102,14 +103,16 @@ struct PreparedActivity {
         QFile::remove(copyPath());
     }
 
+    // Waits for the probe of the movie, then for the copy's export.
     bool waitForExport() const
     {
-        const auto session = activity->exportSession();
-        return session && waitUntil([&] {
-                   const media::ExportStatus status = session->status();
-                   return status == media::ExportStatus::Completed || status == media::ExportStatus::Failed
-                       || status == media::ExportStatus::Cancelled;
-               });
+        return waitUntil([&] {
+            const auto session = activity->exportSession();
+            const media::ExportStatus status = session ? session->status() : media::ExportStatus::Unknown;
+            return !activity->isProbingMovie() && session
+                && (status == media::ExportStatus::Completed || status == media::ExportStatus::Failed
+                    || status == media::ExportStatus::Cancelled);
+        });
     }
     QString copyPath() const { return activity->movieURL().toLocalFile(); }
     QAbstractButton *publishButton() const
@@ -118,24 +121,30 @@ struct PreparedActivity {
     }
 };
 
-// Every presentation of the form starts with the composed description and category "20" selected
-// (a second presentation too), shown by its label in the category cell.
-TEST(PublishingFlow, TheFormStartsWithTheDescriptionAndCategory20EveryTime)
+// The form's description cell starts with the composed description.
+TEST(PublishingFlow, TheFormStartsWithTheComposedDescription)
+{
+    PreparedActivity prepared;
+    ASSERT_NE(prepared.form, nullptr);
+    ASSERT_NE(prepared.activity->publishingAgent(), nullptr);
+    EXPECT_EQ(prepared.activity->publishingAgent()->navigationController(), prepared.navigation);
+    EXPECT_EQ(invokeForString(prepared.form, "description"), QStringLiteral("Watch my run https://store.example/app"));
+}
+
+// Every presentation of the form (a second one too) starts with category "20" selected, shown by
+// its label in the category cell.
+TEST(PublishingFlow, EveryPresentationPreselectsCategory20)
 {
     for (int round = 0; round < 2; ++round) {
         SCOPED_TRACE(round);
         PreparedActivity prepared;
         ASSERT_NE(prepared.form, nullptr);
-        ASSERT_NE(prepared.activity->publishingAgent(), nullptr);
-        EXPECT_EQ(prepared.activity->publishingAgent()->navigationController(), prepared.navigation);
-
-        EXPECT_EQ(prepared.form->property("_defaultCategory").toString(), QStringLiteral("20"));
+        EXPECT_EQ(prepared.form->property(kZafFormDefaultCategoryProperty).toString(), QStringLiteral("20"));
         EXPECT_EQ(invokeForString(prepared.form, "categoryId"), QStringLiteral("20"));
         QObject *categoryCell = nullptr;
-        QMetaObject::invokeMethod(prepared.form, "_categoryCell", Q_RETURN_ARG(QObject *, categoryCell));
+        ASSERT_TRUE(QMetaObject::invokeMethod(prepared.form, kZafFormCategoryCellMethod, Q_RETURN_ARG(QObject *, categoryCell)));
         ASSERT_NE(categoryCell, nullptr);
         EXPECT_EQ(invokeForString(categoryCell, "categoryString"), QStringLiteral("Gaming"));
-        EXPECT_EQ(invokeForString(prepared.form, "description"), QStringLiteral("Watch my run https://store.example/app"));
     }
 }
 
@@ -145,26 +154,26 @@ TEST(PublishingFlow, DefaultCategoryRoutinePicksTheRowOfCategory20)
     PreparedActivity prepared;
     ASSERT_NE(prepared.form, nullptr);
     const auto category = [](const char *id, const char *label) {
-        return QVariantMap{{QStringLiteral("id"), QString::fromLatin1(id)}, {QStringLiteral("label"), QString::fromLatin1(label)}};
+        return QVariantMap{{kZafPublishingCategoryIdKey, QString::fromLatin1(id)}, {kZafPublishingCategoryLabelKey, QString::fromLatin1(label)}};
     };
-    prepared.form->setProperty("_categories", QVariantList{category("1", "Film"), category("20", "Gaming"), category("2", "Autos")});
+    prepared.form->setProperty(kZafFormCategoriesProperty, QVariantList{category("1", "Film"), category("20", "Gaming"), category("2", "Autos")});
     ZafYouTubeActivity::selectDefaultCategoryOfForm(prepared.form);
-    QObject *picker = prepared.form->property("_picker").value<QObject *>();
+    QObject *picker = prepared.form->property(kZafFormPickerProperty).value<QObject *>();
     ASSERT_NE(picker, nullptr);
     int row = -1;
-    QMetaObject::invokeMethod(picker, "selectedRowInComponent", Q_RETURN_ARG(int, row), Q_ARG(int, 0));
+    ASSERT_TRUE(QMetaObject::invokeMethod(picker, "selectedRowInComponent", Q_RETURN_ARG(int, row), Q_ARG(int, 0)));
     EXPECT_EQ(row, 1);
-    EXPECT_EQ(prepared.form->property("_defaultCategory").toString(), QStringLiteral("20"));
+    EXPECT_EQ(prepared.form->property(kZafFormDefaultCategoryProperty).toString(), QStringLiteral("20"));
 }
 
-// Publish waits for the copy under the overlay, uploads it with category "20" and the form's
+// Publish, pressed while the movie is still probed, waits for the copy under the overlay, uploads it with category "20" and the form's
 // normalised fields, reports progress to the total, shows the success alert with its View and Close
 // buttons, removes the copy, and Close ends the action as completed. A connection that drops twice
 // in the middle of the upload changes none of that: the upload resumes and the whole copy arrives.
 // The editor's movie is left as it was.
 class PublishingTheCopy : public ::testing::TestWithParam<bool> {};
 
-TEST_P(PublishingTheCopy, EndsWithTheSuccessAlertTheWholeCopyUploadedAndTheCopyRemoved)
+TEST_P(PublishingTheCopy, SucceedsWithTheWholeCopy)
 {
     UploadTestServer server(200, std::chrono::seconds(90));
     ASSERT_TRUE(server.listen());
@@ -190,17 +199,14 @@ TEST_P(PublishingTheCopy, EndsWithTheSuccessAlertTheWholeCopyUploadedAndTheCopyR
     });
     QAbstractButton *publish = prepared.publishButton();
     ASSERT_NE(publish, nullptr);
-    const auto session = prepared.activity->exportSession();
-    ASSERT_NE(session, nullptr);
-    const media::ExportStatus statusAtPress = session->status();
+    ASSERT_TRUE(prepared.activity->isProbingMovie()) << "its answer needs the event loop";
     publish->click();
-    if (statusAtPress == media::ExportStatus::Waiting || statusAtPress == media::ExportStatus::Exporting) {
-        EXPECT_TRUE(prepared.activity->isWaitingForExport() || session->status() == media::ExportStatus::Completed);
-        ASSERT_NE(prepared.activity->progressOverlay(), nullptr);
-    }
+    EXPECT_TRUE(prepared.activity->isWaitingForExport());
+    ASSERT_NE(prepared.activity->progressOverlay(), nullptr);
 
     ASSERT_TRUE(waitUntil([&] { return prepared.activity->resultAlert() != nullptr; }));
-    EXPECT_EQ(session->status(), media::ExportStatus::Completed);
+    ASSERT_NE(prepared.activity->exportSession(), nullptr);
+    EXPECT_EQ(prepared.activity->exportSession()->status(), media::ExportStatus::Completed);
     ASSERT_NE(prepared.activity->progressOverlay(), nullptr);
     EXPECT_EQ(prepared.activity->progressOverlay()->parentWidget(), prepared.navigation->view());
 
@@ -238,7 +244,7 @@ INSTANTIATE_TEST_SUITE_P(Connection, PublishingTheCopy, ::testing::Values(false,
 
 // A 400 from the service ends with the failure alert (Close only), removes the copy, and the action
 // ends as not completed.
-TEST(PublishingFlow, ARefusedUploadEndsWithTheFailureAlertAndNotCompleted)
+TEST(PublishingFlow, ARefusedUploadEndsWithTheFailureAlert)
 {
     UploadTestServer server(50, std::chrono::seconds(90));
     ASSERT_TRUE(server.listen());
@@ -264,55 +270,55 @@ TEST(PublishingFlow, ARefusedUploadEndsWithTheFailureAlertAndNotCompleted)
 }
 
 // Cancel in the form ends the action as not completed, without an alert, and removes the copy.
-TEST(PublishingFlow, CancelEndsNotCompletedAndRemovesTheCopy)
+TEST(PublishingFlow, CancelInTheFormEndsTheActionNotCompleted)
 {
     PreparedActivity prepared;
     ASSERT_TRUE(prepared.waitForExport());
     ASSERT_TRUE(QFileInfo::exists(prepared.copyPath()));
-    ASSERT_TRUE(QMetaObject::invokeMethod(prepared.activity->publishingAgent().get(), "cancelAction"));
+    ASSERT_TRUE(QMetaObject::invokeMethod(prepared.activity->publishingAgent().get(), kZafAgentCancelMethod));
     EXPECT_EQ(prepared.finishes, QList<bool>{false});
     EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
     EXPECT_EQ(prepared.activity->resultAlert(), nullptr);
 }
 
-// The overlay covers the form and its Cancel, yet a Cancel stays on top while the sign-in and the
-// upload run: it ends the action as not completed, without an alert, and removes the copy.
-TEST(PublishingFlow, CancelStaysReachableOverTheOverlayDuringSignInAndUpload)
+// The overlay covers the form and its Cancel, yet a Cancel stays on top while the sign-in (true) and
+// the upload (false) run: it ends the action as not completed, without an alert, and removes the copy.
+class OverlayCancelTest : public ::testing::TestWithParam<bool> {};
+
+TEST_P(OverlayCancelTest, StaysReachableOverTheOverlay)
 {
-    for (const bool signingIn : {true, false}) {
-        SCOPED_TRACE(signingIn ? "sign-in" : "upload");
-        UploadTestServer server(50, std::chrono::seconds(90));
-        ASSERT_TRUE(server.listen());
-        server.setResponseDelay(std::chrono::seconds(60)); // the upload is still running at the Cancel
-        ScopedUploadEnvironment environment(server.baseUrl());
-        std::optional<SignInEnvironment> signIn;
-        if (signingIn)
-            signIn.emplace();
+    const bool signingIn = GetParam();
+    UploadTestServer server(50, std::chrono::seconds(90));
+    ASSERT_TRUE(server.listen());
+    server.setResponseDelay(std::chrono::seconds(60)); // the upload is still running at the Cancel
+    ScopedUploadEnvironment environment(server.baseUrl());
+    std::optional<SignInEnvironment> signIn;
+    if (signingIn)
+        signIn.emplace();
 
-        PreparedActivity prepared;
-        ASSERT_TRUE(prepared.waitForExport());
-        QWidget *view = prepared.navigation->view();
-        view->resize(420, 640);
-        view->show();
-        prepared.publishButton()->click();
-        ASSERT_TRUE(waitUntil([&] { return signingIn ? !signIn->browser.opened.isEmpty() : !server.requests().isEmpty(); }, 10000));
-        ASSERT_NE(prepared.activity->progressOverlay(), nullptr);
-        waitUntil([] { return false; }, 300); // the overlay's fade-in is over
+    PreparedActivity prepared;
+    ASSERT_TRUE(prepared.waitForExport());
+    QWidget *view = prepared.navigation->view();
+    view->resize(420, 640);
+    view->show();
+    prepared.publishButton()->click();
+    ASSERT_TRUE(waitUntil([&] { return signingIn ? !signIn->browser.opened.isEmpty() : !server.requests().isEmpty(); }, 10000));
+    ASSERT_NE(prepared.activity->progressOverlay(), nullptr);
+    waitUntil([] { return false; }, 300); // the overlay's fade-in is over
 
-        QAbstractButton *cancel = uncoveredCancel(view);
-        if (!cancel) {
-            ADD_FAILURE() << "every Cancel is under the overlay";
-            continue;
-        }
-        cancel->click();
-        EXPECT_EQ(prepared.finishes, QList<bool>{false});
-        EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
-        waitUntil([] { return false; }, 200);
-        EXPECT_EQ(prepared.activity->resultAlert(), nullptr);
-        EXPECT_EQ(prepared.finishes, QList<bool>{false});
-        view->hide();
-    }
+    QAbstractButton *cancel = uncoveredCancel(view);
+    ASSERT_NE(cancel, nullptr) << "every Cancel is under the overlay";
+    cancel->click();
+    EXPECT_EQ(prepared.finishes, QList<bool>{false});
+    EXPECT_TRUE(waitUntil([&] { return !QFileInfo::exists(prepared.copyPath()); }));
+    waitUntil([] { return false; }, 200);
+    EXPECT_EQ(prepared.activity->resultAlert(), nullptr);
+    EXPECT_EQ(prepared.finishes, QList<bool>{false});
+    view->hide();
 }
+
+INSTANTIATE_TEST_SUITE_P(Stages, OverlayCancelTest, ::testing::Bool(),
+                         [](const auto &info) { return info.param ? "SignIn" : "Upload"; });
 
 // A sign-in abandoned in the browser ends after the agent's limit with the failure alert.
 TEST(PublishingFlow, AnAbandonedSignInEndsWithTheFailureAlert)

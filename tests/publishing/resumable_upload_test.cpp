@@ -52,9 +52,14 @@ int failureCode(UploadHarness &h)
 
 } // namespace
 
+// Test names show a case's name, not its bytes.
+template <typename Case>
+    requires requires(const Case &c) { c.name; }
+void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
+
 // A clean upload sends the file in chunks with rising progress and reports completion once, with
 // the watch URL and a byte-identical file on the server. (Metadata: see the flow tests.)
-TEST(ResumableUpload, cleanUploadFinishesWithTheWatchUrlAndTheWholeFile)
+TEST(ResumableUpload, cleanUploadFinishesWithTheWholeFile)
 {
     UploadHarness h(5 * kChunk + 1234);
     ASSERT_TRUE(h.listening);
@@ -80,53 +85,56 @@ TEST(ResumableUpload, cleanUploadFinishesWithTheWatchUrlAndTheWholeFile)
     EXPECT_EQ(last, h.movie.size());
 }
 
+struct FaultCase {
+    const char *name;
+    qint64 size;
+    QList<Fault> faults;
+    Delays delays;
+    QList<qint64> firstStarts; // the first data PUTs' Content-Range starts
+    int statusQueries;
+    int initiations;
+    std::chrono::milliseconds backoffCap = 0ms; // 0: the upload's own
+};
+
+class RecoverableFaultTest : public ::testing::TestWithParam<FaultCase> {};
+
 // Every recoverable fault ends with the whole file on the server, after the expected waits, the
 // expected number of sessions and data PUTs that resume where the server says it stands.
-TEST(ResumableUpload, recoversFromEachServiceFault)
+TEST_P(RecoverableFaultTest, endsWithTheWholeFileOnTheServer)
 {
-    const struct {
-        const char *name;
-        qint64 size;
-        QList<Fault> faults;
-        Delays delays;
-        QList<qint64> firstStarts; // the first data PUTs' Content-Range starts
-        int statusQueries;
-        int initiations;
-        std::chrono::milliseconds backoffCap = 0ms; // 0: the upload's own
-    } cases[] = {
-        // Each break is followed by a status query and the next chunk starts where the server's Range
-        // ends; the server kept bytes each time, so neither break extends a run of failures.
-        {"interrupted twice", 4 * kChunk + 77, {{FaultKind::DropBody, 1000}, {FaultKind::DropBody, 5000}},
-         {1000ms, 1000ms}, {0, 1000, 6000}, 2, 1},
-        {"503 with Retry-After", 2 * kChunk, {{FaultKind::Unavailable, 0, 7}}, {7000ms}, {0, 0}, 1, 1},
-        // Backoff doubles from 1 s up to the cap.
-        {"503 without Retry-After", kChunk, QList<Fault>(4, Fault{FaultKind::Unavailable}),
-         {1000ms, 2000ms, 3000ms, 3000ms}, {0, 0}, 4, 1, 3000ms},
-        {"308 without Range restarts from zero", 3 * kChunk, {{FaultKind::DropBody, 2000}, {FaultKind::ForgetBytes}},
-         {1000ms}, {0, 0}, 1, 1},
-        {"404 starts a new session", 3 * kChunk, {{FaultKind::SessionGone}}, {}, {0, 0}, 0, 2},
-        // A connection lost once is the network stack's to mend: it rewinds the chunk and sends it
-        // again, and the upload neither waits nor asks the server.
-        {"interrupted once, resent by the network stack", 2 * kChunk, {{FaultKind::DropBodyOnce, 1000}}, {}, {0, kChunk}, 0, 1},
-    };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.name);
-        UploadHarness h(c.size);
-        if (c.backoffCap > 0ms)
-            h.upload.setBackoff(1000ms, c.backoffCap, 8);
-        for (const Fault &fault : c.faults)
-            h.server.queueFault(fault);
-        const auto result = h.run();
-        ASSERT_TRUE(result && result->ok()) << describe(result);
-        EXPECT_EQ(h.server.videoBytes(result->videoId), h.movie);
-        EXPECT_EQ(zaf::test::fileDigest(h.path), QCryptographicHash::hash(h.movie, QCryptographicHash::Sha256))
-            << "the file uploaded is left as it was";
-        EXPECT_EQ(h.delays, c.delays);
-        EXPECT_EQ(dataStarts(h.server).mid(0, c.firstStarts.size()), c.firstStarts);
-        EXPECT_EQ(h.server.count(QStringLiteral("PUT"), true), c.statusQueries);
-        EXPECT_EQ(h.server.initiations(), c.initiations);
-    }
+    const FaultCase &c = GetParam();
+    UploadHarness h(c.size);
+    if (c.backoffCap > 0ms)
+        h.upload.setBackoff(1000ms, c.backoffCap, 8);
+    for (const Fault &fault : c.faults)
+        h.server.queueFault(fault);
+    const auto result = h.run();
+    ASSERT_TRUE(result && result->ok()) << describe(result);
+    EXPECT_EQ(h.server.videoBytes(result->videoId), h.movie);
+    EXPECT_EQ(zaf::test::fileDigest(h.path), QCryptographicHash::hash(h.movie, QCryptographicHash::Sha256))
+        << "the file uploaded is left as it was";
+    EXPECT_EQ(h.delays, c.delays);
+    EXPECT_EQ(dataStarts(h.server).mid(0, c.firstStarts.size()), c.firstStarts);
+    EXPECT_EQ(h.server.count(QStringLiteral("PUT"), true), c.statusQueries);
+    EXPECT_EQ(h.server.initiations(), c.initiations);
 }
+
+INSTANTIATE_TEST_SUITE_P(Faults, RecoverableFaultTest, ::testing::Values(
+    // Each break is followed by a status query and the next chunk starts where the server's Range
+    // ends; the server kept bytes each time, so neither break extends a run of failures.
+    FaultCase{"InterruptedTwice", 4 * kChunk + 77, {{FaultKind::DropBody, 1000}, {FaultKind::DropBody, 5000}},
+              {1000ms, 1000ms}, {0, 1000, 6000}, 2, 1},
+    FaultCase{"UnavailableWithRetryAfter", 2 * kChunk, {{FaultKind::Unavailable, 0, 7}}, {7000ms}, {0, 0}, 1, 1},
+    // Backoff doubles from 1 s up to the cap.
+    FaultCase{"UnavailableWithoutRetryAfter", kChunk, QList<Fault>(4, Fault{FaultKind::Unavailable}),
+              {1000ms, 2000ms, 3000ms, 3000ms}, {0, 0}, 4, 1, 3000ms},
+    FaultCase{"ResumeWithoutRangeRestartsFromZero", 3 * kChunk, {{FaultKind::DropBody, 2000}, {FaultKind::ForgetBytes}},
+              {1000ms}, {0, 0}, 1, 1},
+    FaultCase{"SessionGoneStartsANewSession", 3 * kChunk, {{FaultKind::SessionGone}}, {}, {0, 0}, 0, 2},
+    // A connection lost once is the network stack's to mend: it rewinds the chunk and sends it
+    // again, and the upload neither waits nor asks the server.
+    FaultCase{"InterruptedOnceResentByTheNetworkStack", 2 * kChunk, {{FaultKind::DropBodyOnce, 1000}}, {}, {0, kChunk}, 0, 1}),
+    [](const auto &info) { return std::string(info.param.name); });
 
 // A 400 is final: no retry, no wait, the error carries the service's reason and is logged.
 TEST(ResumableUpload, badRequestEndsAtOnceWithTheServicesReason)
@@ -144,116 +152,120 @@ TEST(ResumableUpload, badRequestEndsAtOnceWithTheServicesReason)
     EXPECT_TRUE(log.messages(QStringLiteral("zaf.publishing")).join(QLatin1Char('\n')).contains(QStringLiteral("HTTP 400")));
 }
 
-// The limits that end an upload which makes no progress, a missing file and a cancel.
-TEST(ResumableUpload, endsWithAnErrorAtEachLimit)
+struct LimitCase {
+    const char *name;
+    qint64 size;
+    int maxRequests;
+    std::function<void(UploadHarness &)> arrange;
+    int code;
+    std::function<void(const UploadHarness &, const zaf::test::LogCapture &)> verify;
+};
+
+class UploadLimitTest : public ::testing::TestWithParam<LimitCase> {};
+
+// An upload that makes no progress, a missing file and a cancel end with their error, once.
+TEST_P(UploadLimitTest, endsWithItsError)
 {
-    {
-        SCOPED_TRACE("404 beyond the restart limit");
-        UploadHarness h(kChunk);
+    const LimitCase &c = GetParam();
+    zaf::test::LogCapture log;
+    UploadHarness h(c.size, c.maxRequests);
+    c.arrange(h);
+    EXPECT_EQ(failureCode(h), c.code);
+    c.verify(h, log);
+}
+
+INSTANTIATE_TEST_SUITE_P(Limits, UploadLimitTest, ::testing::Values(
+    LimitCase{"SessionGoneBeyondTheRestartLimit", kChunk, 60, [](UploadHarness &h) {
         h.upload.setMaxRestarts(2);
         for (int i = 0; i < 3; ++i)
             h.server.queueFault(Fault{FaultKind::SessionGone});
-        EXPECT_EQ(failureCode(h), UploadTooManyRestartsError);
-        EXPECT_EQ(h.server.initiations(), 3);
-    }
-    {
-        SCOPED_TRACE("lost connections beyond the retry limit");
-        UploadHarness h(2 * kChunk);
+    }, UploadTooManyRestartsError, [](const UploadHarness &h, const auto &) { EXPECT_EQ(h.server.initiations(), 3); }},
+    LimitCase{"LostConnectionsBeyondTheRetryLimit", 2 * kChunk, 60, [](UploadHarness &h) {
         h.upload.setBackoff(1000ms, 4000ms, 2);
         for (int i = 0; i < 5; ++i)
             h.server.queueFault(Fault{FaultKind::DropBody, 0});
-        EXPECT_EQ(failureCode(h), UploadTooManyRetriesError);
-        EXPECT_EQ(h.delays.size(), 2u);
-    }
-    {
-        SCOPED_TRACE("server that stops answering mid-upload");
-        zaf::test::LogCapture log;
-        UploadHarness h(4 * kChunk, /*maxRequests=*/3);
-        h.upload.setBackoff(1000ms, 4000ms, 3);
-        EXPECT_EQ(failureCode(h), 403);
-        EXPECT_FALSE(log.messages(QStringLiteral("zaf.publishing")).isEmpty());
-    }
-    {
-        SCOPED_TRACE("missing file");
-        UploadHarness h(1000);
-        h.upload.setFilePath(h.scratch.file(QStringLiteral("absent.mp4")));
-        EXPECT_EQ(failureCode(h), UploadFileError);
-        EXPECT_TRUE(h.server.requests().isEmpty());
-    }
-    {
-        SCOPED_TRACE("cancel");
-        UploadHarness h(4 * kChunk);
+    }, UploadTooManyRetriesError, [](const UploadHarness &h, const auto &) { EXPECT_EQ(h.delays.size(), 2u); }},
+    LimitCase{"ServerStopsAnsweringMidUpload", 4 * kChunk, 3, [](UploadHarness &h) { h.upload.setBackoff(1000ms, 4000ms, 3); }, 403,
+              [](const UploadHarness &, const auto &log) { EXPECT_FALSE(log.messages(QStringLiteral("zaf.publishing")).isEmpty()); }},
+    LimitCase{"MissingFile", 1000, 60, [](UploadHarness &h) { h.upload.setFilePath(h.scratch.file(QStringLiteral("absent.mp4"))); },
+              UploadFileError, [](const UploadHarness &h, const auto &) { EXPECT_TRUE(h.server.requests().isEmpty()); }},
+    LimitCase{"Cancel", 4 * kChunk, 60, [](UploadHarness &h) {
         QObject::connect(&h.upload, &ResumableUpload::progress, &h.upload, [&h](qint64 sent, qint64) {
             if (sent >= kChunk)
                 h.upload.cancel();
         });
-        EXPECT_EQ(failureCode(h), UploadCancelledError);
-    }
-}
+    }, UploadCancelledError, [](const UploadHarness &, const auto &) {}}),
+    [](const auto &info) { return std::string(info.param.name); });
+
+struct MisleadingCase {
+    const char *name;
+    qint64 stallAfter;
+    QString sessionOrigin; // "PORT" stands for the server's port
+    int code;
+    int dataPuts;
+};
+
+class MisleadingServerTest : public ::testing::TestWithParam<MisleadingCase> {};
 
 // A server that misleads the upload cannot keep it going or get the token elsewhere: a 308 that keeps
 // none of a chunk (no Range, or a Range stuck before the chunk) is a failed attempt within the
 // bounded retries, and a session address off the base's origin ends the upload before any PUT.
-TEST(ResumableUpload, endsWhenTheServerStallsOrSendsTheSessionElsewhere)
+TEST_P(MisleadingServerTest, endsTheUpload)
 {
-    const struct {
-        const char *name;
-        qint64 stallAfter;
-        QString sessionOrigin; // "PORT" stands for the server's port
-        int code;
-        int dataPuts;
-    } cases[] = {
-        {"308 without Range for ever", 0, {}, UploadTooManyRetriesError, 4},
-        {"308 with a Range stuck after the first chunk", kChunk, {}, UploadTooManyRetriesError, 5},
-        {"session on another host", -1, QStringLiteral("http://localhost:PORT"), UploadUntrustedSessionError, 0},
-        {"session on another port", -1, QStringLiteral("http://127.0.0.1:1"), UploadUntrustedSessionError, 0},
-    };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.name);
-        UploadHarness h(3 * kChunk);
-        h.upload.setBackoff(1000ms, 4000ms, 3);
-        h.server.setStallAfter(c.stallAfter);
-        QString origin = c.sessionOrigin;
-        h.server.setSessionOrigin(QUrl(origin.replace(QStringLiteral("PORT"), QString::number(h.server.baseUrl().port()))));
-        EXPECT_EQ(failureCode(h), c.code);
-        EXPECT_EQ(h.server.count(QStringLiteral("PUT")), c.dataPuts);
-        EXPECT_EQ(h.delays.size(), c.code == UploadTooManyRetriesError ? 3u : 0u);
-        EXPECT_EQ(h.server.initiations(), 1);
-    }
+    const MisleadingCase &c = GetParam();
+    UploadHarness h(3 * kChunk);
+    h.upload.setBackoff(1000ms, 4000ms, 3);
+    h.server.setStallAfter(c.stallAfter);
+    QString origin = c.sessionOrigin;
+    h.server.setSessionOrigin(QUrl(origin.replace(QStringLiteral("PORT"), QString::number(h.server.baseUrl().port()))));
+    EXPECT_EQ(failureCode(h), c.code);
+    EXPECT_EQ(h.server.count(QStringLiteral("PUT")), c.dataPuts);
+    EXPECT_EQ(h.delays.size(), c.code == UploadTooManyRetriesError ? 3u : 0u);
+    EXPECT_EQ(h.server.initiations(), 1);
 }
+
+INSTANTIATE_TEST_SUITE_P(Servers, MisleadingServerTest, ::testing::Values(
+    MisleadingCase{"ResumeWithoutRangeForEver", 0, {}, UploadTooManyRetriesError, 4},
+    MisleadingCase{"RangeStuckAfterTheFirstChunk", kChunk, {}, UploadTooManyRetriesError, 5},
+    MisleadingCase{"SessionOnAnotherHost", -1, QStringLiteral("http://localhost:PORT"), UploadUntrustedSessionError, 0},
+    MisleadingCase{"SessionOnAnotherPort", -1, QStringLiteral("http://127.0.0.1:1"), UploadUntrustedSessionError, 0}),
+    [](const auto &info) { return std::string(info.param.name); });
+
+struct AnswerCase {
+    const char *name;
+    int status;
+    QByteArray range, retryAfter;
+    UploadDecision::Action action;
+    qint64 offsetOrCode;
+    std::optional<std::chrono::milliseconds> retryAfterDelay;
+};
+
+class UploadAnswerTest : public ::testing::TestWithParam<AnswerCase> {};
 
 // Header values at the edge of what a 64-bit number holds are read without overflow: a Retry-After
 // of that many seconds waits the longest allowed wait, and a Range ending at the largest byte number
 // is an unusable Range.
-TEST(UploadAnswer, readsHeaderValuesAtTheEdgeOfANumberWithoutOverflow)
+TEST_P(UploadAnswerTest, readsHeaderValuesWithoutOverflow)
 {
-    using Action = UploadDecision::Action;
-    const struct {
-        const char *name;
-        int status;
-        QByteArray range, retryAfter;
-        Action action;
-        qint64 offsetOrCode;
-        std::optional<std::chrono::milliseconds> retryAfterDelay;
-    } cases[] = {
-        {"Retry-After in seconds", 503, {}, "120", Action::Retry, 503, 120000ms},
-        {"Retry-After past the largest wait", 503, {}, "9223372036854776", Action::Retry, 503, 600000ms},
-        {"Range inside the file", 308, "bytes=0-499", {}, Action::SendFrom, 500, std::nullopt},
-        {"Range at the largest byte number", 308, "bytes=0-9223372036854775807", {}, Action::Fail, UploadMalformedAnswerError, std::nullopt},
-    };
+    const AnswerCase &c = GetParam();
+    UploadAnswer answer;
+    answer.status = c.status;
+    answer.range = c.range;
+    answer.retryAfter = c.retryAfter;
     const QDateTime now = QDateTime::fromSecsSinceEpoch(1700000000, Qt::UTC);
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.name);
-        UploadAnswer answer;
-        answer.status = c.status;
-        answer.range = c.range;
-        answer.retryAfter = c.retryAfter;
-        const UploadDecision decision = interpretUploadAnswer(answer, UploadState{UploadStep::SendChunk, 0, 1000, {}}, now);
-        EXPECT_EQ(decision.action, c.action);
-        EXPECT_EQ(c.action == Action::SendFrom ? decision.offset : qint64(decision.code), c.offsetOrCode);
-        EXPECT_EQ(decision.retryAfter, c.retryAfterDelay);
-    }
+    const UploadDecision decision = interpretUploadAnswer(answer, UploadState{UploadStep::SendChunk, 0, 1000, {}}, now);
+    EXPECT_EQ(decision.action, c.action);
+    EXPECT_EQ(c.action == UploadDecision::Action::SendFrom ? decision.offset : qint64(decision.code), c.offsetOrCode);
+    EXPECT_EQ(decision.retryAfter, c.retryAfterDelay);
 }
+
+using Action = UploadDecision::Action;
+INSTANTIATE_TEST_SUITE_P(Headers, UploadAnswerTest, ::testing::Values(
+    AnswerCase{"RetryAfterInSeconds", 503, {}, "120", Action::Retry, 503, 120000ms},
+    AnswerCase{"RetryAfterPastTheLargestWait", 503, {}, "9223372036854776", Action::Retry, 503, 600000ms},
+    AnswerCase{"RangeInsideTheFile", 308, "bytes=0-499", {}, Action::SendFrom, 500, std::nullopt},
+    AnswerCase{"RangeAtTheLargestByteNumber", 308, "bytes=0-9223372036854775807", {}, Action::Fail, UploadMalformedAnswerError, std::nullopt}),
+    [](const auto &info) { return std::string(info.param.name); });
 
 // The chunk device reads its slice of the file and rewinds, so the network stack can resend it.
 TEST(UploadChunkDevice, readsItsSliceAndRewinds)

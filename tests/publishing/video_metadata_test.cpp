@@ -7,25 +7,40 @@
 
 using namespace zaf::publishing;
 
+namespace {
+
+// Test names show a case's name, not its bytes.
+template <typename Case>
+    requires requires(const Case &c) { c.name; }
+void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
+
+const auto kCaseName = [](const auto &info) { return std::string(info.param.name); };
+const QString kEmoji = QString::fromUtf8("\xF0\x9F\x8E\xAE");
+
+struct TitleCase {
+    const char *name;
+    QString typed, normalised;
+};
+
+class TitleTest : public ::testing::TestWithParam<TitleCase> {};
+
+} // namespace
+
 // Titles are trimmed, lose angle brackets, fall back to "Untitled" and are cut at 100 characters,
 // never inside a surrogate pair.
-TEST(VideoMetadata, normaliseTitleRepairsWhatThePersonTyped)
+TEST_P(TitleTest, normaliseTitleRepairsWhatThePersonTyped)
 {
-    const QString emoji = QString::fromUtf8("\xF0\x9F\x8E\xAE");
-    const struct {
-        QString in;
-        QString out;
-    } cases[] = {
-        {QStringLiteral("  <b>Boss fight</b>  "), QStringLiteral("bBoss fight/b")},
-        {QString(), QStringLiteral("Untitled")},
-        {QStringLiteral(" <> "), QStringLiteral("Untitled")},
-        {QString(150, QLatin1Char('a')), QString(100, QLatin1Char('a'))},
-        // The 100th character is one whole emoji (two UTF-16 units).
-        {QString(99, QLatin1Char('b')) + emoji + emoji, QString(99, QLatin1Char('b')) + emoji},
-    };
-    for (const auto &c : cases)
-        EXPECT_EQ(VideoMetadata::normaliseTitle(c.in), c.out) << c.in.toStdString();
+    EXPECT_EQ(VideoMetadata::normaliseTitle(GetParam().typed), GetParam().normalised);
 }
+
+INSTANTIATE_TEST_SUITE_P(Titles, TitleTest, ::testing::Values(
+    TitleCase{"TrimmedWithoutBrackets", QStringLiteral("  <b>Boss fight</b>  "), QStringLiteral("bBoss fight/b")},
+    TitleCase{"Empty", QString(), QStringLiteral("Untitled")},
+    TitleCase{"OnlyBrackets", QStringLiteral(" <> "), QStringLiteral("Untitled")},
+    TitleCase{"TooLong", QString(150, QLatin1Char('a')), QString(100, QLatin1Char('a'))},
+    // The 100th character is one whole emoji (two UTF-16 units).
+    TitleCase{"CutAfterASurrogatePair", QString(99, QLatin1Char('b')) + kEmoji + kEmoji, QString(99, QLatin1Char('b')) + kEmoji}),
+    kCaseName);
 
 // Descriptions lose angle brackets and are cut at 5000 UTF-8 bytes on a character boundary.
 TEST(VideoMetadata, normaliseDescriptionCutsOnACharacterBoundary)
@@ -39,17 +54,34 @@ TEST(VideoMetadata, normaliseDescriptionCutsOnACharacterBoundary)
     EXPECT_EQ(VideoMetadata::normaliseDescription(fits), fits);
 }
 
-// A category that cannot be assigned and an unknown privacy status are errors; the privacy status
-// is read in any case and with spaces; the JSON carries the normalised fields.
-TEST(VideoMetadata, normalisedRefusesWhatCannotBeRepairedAndWritesTheRest)
+namespace {
+struct RefusedCase {
+    const char *name;
+    const char *categoryId, *privacyStatus;
+    int code;
+};
+
+class RefusedMetadataTest : public ::testing::TestWithParam<RefusedCase> {};
+} // namespace
+
+// A category that cannot be assigned and an unknown privacy status are errors.
+TEST_P(RefusedMetadataTest, normalisedRefusesWhatCannotBeRepaired)
 {
     VideoMetadata metadata;
-    metadata.categoryId = QStringLiteral("18"); // exists, but cannot be assigned
-    EXPECT_EQ(metadata.normalised().error.value_or(zaf::Error{}).code, InvalidCategoryError);
-    metadata.categoryId = QStringLiteral("20");
-    metadata.privacyStatus = QStringLiteral("friends");
-    EXPECT_EQ(metadata.normalised().error.value_or(zaf::Error{}).code, InvalidPrivacyStatusError);
+    metadata.categoryId = QString::fromLatin1(GetParam().categoryId);
+    metadata.privacyStatus = QString::fromLatin1(GetParam().privacyStatus);
+    EXPECT_EQ(metadata.normalised().error.value_or(zaf::Error{}).code, GetParam().code);
+}
 
+INSTANTIATE_TEST_SUITE_P(Fields, RefusedMetadataTest, ::testing::Values(
+    RefusedCase{"CategoryThatCannotBeAssigned", "18", "private", InvalidCategoryError}, // it exists
+    RefusedCase{"UnknownPrivacyStatus", "20", "friends", InvalidPrivacyStatusError}), kCaseName);
+
+// The JSON carries the normalised fields; the privacy status is read in any case and with spaces.
+TEST(VideoMetadata, toJsonWritesTheNormalisedFields)
+{
+    VideoMetadata metadata;
+    metadata.categoryId = QStringLiteral("20");
     metadata.title = QStringLiteral("<Run>");
     metadata.description = QStringLiteral("d");
     metadata.privacyStatus = QStringLiteral(" Unlisted ");

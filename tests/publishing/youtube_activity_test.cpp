@@ -1,25 +1,30 @@
-// The YouTube share activity: its identity, its capability gate, and its preparation (the copy with
-// mixed audio and the description text) for every shape of item list.
+// The YouTube share activity: its identity, its capability gate, and its preparation (the
+// description, the probe of the movie off the main thread and the copy with mixed audio).
 #include "platform/capability/capability_service.h"
 #include "platform/dispatch.h"
 #include "platform/media/export_session.h"
+#include "publishing/activity_items.h"
 #include "publishing/youtube_activity.h"
 #include "tempstore/temp_store.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/process_temp_directory.h"
 #include "tests/support/temp_dir.h"
+#include "tests/support/wait_until.h"
 
+#include <QCoreApplication>
 #include <QFile>
 #include <QFileInfo>
 #include <QLocale>
-#include <QThread>
 #include <gtest/gtest.h>
-
-#include <chrono>
 
 namespace zaf::test {
 namespace {
+
+// Test names show a case's name, not its bytes.
+template <typename Case>
+    requires requires(const Case &c) { c.name; }
+void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
 
 class TempDirectoryEnvironment : public ::testing::Environment {
 public:
@@ -28,37 +33,37 @@ public:
 const auto *const g_environment = ::testing::AddGlobalTestEnvironment(new TempDirectoryEnvironment);
 
 const QString kCompleteMessage = QStringLiteral("ZafYouTubeActivity: Export Mixed YouTube Video Complete.");
+const QString kNoMovieMessage = QStringLiteral("ZafYouTubeActivity: no movie among the activity items");
 
-// Waits until the copy's export has ended and, when it completed, until its completion has logged.
-media::ExportStatus waitForExport(const ZafYouTubeActivity &activity, const LogCapture &logs)
+QUrl fixtureMovie(int audioTracks, double seconds = 2)
 {
-    const auto session = activity.exportSession();
-    if (!session) {
-        ADD_FAILURE() << "no export session";
-        return media::ExportStatus::Unknown;
+    return QUrl::fromLocalFile(sharedFixtureMovie({.seconds = seconds, .audioTracks = audioTracks}));
+}
+
+// Items written as texts, "@movie" (two audio tracks), "@silent" (none), "@garbage" (a file that is
+// no movie) and "@notes" (a text file) standing for files.
+QVariantList items(const QStringList &written)
+{
+    static ScratchDir scratch;
+    QVariantList result;
+    for (const QString &item : written) {
+        if (item == QLatin1String("@movie") || item == QLatin1String("@silent"))
+            result << fixtureMovie(item == QLatin1String("@movie") ? 2 : 0);
+        else if (item.startsWith(QLatin1Char('@')))
+            result << QUrl::fromLocalFile(scratch.write(item.mid(1) + (item == QLatin1String("@notes") ? ".txt" : ".mp4"), 4000));
+        else
+            result << item;
     }
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(120);
-    const auto ended = [&] {
-        const media::ExportStatus status = session->status();
-        return status == media::ExportStatus::Failed || status == media::ExportStatus::Cancelled
-            || (status == media::ExportStatus::Completed && logs.count(kCompleteMessage) > 0);
-    };
-    while (!ended() && std::chrono::steady_clock::now() < deadline)
-        QThread::msleep(20);
-    return session->status();
+    return result;
 }
 
-int audioStreams(const QString &path)
+// Cancels the copy as the form's Cancel does and waits until it is removed: the copies of one
+// second share a name.
+void giveUpCopy(ZafYouTubeActivity &activity)
 {
-    return int(probeStreams(ffprobe(path), QStringLiteral("audio")).size());
-}
-
-QString movieWithAudioTracks(const ScratchDir &scratch, int audioTracks)
-{
-    fixture::FixtureSpec spec;
-    spec.seconds = 2;
-    spec.audioTracks = audioTracks;
-    return makeFixtureMovie(scratch.path(), spec);
+    activity.publishingAgentCancelButtonClicked(nullptr);
+    dispatch::waitForGlobalQueue(dispatch::Priority::Background); // the export's end, then the removal
+    dispatch::waitForGlobalQueue(dispatch::Priority::Background);
 }
 
 // Points the capability service at a file answering "not-green-tea" with `allowed`.
@@ -84,19 +89,25 @@ private:
     ScratchDir m_scratch;
 };
 
-// Type and title do not change with the language; the image is drawn from the activity's own bundle.
-TEST(YouTubeActivity, IdentityIsTheSameInEveryLanguage)
+// Type, title and category do not change with the language.
+class YouTubeActivityIdentityTest : public ::testing::TestWithParam<const char *> {};
+
+TEST_P(YouTubeActivityIdentityTest, IsTheSameInEveryLanguage)
 {
     const QLocale previous;
-    for (const char *name : {"en_US", "de_DE", "ja_JP"}) {
-        QLocale::setDefault(QLocale(QString::fromLatin1(name)));
-        ZafYouTubeActivity activity;
-        EXPECT_EQ(activity.activityType(), QStringLiteral("ZafPublishToYouTube")) << name;
-        EXPECT_EQ(activity.activityTitle(), QStringLiteral("YouTube")) << name;
-    }
-    QLocale::setDefault(previous);
+    QLocale::setDefault(QLocale(QString::fromLatin1(GetParam())));
+    ZafYouTubeActivity activity;
+    EXPECT_EQ(activity.activityType(), QStringLiteral("ZafPublishToYouTube"));
+    EXPECT_EQ(activity.activityTitle(), QStringLiteral("YouTube"));
     EXPECT_EQ(ZafYouTubeActivity::activityCategory(), 1);
+    QLocale::setDefault(previous);
+}
 
+INSTANTIATE_TEST_SUITE_P(Languages, YouTubeActivityIdentityTest, ::testing::Values("en_US", "de_DE", "ja_JP"));
+
+// The image is drawn from the activity's own bundle; a name the bundle lacks gives none.
+TEST(YouTubeActivity, TheImageComesFromTheActivitysBundle)
+{
     const QImage image = ZafYouTubeActivity::mediaShelfImageNamed(QStringLiteral("ZafPublishVideo"));
     QImage blank(image.size(), image.format());
     blank.fill(Qt::transparent);
@@ -106,95 +117,142 @@ TEST(YouTubeActivity, IdentityIsTheSameInEveryLanguage)
 }
 
 // Only the capability decides; the items are not looked at.
-TEST(YouTubeActivity, CanPerformFollowsTheCapabilityWhateverTheItems)
+class YouTubeActivityCapabilityTest : public ::testing::TestWithParam<bool> {};
+
+TEST_P(YouTubeActivityCapabilityTest, CanPerformFollowsTheCapabilityWhateverTheItems)
 {
-    const QVariantList full{QStringLiteral("text"), QStringLiteral("https://example.invalid/app"),
-                            QUrl::fromLocalFile(QStringLiteral("/nowhere/movie.mp4"))};
+    CapabilityOverride capability(GetParam());
     ZafYouTubeActivity activity;
-    for (bool allowed : {true, false}) {
-        CapabilityOverride capability(allowed);
-        EXPECT_EQ(activity.canPerformWithActivityItems({}), allowed);
-        EXPECT_EQ(activity.canPerformWithActivityItems(full), allowed);
-    }
+    EXPECT_EQ(activity.canPerformWithActivityItems({}), GetParam());
+    EXPECT_EQ(activity.canPerformWithActivityItems(items({"text", "https://example.invalid/app", "@garbage"})), GetParam());
 }
 
-// Preparation for every shape of item list: the description takes the leading texts; the movie is
-// the editor's when it names one, else the first file of the list (never a later attachment, even a
-// playable one), and is copied into the temporary
-// directory with its audio tracks mixed into one and the video unchanged; no position past the end
-// of a short list is read.
-TEST(YouTubeActivity, PrepareHandlesEveryShapeOfItemList)
+INSTANTIATE_TEST_SUITE_P(Answers, YouTubeActivityCapabilityTest, ::testing::Bool());
+
+struct DescriptionCase {
+    const char *name;
+    QStringList items;
+    QString description;
+};
+
+class ActivityDescriptionTest : public ::testing::TestWithParam<DescriptionCase> {};
+
+// The description takes the leading texts; no position past the end of a short list is read.
+TEST_P(ActivityDescriptionTest, TakesTheLeadingTexts)
 {
-    ScratchDir scratch;
-    const QUrl movie = QUrl::fromLocalFile(movieWithAudioTracks(scratch, 2));
-    const QUrl silent = QUrl::fromLocalFile(movieWithAudioTracks(scratch, 0));
-    ASSERT_FALSE(movie.isEmpty() || silent.isEmpty());
-    const QUrl attachment = QUrl::fromLocalFile(scratch.write(QStringLiteral("notes.txt"), 300));
-    const QUrl garbage = QUrl::fromLocalFile(scratch.write(QStringLiteral("garbage.mp4"), 4000));
-    const struct {
-        const char *name;
-        QVariantList items;
-        QString description;
-        QUrl source; // empty: nothing to export
-        int audioStreams;
-        QUrl editorMovie = {};
-    } cases[] = {
-        {"usual list", {QStringLiteral("Look at this"), QStringLiteral("https://example.invalid/app"), movie},
-         QStringLiteral("Look at this https://example.invalid/app"), movie, 1},
-        {"empty store link", {QStringLiteral("Share text"), QString(), movie}, QStringLiteral("Share text "), movie, 1},
-        {"host message and attachment", {QStringLiteral("Host message"), movie, attachment}, QStringLiteral("Host message"), movie, 1},
-        {"host message only", {QStringLiteral("Host message"), movie}, QStringLiteral("Host message"), movie, 1},
-        {"host message and a movie attachment", {QStringLiteral("Host message"), movie, silent}, QStringLiteral("Host message"), movie, 1},
-        {"usual list and a movie attachment", {QStringLiteral("T"), QStringLiteral("L"), movie, silent}, QStringLiteral("T L"), movie, 1},
-        {"unplayable movie before a movie attachment", {QStringLiteral("M"), garbage, silent}, QStringLiteral("M"), QUrl(), 0},
-        {"the editor's movie", {QStringLiteral("M"), silent, silent}, QStringLiteral("M"), movie, 1, movie},
-        {"movie without audio", {QStringLiteral("T"), QStringLiteral("L"), silent}, QStringLiteral("T L"), silent, 0},
-        {"no movie", {QStringLiteral("a"), QStringLiteral("b"), garbage}, QStringLiteral("a b"), QUrl(), 0},
-        {"no items", {}, QString(), QUrl(), 0},
-    };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.name);
-        LogCapture logs;
-        ZafYouTubeActivity activity;
-        activity.setSourceMovieURL(c.editorMovie);
-        activity.prepareWithActivityItems(c.items);
-        EXPECT_EQ(activity.descriptionText(), c.description);
-        const QString copy = activity.movieURL().toLocalFile();
-        EXPECT_TRUE(copy.startsWith(ZafTempStore::defaultStore()._srTempPath() + QStringLiteral("/ZafReplay_YouTube")));
-        EXPECT_EQ(activity.sourceMovieURL(), c.source);
-        if (c.source.isEmpty()) {
-            EXPECT_FALSE(activity.exportSession());
-            EXPECT_FALSE(QFileInfo::exists(copy));
-            EXPECT_EQ(logs.count(QStringLiteral("ZafYouTubeActivity: no movie among the activity items")), 1);
-            continue;
-        }
-        ASSERT_EQ(waitForExport(activity, logs), media::ExportStatus::Completed);
-        EXPECT_EQ(logs.count(kCompleteMessage), 1);
-        EXPECT_EQ(audioStreams(copy), c.audioStreams);
-        EXPECT_EQ(streamMD5(copy, QStringLiteral("0:v")), streamMD5(c.source.toLocalFile(), QStringLiteral("0:v")));
-        for (int track = 0; track < 2 * c.audioStreams; ++track) // both source tracks in the mixed one
-            EXPECT_GT(toneLevel(copy, 0, fixture::toneFrequency(track)), 0.3) << "track " << track;
-        QFile::remove(copy); // the copies of one second share a name
-    }
+    EXPECT_EQ(publishing::descriptionForItems(items(GetParam().items)), GetParam().description);
 }
+
+INSTANTIATE_TEST_SUITE_P(Items, ActivityDescriptionTest, ::testing::Values(
+    DescriptionCase{"UsualList", {"Look at this", "https://example.invalid/app", "@movie"}, "Look at this https://example.invalid/app"},
+    DescriptionCase{"EmptyStoreLink", {"Share text", "", "@movie"}, "Share text "},
+    DescriptionCase{"HostMessageAndAttachment", {"Host message", "@movie", "@notes"}, "Host message"},
+    DescriptionCase{"HostMessageOnly", {"Host message"}, "Host message"},
+    DescriptionCase{"MovieFirst", {"@movie", "Text"}, "Text"},
+    DescriptionCase{"NoItems", {}, ""}), [](const auto &info) { return std::string(info.param.name); });
+
+struct SourceCase {
+    const char *name;
+    QStringList items;
+    bool copiesTheMovie; // else nothing is copied
+    bool editorNamesTheMovie = false;
+};
+
+class ActivitySourceTest : public ::testing::TestWithParam<SourceCase> {};
+
+// The movie copied is the editor's when it names one, else the first file of the list when it
+// plays: never a later attachment, even a playable one. Without one, nothing is copied (logged).
+TEST_P(ActivitySourceTest, CopiesTheRecordingOnly)
+{
+    const SourceCase &c = GetParam();
+    LogCapture logs;
+    ZafYouTubeActivity activity;
+    activity.setSourceMovieURL(c.editorNamesTheMovie ? fixtureMovie(2) : QUrl());
+    activity.prepareWithActivityItems(items(c.items));
+    ASSERT_TRUE(waitUntil([&] { return !activity.isProbingMovie(); }));
+    EXPECT_EQ(activity.sourceMovieURL(), c.copiesTheMovie ? fixtureMovie(2) : QUrl());
+    EXPECT_EQ(bool(activity.exportSession()), c.copiesTheMovie);
+    EXPECT_EQ(logs.count(kNoMovieMessage), c.copiesTheMovie ? 0 : 1);
+    giveUpCopy(activity);
+}
+
+INSTANTIATE_TEST_SUITE_P(Items, ActivitySourceTest, ::testing::Values(
+    SourceCase{"UsualList", {"T", "L", "@movie"}, true},
+    SourceCase{"HostMessageAndAttachment", {"Host message", "@movie", "@notes"}, true},
+    SourceCase{"HostMessageAndAMovieAttachment", {"Host message", "@movie", "@silent"}, true},
+    SourceCase{"UsualListAndAMovieAttachment", {"T", "L", "@movie", "@silent"}, true},
+    SourceCase{"UnplayableMovieBeforeAMovieAttachment", {"M", "@garbage", "@silent"}, false},
+    SourceCase{"TheEditorsMovie", {"M", "@silent", "@silent"}, true, true},
+    SourceCase{"NoFile", {"a", "b"}, false},
+    SourceCase{"NoItems", {}, false}), [](const auto &info) { return std::string(info.param.name); });
+
+// Preparation returns before the movie among the items is opened: the probe's answer reaches the
+// main thread through its event loop, and only then does the copy start.
+TEST(YouTubeActivity, PrepareReturnsBeforeTheMovieIsOpened)
+{
+    ZafYouTubeActivity activity;
+    activity.prepareWithActivityItems(items({"T", "L", "@movie"}));
+    EXPECT_TRUE(activity.isProbingMovie());
+    EXPECT_TRUE(activity.sourceMovieURL().isEmpty());
+    EXPECT_FALSE(activity.exportSession());
+    EXPECT_EQ(activity.descriptionText(), QStringLiteral("T L"));
+    ASSERT_TRUE(waitUntil([&] { return activity.exportSession() != nullptr; }));
+    giveUpCopy(activity);
+}
+
+// Cancel while the movie is still probed gives the copy up: the probe's answer starts no export.
+TEST(YouTubeActivity, CancelDuringTheProbeStartsNoCopy)
+{
+    ZafYouTubeActivity activity;
+    activity.prepareWithActivityItems(items({"T", "L", "@movie"}));
+    giveUpCopy(activity);
+    EXPECT_FALSE(activity.isProbingMovie());
+    dispatch::waitForGlobalQueue(dispatch::Priority::Default); // the probe, which queues its answer
+    QCoreApplication::processEvents();
+    EXPECT_FALSE(activity.exportSession());
+    EXPECT_TRUE(activity.sourceMovieURL().isEmpty());
+    EXPECT_FALSE(QFileInfo::exists(activity.movieURL().toLocalFile()));
+}
+
+class ActivityCopyTest : public ::testing::TestWithParam<int> {};
+
+// The copy, in the temporary directory, has the video unchanged and every audio track of the movie
+// mixed into one (none for a silent movie); its completion logs.
+TEST_P(ActivityCopyTest, MixesEveryAudioTrackIntoOne)
+{
+    const int audioTracks = GetParam();
+    const QUrl movie = fixtureMovie(audioTracks);
+    LogCapture logs;
+    ZafYouTubeActivity activity;
+    activity.prepareWithActivityItems({QStringLiteral("T"), QString(), movie});
+    const QString copy = activity.movieURL().toLocalFile();
+    EXPECT_TRUE(copy.startsWith(ZafTempStore::defaultStore()._srTempPath() + QStringLiteral("/ZafReplay_YouTube")));
+    ASSERT_TRUE(waitUntil([&] { return activity.exportSession() != nullptr; }));
+    ASSERT_TRUE(activity.exportSession()->waitUntilFinished(std::chrono::seconds(120)));
+    ASSERT_EQ(activity.exportSession()->status(), media::ExportStatus::Completed);
+    EXPECT_TRUE(waitUntil([&] { return logs.count(kCompleteMessage) == 1; }, 5000));
+    EXPECT_EQ(probeStreams(ffprobe(copy), QStringLiteral("audio")).size(), audioTracks > 0 ? 1 : 0);
+    EXPECT_EQ(streamMD5(copy, QStringLiteral("0:v")), streamMD5(movie.toLocalFile(), QStringLiteral("0:v")));
+    for (int track = 0; track < audioTracks; ++track)
+        EXPECT_GT(toneLevel(copy, 0, fixture::toneFrequency(track)), 0.3) << "track " << track;
+    QFile::remove(copy); // the copies of one second share a name
+}
+
+INSTANTIATE_TEST_SUITE_P(AudioTracks, ActivityCopyTest, ::testing::Values(2, 0));
 
 // Cancel while the copy is still being written stops its export and removes the copy only after
 // it has stopped, so no copy is written again after the removal.
-TEST(YouTubeActivity, CancelDuringTheCopysExportStopsItAndLeavesNoCopy)
+TEST(YouTubeActivity, CancelDuringTheCopysExportLeavesNoCopy)
 {
-    ScratchDir scratch;
-    const QString movie = makeFixtureMovie(scratch.path(), {.seconds = 30, .audioTracks = 2});
     ZafYouTubeActivity activity;
-    activity.prepareWithActivityItems({QStringLiteral("T"), QString(), QUrl::fromLocalFile(movie)});
+    activity.setSourceMovieURL(fixtureMovie(2, 30));
+    activity.prepareWithActivityItems({});
     const auto session = activity.exportSession();
     ASSERT_TRUE(session);
-    const QString copy = activity.movieURL().toLocalFile();
-    activity.publishingAgentCancelButtonClicked(nullptr);
+    giveUpCopy(activity);
     ASSERT_TRUE(session->waitUntilFinished(std::chrono::seconds(60)));
     EXPECT_EQ(session->status(), media::ExportStatus::Cancelled);
-    dispatch::waitForGlobalQueue(dispatch::Priority::Background); // the wait, then the removal it queues
-    dispatch::waitForGlobalQueue(dispatch::Priority::Background);
-    EXPECT_FALSE(QFileInfo::exists(copy));
+    EXPECT_FALSE(QFileInfo::exists(activity.movieURL().toLocalFile()));
 }
 
 // The copy's name is the temporary directory, the stem and the whole seconds.
