@@ -9,6 +9,8 @@
 #include <QString>
 #include <QStringList>
 
+#include <ostream>
+#include <string>
 #include <utility>
 
 namespace zaf::bundle::test {
@@ -42,6 +44,15 @@ private:
     bool m_wasSet;
     QByteArray m_previous;
 };
+
+// Names a TEST_P case after its parameter's `name`, and prints the parameter as that name.
+struct CaseName {
+    template <typename Info>
+    std::string operator()(const Info &info) const { return info.param.name; }
+};
+template <typename Case>
+    requires requires(const Case &c) { c.name; }
+void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
 
 // Sets the preferred languages for the lifetime of the object.
 struct ScopedPreferredLanguages {

@@ -8,10 +8,11 @@
 #include <gtest/gtest.h>
 
 #include <functional>
-#include <vector>
 
 namespace zaf::bundle {
 namespace {
+
+using test::PrintTo;
 
 using test::ByteOrder;
 
@@ -43,21 +44,23 @@ msgid "Untranslated"
 msgstr ""
 )";
 
-// In both byte orders, contexts are keyed "context\x04id", plurals by their singular form, and the
-// header and untranslated entries are no messages.
-TEST(MoCatalogTest, ParsesMsgfmtOutputWithContextPluralsAndHeader)
+class MoByteOrderTest : public ::testing::TestWithParam<ByteOrder> {};
+
+// Contexts are keyed "context\x04id", plurals by their singular form, and the header and
+// untranslated entries are no messages.
+TEST_P(MoByteOrderTest, ParsesMsgfmtOutputWithContextPluralsAndHeader)
 {
-    for (const ByteOrder order : {ByteOrder::Little, ByteOrder::Big}) {
-        const MoCatalog catalog = parseMoCatalog(test::compilePo(kRichPo, order));
-        ASSERT_TRUE(catalog.isValid()) << catalog.error.toStdString();
-        EXPECT_EQ(catalog.strings, (QHash<QString, QString>{{QStringLiteral("Hello"), QStringLiteral("Hallo")},
-                                                        {QStringLiteral("SHARE_TEXT_FORMAT"), QStringLiteral("Geteilt mit %@ \"Zitat\"")},
-                                                        {QStringLiteral("Open"), QStringLiteral("Aufmachen")},
-                                                        {QStringLiteral("menu\x04Open"), QStringLiteral("Öffnen")},
-                                                        {QStringLiteral("%d file"), QStringLiteral("%d Datei")}}))
-            << (order == ByteOrder::Big ? "big-endian" : "little-endian");
-    }
+    const MoCatalog catalog = parseMoCatalog(test::compilePo(kRichPo, GetParam()));
+    ASSERT_TRUE(catalog.isValid()) << catalog.error.toStdString();
+    EXPECT_EQ(catalog.strings, (QHash<QString, QString>{{QStringLiteral("Hello"), QStringLiteral("Hallo")},
+                                                    {QStringLiteral("SHARE_TEXT_FORMAT"), QStringLiteral("Geteilt mit %@ \"Zitat\"")},
+                                                    {QStringLiteral("Open"), QStringLiteral("Aufmachen")},
+                                                    {QStringLiteral("menu\x04Open"), QStringLiteral("Öffnen")},
+                                                    {QStringLiteral("%d file"), QStringLiteral("%d Datei")}}));
 }
+
+INSTANTIATE_TEST_SUITE_P(ByteOrders, MoByteOrderTest, ::testing::Values(ByteOrder::Little, ByteOrder::Big),
+                         [](const auto &info) { return info.param == ByteOrder::Big ? "BigEndian" : "LittleEndian"; });
 
 // A plural entry whose singular is empty ("\0PLURAL") is no message, like the header: the lookup of
 // an empty key finds nothing.
@@ -85,37 +88,51 @@ TEST(MoCatalogTest, DecodesStringsInTheHeadersLatin1Charset)
     EXPECT_EQ(catalog.strings.value(QStringLiteral("Greeting")), QStringLiteral("Grüße"));
 }
 
-// A file is read whole; a missing, corrupt or too large (over 16 MiB) file gives an error naming it.
-TEST(MoCatalogTest, ReadsAFileAndNamesItInErrors)
+// A file is read whole.
+TEST(MoCatalogTest, ReadsAFile)
 {
     QTemporaryDir dir;
-    const QByteArray valid = test::compilePo(test::poSource({{QStringLiteral("a"), QStringLiteral("b")}}));
-    const QString good = dir.filePath(QStringLiteral("good.mo"));
-    test::writeFile(good, valid);
-    const MoCatalog read = readMoCatalog(good);
+    test::writeFile(dir.filePath(QStringLiteral("good.mo")), test::compilePo(test::poSource({{QStringLiteral("a"), QStringLiteral("b")}})));
+    const MoCatalog read = readMoCatalog(dir.filePath(QStringLiteral("good.mo")));
     ASSERT_TRUE(read.isValid()) << read.error.toStdString();
     EXPECT_EQ(read.strings.value(QStringLiteral("a")), QStringLiteral("b"));
+}
 
-    const MoCatalog missing = readMoCatalog(dir.filePath(QStringLiteral("missing.mo")));
-    EXPECT_FALSE(missing.isValid());
-    EXPECT_TRUE(missing.error.contains(QStringLiteral("missing.mo")));
+struct UnreadableFile {
+    const char *name;
+    std::function<void(const QString &path)> make; // nothing for a missing file
+    QStringList inError;
+};
 
-    test::writeFile(dir.filePath(QStringLiteral("bad.mo")), QByteArray(64, 'x'));
-    const MoCatalog corrupt = readMoCatalog(dir.filePath(QStringLiteral("bad.mo")));
-    EXPECT_FALSE(corrupt.isValid());
-    EXPECT_TRUE(corrupt.error.contains(QStringLiteral("bad.mo")) && corrupt.error.contains(QStringLiteral("magic")))
-        << corrupt.error.toStdString();
+class UnreadableMoFileTest : public ::testing::TestWithParam<UnreadableFile> {};
 
+// A missing, corrupt or too large (over 16 MiB) file gives an error naming it, and no strings.
+TEST_P(UnreadableMoFileTest, GivesAnErrorNamingTheFile)
+{
+    QTemporaryDir dir;
+    const QString path = dir.filePath(QStringLiteral("table.mo"));
+    if (GetParam().make)
+        GetParam().make(path);
+    const MoCatalog catalog = readMoCatalog(path);
+    EXPECT_FALSE(catalog.isValid());
+    EXPECT_TRUE(catalog.strings.isEmpty());
+    for (const QString &part : GetParam().inError + QStringList{QStringLiteral("table.mo")})
+        EXPECT_TRUE(catalog.error.contains(part)) << catalog.error.toStdString();
+}
+
+INSTANTIATE_TEST_SUITE_P(Files, UnreadableMoFileTest, ::testing::Values(
+    UnreadableFile{"Missing", nullptr, {}},
+    UnreadableFile{"Corrupt", [](const QString &path) { test::writeFile(path, QByteArray(64, 'x')); }, {"magic"}},
     // A valid catalogue followed by a sparse tail past the limit.
-    QFile huge(dir.filePath(QStringLiteral("huge.mo")));
-    ASSERT_TRUE(huge.open(QIODevice::WriteOnly));
-    ASSERT_EQ(huge.write(valid), valid.size());
-    ASSERT_TRUE(huge.resize(kMaxMoFileSize + 1));
-    huge.close();
-    const MoCatalog tooLarge = readMoCatalog(huge.fileName());
-    EXPECT_FALSE(tooLarge.isValid());
-    EXPECT_TRUE(tooLarge.error.contains(QStringLiteral("exceeds"))) << tooLarge.error.toStdString();
-    EXPECT_TRUE(tooLarge.strings.isEmpty());
+    UnreadableFile{"TooLarge", [](const QString &path) {
+        test::writeFile(path, test::compilePo(test::poSource({{QStringLiteral("a"), QStringLiteral("b")}})));
+        QFile huge(path);
+        ASSERT_TRUE(huge.open(QIODevice::ReadWrite) && huge.resize(kMaxMoFileSize + 1));
+    }, {"exceeds"}}), test::CaseName());
+
+// Bytes over the limit are refused by the parser too.
+TEST(MoCatalogTest, ParsingRefusesMoreThanTheLimit)
+{
     EXPECT_FALSE(parseMoCatalog(QByteArray(kMaxMoFileSize + 1, '\0')).isValid());
 }
 
@@ -142,80 +159,86 @@ struct Corruption {
     const char *expectedInError;
 };
 
-class MoCatalogCorruptionTest : public ::testing::Test {
+// A valid catalogue of three messages and its layout.
+const Layout &validLayout()
+{
+    static const Layout layout{test::compilePo(test::poSource({{QStringLiteral("alpha"), QStringLiteral("Alpha")},
+                                                               {QStringLiteral("beta"), QStringLiteral("Beta")},
+                                                               {QStringLiteral("gamma"), QStringLiteral("Gamma")}}))};
+    return layout;
+}
+
+class MoCatalogCorruptionTest : public ::testing::TestWithParam<Corruption> {
 protected:
     void SetUp() override
     {
-        m_layout.data = test::compilePo(test::poSource({{QStringLiteral("alpha"), QStringLiteral("Alpha")},
-                                                        {QStringLiteral("beta"), QStringLiteral("Beta")},
-                                                        {QStringLiteral("gamma"), QStringLiteral("Gamma")}}));
-        ASSERT_GE(m_layout.data.size(), 28);
-        ASSERT_EQ(m_layout.count(), 4u); // the header entry and three messages
-        ASSERT_TRUE(parseMoCatalog(m_layout.data).isValid());
+        ASSERT_GE(validLayout().data.size(), 28);
+        ASSERT_EQ(validLayout().count(), 4u); // the header entry and three messages
+        ASSERT_TRUE(parseMoCatalog(validLayout().data).isValid());
     }
-    Layout m_layout;
 };
 
 // Each corruption of the header, the tables or the strings gives an error saying what is wrong, and no strings.
-TEST_F(MoCatalogCorruptionTest, EveryCorruptVariantGivesAnErrorAndNoStrings)
+TEST_P(MoCatalogCorruptionTest, GivesAnErrorAndNoStrings)
 {
-    const std::vector<Corruption> corruptions = {
-        {"empty file", [](QByteArray &d, const Layout &) { d.clear(); }, "too short"},
-        {"truncated header", [](QByteArray &d, const Layout &) { d.truncate(27); }, "too short"},
-        {"bad magic", [](QByteArray &d, const Layout &) { putWord(d, 0, 0xdeadbeef); }, "magic"},
-        {"unsupported revision", [](QByteArray &d, const Layout &) { putWord(d, 4, 2u << 16); }, "revision"},
-        {"huge string count", [](QByteArray &d, const Layout &) { putWord(d, 8, 0xffffffffu); }, "count"},
-        {"count just too large for the tables", [](QByteArray &d, const Layout &l) { putWord(d, 8, l.count() + 40); }, ""},
-        {"original table past the end", [](QByteArray &d, const Layout &) { putWord(d, 12, quint32(d.size() - 8)); }, "past the end"},
-        {"translation table offset near 4 GiB", [](QByteArray &d, const Layout &) { putWord(d, 16, 0xfffffff8u); }, "past the end"},
-        {"tables overlap each other", [](QByteArray &d, const Layout &l) { putWord(d, 16, l.originals() + 8); }, "overlap"},
-        {"table overlaps the header", [](QByteArray &d, const Layout &) { putWord(d, 12, 4); }, "overlap"},
-        {"string offset past the end", [](QByteArray &d, const Layout &l) { putWord(d, l.originals() + 8 + 4, quint32(d.size() + 100)); }, "past the end"},
-        {"string length past the end", [](QByteArray &d, const Layout &l) { putWord(d, l.originals() + 8, 0xffffffffu); }, "past the end"},
-        {"offset plus length wraps 32 bits",
-         [](QByteArray &d, const Layout &l) {
-             putWord(d, l.translations() + 8, 0xffffffffu);
-             putWord(d, l.translations() + 8 + 4, 0xffffffffu);
-         },
-         "past the end"},
-        {"string without its NUL", [](QByteArray &d, const Layout &l) { d[l.originalOffset(1) + l.originalLength(1)] = 'X'; }, "NUL"},
-        {"string overlapping the descriptor tables", [](QByteArray &d, const Layout &l) {
-             putWord(d, l.originals() + 8, 3);
-             putWord(d, l.originals() + 8 + 4, l.originals());
-         }, "overlaps"},
-        {"string overlapping the header", [](QByteArray &d, const Layout &l) {
-             putWord(d, l.originals() + 8, 2);
-             putWord(d, l.originals() + 8 + 4, 0);
-         }, ""},
-        {"invalid UTF-8 in a string", [](QByteArray &d, const Layout &l) { d[l.originalOffset(2)] = char(0xff); }, "charset"},
-        {"string ending inside a UTF-8 sequence",
-         [](QByteArray &d, const Layout &l) { d[l.originalOffset(2) + l.originalLength(2) - 1] = char(0xc3); }, "charset"},
-        {"cut in the middle", [](QByteArray &d, const Layout &) { d.truncate(d.size() / 2); }, ""},
-    };
-    for (const Corruption &corruption : corruptions) {
-        SCOPED_TRACE(corruption.name);
-        QByteArray data = m_layout.data;
-        corruption.apply(data, m_layout);
-        const MoCatalog catalog = parseMoCatalog(data);
-        EXPECT_FALSE(catalog.isValid());
-        EXPECT_TRUE(catalog.strings.isEmpty());
-        EXPECT_TRUE(catalog.error.contains(QLatin1String(corruption.expectedInError))) << catalog.error.toStdString();
+    QByteArray data = validLayout().data;
+    GetParam().apply(data, validLayout());
+    const MoCatalog catalog = parseMoCatalog(data);
+    EXPECT_FALSE(catalog.isValid());
+    EXPECT_TRUE(catalog.strings.isEmpty());
+    EXPECT_TRUE(catalog.error.contains(QLatin1String(GetParam().expectedInError))) << catalog.error.toStdString();
+}
+
+INSTANTIATE_TEST_SUITE_P(Corruptions, MoCatalogCorruptionTest, ::testing::Values(
+    Corruption{"EmptyFile", [](QByteArray &d, const Layout &) { d.clear(); }, "too short"},
+    Corruption{"TruncatedHeader", [](QByteArray &d, const Layout &) { d.truncate(27); }, "too short"},
+    Corruption{"BadMagic", [](QByteArray &d, const Layout &) { putWord(d, 0, 0xdeadbeef); }, "magic"},
+    Corruption{"UnsupportedRevision", [](QByteArray &d, const Layout &) { putWord(d, 4, 2u << 16); }, "revision"},
+    Corruption{"HugeStringCount", [](QByteArray &d, const Layout &) { putWord(d, 8, 0xffffffffu); }, "count"},
+    Corruption{"CountJustTooLargeForTheTables", [](QByteArray &d, const Layout &l) { putWord(d, 8, l.count() + 40); }, ""},
+    Corruption{"OriginalTablePastTheEnd", [](QByteArray &d, const Layout &) { putWord(d, 12, quint32(d.size() - 8)); }, "past the end"},
+    Corruption{"TranslationTableOffsetNear4GiB", [](QByteArray &d, const Layout &) { putWord(d, 16, 0xfffffff8u); }, "past the end"},
+    Corruption{"TablesOverlapEachOther", [](QByteArray &d, const Layout &l) { putWord(d, 16, l.originals() + 8); }, "overlap"},
+    Corruption{"TableOverlapsTheHeader", [](QByteArray &d, const Layout &) { putWord(d, 12, 4); }, "overlap"},
+    Corruption{"StringOffsetPastTheEnd", [](QByteArray &d, const Layout &l) { putWord(d, l.originals() + 8 + 4, quint32(d.size() + 100)); }, "past the end"},
+    Corruption{"StringLengthPastTheEnd", [](QByteArray &d, const Layout &l) { putWord(d, l.originals() + 8, 0xffffffffu); }, "past the end"},
+    Corruption{"OffsetPlusLengthWraps32Bits", [](QByteArray &d, const Layout &l) {
+        putWord(d, l.translations() + 8, 0xffffffffu);
+        putWord(d, l.translations() + 8 + 4, 0xffffffffu);
+    }, "past the end"},
+    Corruption{"StringWithoutItsNul", [](QByteArray &d, const Layout &l) { d[l.originalOffset(1) + l.originalLength(1)] = 'X'; }, "NUL"},
+    Corruption{"StringOverlappingTheDescriptorTables", [](QByteArray &d, const Layout &l) {
+        putWord(d, l.originals() + 8, 3);
+        putWord(d, l.originals() + 8 + 4, l.originals());
+    }, "overlaps"},
+    Corruption{"StringOverlappingTheHeader", [](QByteArray &d, const Layout &l) {
+        putWord(d, l.originals() + 8, 2);
+        putWord(d, l.originals() + 8 + 4, 0);
+    }, ""},
+    Corruption{"InvalidUtf8InAString", [](QByteArray &d, const Layout &l) { d[l.originalOffset(2)] = char(0xff); }, "charset"},
+    Corruption{"StringEndingInsideAUtf8Sequence",
+               [](QByteArray &d, const Layout &l) { d[l.originalOffset(2) + l.originalLength(2) - 1] = char(0xc3); }, "charset"},
+    Corruption{"CutInTheMiddle", [](QByteArray &d, const Layout &) { d.truncate(d.size() / 2); }, ""}), test::CaseName());
+
+// Every truncation is an error.
+TEST(MoCatalogBoundsTest, EveryTruncationIsAnError)
+{
+    for (qsizetype size = 0; size < validLayout().data.size(); ++size) {
+        const QByteArray prefix(validLayout().data.constData(), size); // a copy: reads past it are caught
+        EXPECT_FALSE(parseMoCatalog(prefix).isValid()) << "prefix of " << size << " bytes";
     }
 }
 
-// Every truncation is an error, and every header or descriptor word set to an edge value is read
-// without a crash (most of them are fatal: the magic, table offsets, any length of 0xffffffff).
-TEST_F(MoCatalogCorruptionTest, TruncatedOrEdgeValuedCataloguesAreReadWithinBounds)
+// Every header or descriptor word set to an edge value is read without a crash (most of them are
+// fatal: the magic, table offsets, any length of 0xffffffff).
+TEST(MoCatalogBoundsTest, EdgeValuedWordsAreReadWithinBounds)
 {
-    for (qsizetype size = 0; size < m_layout.data.size(); ++size) {
-        const QByteArray prefix(m_layout.data.constData(), size); // a copy: reads past it are caught
-        EXPECT_FALSE(parseMoCatalog(prefix).isValid()) << "prefix of " << size << " bytes";
-    }
-    const qint64 end = qMax<qint64>(m_layout.originals(), m_layout.translations()) + 8 * m_layout.count();
+    const Layout &layout = validLayout();
+    const qint64 end = qMax<qint64>(layout.originals(), layout.translations()) + 8 * layout.count();
     int errors = 0;
     for (qint64 at = 0; at + 4 <= end; at += 4) {
-        for (quint32 value : {0u, 1u, 0x7fffffffu, 0xfffffff0u, 0xffffffffu, quint32(m_layout.data.size())}) {
-            QByteArray data = m_layout.data;
+        for (quint32 value : {0u, 1u, 0x7fffffffu, 0xfffffff0u, 0xffffffffu, quint32(layout.data.size())}) {
+            QByteArray data = layout.data;
             putWord(data, at, value);
             errors += parseMoCatalog(data).isValid() ? 0 : 1;
         }
