@@ -1,7 +1,7 @@
 #include "platform/media/media_asset.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
-#include "tests/support/named_cases.h"
+#include "tests/support/media/unusable_movies.h"
 #include "tests/support/temp_dir.h"
 
 #include <QCoreApplication>
@@ -167,21 +167,9 @@ TEST(AssetProbeTest, CoverArtOfASongIsNotAVideoTrack)
     EXPECT_EQ(asset->tracksWithMediaType(MediaType::Audio).size(), 1);
 }
 
-// Unusable files fail to load with the right code, and the failure is logged once.
-struct UnusableFile {
-    const char *name;
-    std::function<QString(const ScratchDir &)> make; // the file's path
-    int code;
-};
-ZAF_PRINT_CASES_AS_NAMES
-
-class AssetLoadFailure : public ::testing::TestWithParam<UnusableFile> {};
-
-TEST_P(AssetLoadFailure, FailsWithALoggedError)
+// An unusable file fails to load with `code`, and the failure is logged once.
+void expectLoadFailure(const QString &path, int code)
 {
-    ScratchDir scratch;
-    const QString path = GetParam().make(scratch);
-    ASSERT_FALSE(path.isEmpty());
     zaf::test::LogCapture log;
     const auto asset = openAsset(path);
     EXPECT_FALSE(asset->load());
@@ -189,29 +177,30 @@ TEST_P(AssetLoadFailure, FailsWithALoggedError)
     EXPECT_FALSE(asset->isPlayable());
     ASSERT_TRUE(asset->loadError().has_value());
     EXPECT_EQ(asset->loadError()->domain, QString::fromLatin1(kMediaErrorDomain));
-    EXPECT_EQ(asset->loadError()->code, GetParam().code);
-    EXPECT_FALSE(asset->duration().isNumeric() && GetParam().code == kMediaErrorCannotOpen);
+    EXPECT_EQ(asset->loadError()->code, code);
+    EXPECT_FALSE(asset->duration().isNumeric() && code == kMediaErrorCannotOpen);
     EXPECT_EQ(log.messages(QStringLiteral("zaf.media")).size(), 1);
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Files, AssetLoadFailure,
-    ::testing::Values(UnusableFile{"NothingThere", [](const ScratchDir &s) { return s.file("nothing-here.mp4"); }, kMediaErrorCannotOpen},
-                      UnusableFile{"Empty", [](const ScratchDir &s) { return s.write("empty.mp4", 0); }, kMediaErrorCannotOpen},
-                      UnusableFile{"Text", [](const ScratchDir &s) { return s.write("text.mp4", 5000); }, kMediaErrorCannotOpen},
-                      UnusableFile{"Directory", [](const ScratchDir &s) { return s.path(); }, kMediaErrorCannotOpen},
-                      UnusableFile{"Truncated", [](const ScratchDir &s) { // loses the header at the end
-                                       const QString path = s.file("truncated.mp4");
-                                       return QFile::copy(twoAudioMovie(), path) && QFile::resize(path, QFileInfo(path).size() / 2) ? path : QString();
-                                   }, kMediaErrorCannotOpen},
-                      UnusableFile{"OnlySubtitles", [](const ScratchDir &s) {
-                                       QFile srt(s.file("subs.srt"));
-                                       srt.open(QIODevice::WriteOnly);
-                                       srt.write("1\n00:00:00,000 --> 00:00:01,000\nhello\n\n");
-                                       srt.close();
-                                       return ffmpeg(QStringList{"-i", srt.fileName(), "-c:s", "srt", s.file("subs.mkv")}) ? s.file("subs.mkv") : QString();
-                                   }, kMediaErrorNoTracks}),
-    zaf::test::caseName);
+class AssetLoadFailure : public ::testing::TestWithParam<zaf::test::UnusableMovie> {};
+
+TEST_P(AssetLoadFailure, CannotOpen)
+{
+    ScratchDir scratch;
+    expectLoadFailure(GetParam().make(scratch), kMediaErrorCannotOpen);
+}
+
+INSTANTIATE_TEST_SUITE_P(Files, AssetLoadFailure, ::testing::ValuesIn(zaf::test::unusableMovies()), zaf::test::caseName);
+
+TEST(AssetProbeTest, SubtitlesAloneAreNoTracks)
+{
+    ScratchDir scratch;
+    QFile srt(scratch.file("subs.srt"));
+    ASSERT_TRUE(srt.open(QIODevice::WriteOnly) && srt.write("1\n00:00:00,000 --> 00:00:01,000\nhello\n\n") > 0);
+    srt.close();
+    ASSERT_TRUE(ffmpeg(QStringList{"-i", srt.fileName(), "-c:s", "srt", scratch.file("subs.mkv")}));
+    expectLoadFailure(scratch.file("subs.mkv"), kMediaErrorNoTracks);
+}
 
 // The asynchronous load completes off the main thread even when the asset is released first.
 TEST(AssetProbeTest, LoadAsynchronouslyCompletesOffTheMainThreadEvenWhenAssetIsReleased)

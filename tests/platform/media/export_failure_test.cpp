@@ -2,6 +2,7 @@
 // unwritable outputs and cancellation end with one completion, an error and no output file.
 #include "tests/platform/media/export_test_support.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/media/unusable_movies.h"
 #include "tests/support/private_mounts.h"
 
 #include <QDir>
@@ -104,42 +105,20 @@ TEST_F(ExportFailureTest, MissingOutputDirectoryIsAWriteError)
     expectFailure(makeSession(source, output), kMediaErrorWriteFailed);
 }
 
-// Inputs that are missing, empty, noise, or either half of a movie fail to open, for a plain copy
-// and for a trim alike.
-struct BadInput {
-    const char *name;
-    std::function<QByteArray(const QByteArray &movie)> bytes; // null: no file at all
-    bool withRange;
-};
-
-class ExportBadInputTest : public ExportFailureTest, public ::testing::WithParamInterface<BadInput> {};
+// Inputs that are no usable movie fail to open, for a plain copy and for a trim alike.
+class ExportBadInputTest : public ExportFailureTest, public ::testing::WithParamInterface<std::tuple<UnusableMovie, bool>> {};
 
 TEST_P(ExportBadInputTest, FailsToOpen)
 {
-    const QString input = scratch.file(QStringLiteral("input.mp4"));
-    if (GetParam().bytes) {
-        QFile f(input);
-        ASSERT_TRUE(f.open(QIODevice::WriteOnly));
-        f.write(GetParam().bytes(fileContents(source)));
-    }
-    auto session = makeSession(input, output);
-    if (GetParam().withRange)
+    const auto &[input, withRange] = GetParam();
+    auto session = makeSession(input.make(scratch), output);
+    if (withRange)
         session->setTimeRange(MediaTimeRange{MediaTime::zero(), MediaTime::make(1, 1)});
     expectFailure(session, kMediaErrorCannotOpen);
 }
 
-const auto kEmpty = [](const QByteArray &) { return QByteArray(); };
-const auto kNoise = [](const QByteArray &) { return QByteArray(100000, '\x5a'); };
-const auto kHead = [](const QByteArray &movie) { return movie.left(movie.size() / 3); };
-const auto kTail = [](const QByteArray &movie) { return movie.mid(movie.size() / 3); };
-
-INSTANTIATE_TEST_SUITE_P(Cases, ExportBadInputTest,
-                         ::testing::Values(BadInput{"Missing", {}, false}, BadInput{"MissingTrimmed", {}, true},
-                                           BadInput{"Empty", kEmpty, false}, BadInput{"EmptyTrimmed", kEmpty, true},
-                                           BadInput{"Noise", kNoise, false}, BadInput{"NoiseTrimmed", kNoise, true},
-                                           BadInput{"Head", kHead, false}, BadInput{"HeadTrimmed", kHead, true},
-                                           BadInput{"Tail", kTail, false}, BadInput{"TailTrimmed", kTail, true}),
-                         caseName);
+INSTANTIATE_TEST_SUITE_P(Files, ExportBadInputTest, ::testing::Combine(::testing::ValuesIn(unusableMovies()), ::testing::Bool()),
+                         [](const auto &info) { return std::string(std::get<0>(info.param).name) + (std::get<1>(info.param) ? "Trimmed" : ""); });
 
 // Cancelling a running export ends it Cancelled, with one completion off the main thread and no
 // output. The wait after the cancel returns within its bound once nothing is written any more, even

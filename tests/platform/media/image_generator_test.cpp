@@ -8,6 +8,7 @@
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/media/image_completions.h"
+#include "tests/support/media/unusable_movies.h"
 #include "tests/support/temp_dir.h"
 #include "tools/fixture/frame_pattern.h"
 
@@ -110,22 +111,27 @@ TEST(ImageGeneratorTest, ToleranceDecidesBetweenSyncFrameAndFrameWithinWindow)
 }
 
 // The maximum size bounds the picture, keeping its aspect, and never scales it up.
-TEST(ImageGeneratorTest, MaximumSizeBoundsPictureAndKeepsAspectWithoutUpscaling)
+class ImageGeneratorMaximumSize : public ::testing::TestWithParam<std::pair<QSize, QSize>> {};
+
+TEST_P(ImageGeneratorMaximumSize, BoundsThePictureAtItsAspect)
 {
+    const auto [maximum, expected] = GetParam();
     auto generator = generatorFor(zaf::test::sharedFixtureMovie(kMovie));
-    const QList<QPair<QSize, QSize>> cases = {
-        {QSize(0, 0), QSize(320, 240)}, {QSize(100, 0), QSize(100, 75)}, {QSize(0, 60), QSize(80, 60)},
-        {QSize(50, 50), QSize(50, 38)}, {QSize(68, 38), QSize(51, 38)},  {QSize(1000, 900), QSize(320, 240)},
-    };
-    for (const auto &[maximum, expected] : cases) {
-        SCOPED_TRACE(testing::Message() << "maximum " << maximum.width() << "x" << maximum.height());
-        generator->setMaximumSize(maximum);
-        const QImage image = generator->copyImageAtTime(MediaTime::make(45, 30), nullptr, nullptr);
-        EXPECT_EQ(image.size(), expected);
-        EXPECT_TRUE(image.format() == QImage::Format_RGB32 || image.format() == QImage::Format_ARGB32_Premultiplied);
-        EXPECT_EQ(readFrameNumber(image), 30);
-    }
+    generator->setMaximumSize(maximum);
+    const QImage image = generator->copyImageAtTime(MediaTime::make(45, 30), nullptr, nullptr);
+    EXPECT_EQ(image.size(), expected);
+    EXPECT_TRUE(image.format() == QImage::Format_RGB32 || image.format() == QImage::Format_ARGB32_Premultiplied);
+    EXPECT_EQ(readFrameNumber(image), 30);
 }
+
+INSTANTIATE_TEST_SUITE_P(Sizes, ImageGeneratorMaximumSize,
+                         ::testing::Values(std::pair{QSize(0, 0), QSize(320, 240)}, std::pair{QSize(100, 0), QSize(100, 75)},
+                                           std::pair{QSize(0, 60), QSize(80, 60)}, std::pair{QSize(50, 50), QSize(50, 38)},
+                                           std::pair{QSize(68, 38), QSize(51, 38)}, std::pair{QSize(1000, 900), QSize(320, 240)}),
+                         [](const auto &info) {
+                             const QSize m = info.param.first;
+                             return "Max" + std::to_string(m.width()) + "x" + std::to_string(m.height());
+                         });
 
 // Asynchronous requests complete once per time, in request order, off the main thread; an invalid
 // time fails only its own request.
@@ -163,7 +169,7 @@ TEST(ImageGeneratorTest, AsyncGenerationCompletesOncePerTimeInOrderOffMainThread
 
 // Cancelling answers every pending request with Cancelled (a later batch cannot have started),
 // and requests after it are served normally.
-TEST(ImageGeneratorTest, CancelAnswersPendingRequestsWithCancelledAndLaterRequestsNormally)
+TEST(ImageGeneratorTest, CancelAnswersOnlyThePendingRequests)
 {
     auto generator = generatorFor(zaf::test::sharedFixtureMovie(kMovie), true);
     QList<MediaTime> times;
@@ -223,49 +229,46 @@ INSTANTIATE_TEST_SUITE_P(Rotations, ImageGeneratorRotationTest, ::testing::Value
 
 // Files that are no usable movie fail every request, asynchronous or not, with an error and no
 // picture, and the failure is logged.
-TEST(ImageGeneratorFailureTest, UnusableFilesFailEveryRequest)
+void expectEveryRequestFails(const QString &path)
+{
+    zaf::test::LogCapture log;
+    auto generator = generatorFor(path);
+    const QList<MediaTime> times = {MediaTime::zero(), MediaTime::make(1, 2), MediaTime::make(5, 1)};
+    zaf::test::ImageCompletions completions;
+    generator->generateImagesAsynchronouslyForTimes(times, completions.handler());
+    ASSERT_TRUE(completions.waitFor(times.size()));
+    const auto all = completions.all();
+    ASSERT_EQ(all.size(), times.size());
+    for (int i = 0; i < all.size(); ++i) {
+        EXPECT_EQ(all[i].requestedTime, times[i]);
+        EXPECT_EQ(all[i].result, ImageGenerator::Result::Failed);
+        EXPECT_TRUE(all[i].image.isNull());
+        EXPECT_FALSE(all[i].actualTime.isValid());
+        ASSERT_TRUE(all[i].error);
+        EXPECT_EQ(all[i].error->domain, "zaf.media");
+    }
+    EXPECT_FALSE(log.messages(QStringLiteral("zaf.media")).isEmpty());
+
+    MediaTime actual = MediaTime::zero();
+    zaf::OptionalError error;
+    EXPECT_TRUE(generator->copyImageAtTime(MediaTime::zero(), &actual, &error).isNull());
+    EXPECT_TRUE(error);
+    EXPECT_FALSE(actual.isValid());
+}
+
+class ImageGeneratorFailureTest : public ::testing::TestWithParam<zaf::test::UnusableMovie> {};
+
+TEST_P(ImageGeneratorFailureTest, UnusableFileFailsEveryRequest)
 {
     zaf::test::ScratchDir dir;
-    auto write = [&](const char *name, const QByteArray &bytes) {
-        QFile file(dir.file(QString::fromLatin1(name)));
-        EXPECT_TRUE(file.open(QIODevice::WriteOnly));
-        file.write(bytes);
-        return file.fileName();
-    };
-    QFile movie(zaf::test::sharedFixtureMovie({}));
-    ASSERT_TRUE(movie.open(QIODevice::ReadOnly));
-    const QByteArray bytes = movie.readAll();
-    const QString audioOnly = dir.file(QStringLiteral("tone.m4a"));
-    ASSERT_TRUE(zaf::test::ffmpeg(zaf::test::words("-f lavfi -i sine=frequency=440:duration=1 -c:a aac") << audioOnly));
+    expectEveryRequestFails(GetParam().make(dir));
+}
 
-    for (const QString &path : {dir.file(QStringLiteral("nothing-here.mp4")), write("empty.mp4", {}),
-                                write("notes.mp4", QByteArray("this is a text file, not a movie\n").repeated(2000)),
-                                write("truncated.mp4", bytes.left(bytes.size() / 2)), audioOnly}) {
-        SCOPED_TRACE(path.toStdString());
-        zaf::test::LogCapture log;
-        auto generator = generatorFor(path);
-        const QList<MediaTime> times = {MediaTime::zero(), MediaTime::make(1, 2), MediaTime::make(5, 1)};
-        zaf::test::ImageCompletions completions;
-        generator->generateImagesAsynchronouslyForTimes(times, completions.handler());
-        ASSERT_TRUE(completions.waitFor(times.size()));
-        const auto all = completions.all();
-        ASSERT_EQ(all.size(), times.size());
-        for (int i = 0; i < all.size(); ++i) {
-            EXPECT_EQ(all[i].requestedTime, times[i]);
-            EXPECT_EQ(all[i].result, ImageGenerator::Result::Failed);
-            EXPECT_TRUE(all[i].image.isNull());
-            EXPECT_FALSE(all[i].actualTime.isValid());
-            ASSERT_TRUE(all[i].error);
-            EXPECT_EQ(all[i].error->domain, "zaf.media");
-        }
-        EXPECT_FALSE(log.messages(QStringLiteral("zaf.media")).isEmpty());
+INSTANTIATE_TEST_SUITE_P(Files, ImageGeneratorFailureTest, ::testing::ValuesIn(zaf::test::unusableMovies()), zaf::test::caseName);
 
-        MediaTime actual = MediaTime::zero();
-        zaf::OptionalError error;
-        EXPECT_TRUE(generator->copyImageAtTime(MediaTime::zero(), &actual, &error).isNull());
-        EXPECT_TRUE(error);
-        EXPECT_FALSE(actual.isValid());
-    }
+TEST(ImageGeneratorFailureTest, AudioOnlyFileFailsEveryRequest)
+{
+    expectEveryRequestFails(zaf::test::sharedFfmpegOutput(zaf::test::words("-f lavfi -i sine=frequency=440:duration=1 -c:a aac"), "m4a"));
 }
 
 } // namespace

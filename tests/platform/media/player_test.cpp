@@ -5,6 +5,7 @@
 #include "platform/media/player_layer.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/media/unusable_movies.h"
 #include "tests/support/temp_dir.h"
 #include "tests/support/wait_until.h"
 
@@ -26,6 +27,8 @@ using zaf::fixture::FixtureSpec;
 using zaf::test::readFrameNumber;
 using zaf::test::sharedFixtureMovie;
 using zaf::test::waitUntil;
+
+ZAF_PRINT_CASES_AS_NAMES
 
 // 4 s at 320 x 240 with a keyframe every 30 frames; 12 s and 2 s small ones; 1 s turned 90 degrees.
 const FixtureSpec kMovie{.seconds = 4, .gop = 30};
@@ -54,14 +57,17 @@ void settle(int ms)
     waitUntil([] { return false; }, ms);
 }
 
-TEST(PlaybackClockTest, MediaTimeFollowsAnchorAtRateAndManualSourceOnlyMovesForward)
+TEST(PlaybackClockTest, MediaTimeFollowsTheAnchorAtItsRate)
 {
     PlaybackClock clock;
     clock.setAnchor(5.0, 100.0, 1.0);
     EXPECT_DOUBLE_EQ(clock.mediaTimeAt(102.5), 7.5);
     clock.setAnchor(1.0, 10.0, 2.0);
     EXPECT_DOUBLE_EQ(clock.mediaTimeAt(11.0), 3.0);
+}
 
+TEST(PlaybackClockTest, ManualSourceOnlyMovesForward)
+{
     ManualTimeSource source(3.0);
     int advanced = 0;
     QObject::connect(&source, &TimeSource::advanced, [&] { ++advanced; });
@@ -91,47 +97,49 @@ TEST(PlayerItemTest, ItemBecomesReadyWithDurationOfTheFileAndSignalsOnce)
 }
 
 // Unusable files fail the item once with a logged error, and a player of it stays inert.
-TEST(PlayerItemTest, ItemFailsWithLoggedErrorForMissingEmptyGarbageAndTruncatedFiles)
+class PlayerItemFailure : public ::testing::TestWithParam<zaf::test::UnusableMovie> {};
+
+TEST_P(PlayerItemFailure, FailsOnceWithALoggedErrorAndAnInertPlayer)
 {
     zaf::test::ScratchDir dir;
-    const QString truncated = dir.file(QStringLiteral("truncated.mp4"));
-    ASSERT_TRUE(QFile::copy(sharedFixtureMovie(kShort), truncated) && QFile::resize(truncated, 2000));
-    for (const QString &path : {dir.file(QStringLiteral("missing.mp4")), dir.write(QStringLiteral("empty.mov"), 0),
-                                dir.write(QStringLiteral("garbage.mp4"), 50000), truncated}) {
-        SCOPED_TRACE(path.toStdString());
-        zaf::test::LogCapture log;
-        auto item = itemFor(path);
-        int changes = 0;
-        QObject::connect(item.get(), &PlayerItem::statusChanged, [&] { ++changes; });
-        ASSERT_TRUE(loaded(*item));
-        EXPECT_EQ(item->status(), PlayerItem::Status::Failed);
-        EXPECT_EQ(changes, 1);
-        ASSERT_TRUE(item->error().has_value());
-        EXPECT_EQ(item->error()->domain, QString::fromUtf8(kMediaErrorDomain));
-        EXPECT_FALSE(item->duration().isValid());
-        const QStringList messages = log.messages(QStringLiteral("zaf.media.playback"));
-        EXPECT_TRUE(std::any_of(messages.begin(), messages.end(),
-                                [&](const QString &m) { return m.startsWith(QStringLiteral("Cannot play")) && m.contains(path); }))
-            << messages.join(u'\n').toStdString();
+    const QString path = GetParam().make(dir);
+    zaf::test::LogCapture log;
+    auto item = itemFor(path);
+    int changes = 0;
+    QObject::connect(item.get(), &PlayerItem::statusChanged, [&] { ++changes; });
+    ASSERT_TRUE(loaded(*item));
+    EXPECT_EQ(item->status(), PlayerItem::Status::Failed);
+    EXPECT_EQ(changes, 1);
+    ASSERT_TRUE(item->error().has_value());
+    EXPECT_EQ(item->error()->domain, QString::fromUtf8(kMediaErrorDomain));
+    EXPECT_FALSE(item->duration().isValid());
+    const QStringList messages = log.messages(QStringLiteral("zaf.media.playback"));
+    EXPECT_TRUE(std::any_of(messages.begin(), messages.end(),
+                            [&](const QString &m) { return m.startsWith(QStringLiteral("Cannot play")) && m.contains(path); }))
+        << messages.join(u'\n').toStdString();
 
-        Player player(item);
-        auto clock = std::make_shared<ManualTimeSource>();
-        player.setTimeSource(clock);
-        player.play();
-        EXPECT_EQ(player.rate(), 0.0f);
-        player.seekToTime(MediaTime::make(1, 1));
-        clock->advance(1);
-        EXPECT_TRUE(player.currentVideoFrame().isNull());
-    }
+    Player player(item);
+    auto clock = std::make_shared<ManualTimeSource>();
+    player.setTimeSource(clock);
+    player.play();
+    EXPECT_EQ(player.rate(), 0.0f);
+    player.seekToTime(MediaTime::make(1, 1));
+    clock->advance(1);
+    EXPECT_TRUE(player.currentVideoFrame().isNull());
 }
 
-// An item without asset fails; items and players released while loading do not crash.
-TEST(PlayerItemTest, ItemWithoutAssetFailsAndItemDestroyedWhileLoadingIsSafe)
+INSTANTIATE_TEST_SUITE_P(Files, PlayerItemFailure, ::testing::ValuesIn(zaf::test::unusableMovies()), zaf::test::caseName);
+
+TEST(PlayerItemTest, ItemWithoutAssetFails)
 {
     PlayerItem noAsset(nullptr);
     ASSERT_TRUE(loaded(noAsset));
     EXPECT_EQ(noAsset.status(), PlayerItem::Status::Failed);
+}
 
+// Items and players released while loading do not crash.
+TEST(PlayerItemTest, ItemDestroyedWhileLoadingIsSafe)
+{
     zaf::test::ScratchDir dir;
     const QString path = dir.write(QStringLiteral("other.mp4"), 1000);
     for (int i = 0; i < 5; ++i) {
@@ -207,35 +215,38 @@ protected:
 
 // Boundary observers fire in order, each at its own time, whether the clock moves in small steps or
 // jumps past several in one; one that pauses stops playback exactly there.
-TEST_F(PlayerTest, BoundaryObserversFireAtTheirTimesAndPauseThereInSmallStepsOrOneJump)
+class PlayerBoundaryTest : public PlayerTest, public ::testing::WithParamInterface<bool> {};
+
+TEST_P(PlayerBoundaryTest, ObserversFireAtTheirTimesAndPauseThere)
 {
-    for (bool oneJump : {false, true}) {
-        SCOPED_TRACE(oneJump ? "one jump" : "small steps");
-        auto player = readyPlayer(kLong);
-        player->seekToTime(seconds(5));
-        QList<double> order;
-        player->addBoundaryTimeObserver({seconds(9)}, [&] { order.append(player->currentTime().seconds()); });
-        player->addBoundaryTimeObserver({seconds(10), seconds(11.5)}, [&] {
-            order.append(player->currentTime().seconds());
-            player->pause();
-        });
-        player->play();
-        EXPECT_EQ(player->rate(), 1.0f);
-        for (int i = 0; i < (oneJump ? 1 : 100); ++i)
-            m_clock->advance(oneJump ? 7 : 0.07); // 5 s -> 12 s
-        EXPECT_EQ(order, (QList<double>{9, 10}));
-        EXPECT_EQ(player->rate(), 0.0f);
-        EXPECT_EQ(player->currentTime(), seconds(10));
-        EXPECT_EQ(player->currentItem()->currentTime(), seconds(10));
-        player->play();
-        m_clock->advance(3);
-        EXPECT_EQ(order, (QList<double>{9, 10, 11.5}));
-        EXPECT_EQ(player->currentTime(), seconds(11.5));
-    }
+    const bool oneJump = GetParam();
+    auto player = readyPlayer(kLong);
+    player->seekToTime(seconds(5));
+    QList<double> order;
+    player->addBoundaryTimeObserver({seconds(9)}, [&] { order.append(player->currentTime().seconds()); });
+    player->addBoundaryTimeObserver({seconds(10), seconds(11.5)}, [&] {
+        order.append(player->currentTime().seconds());
+        player->pause();
+    });
+    player->play();
+    EXPECT_EQ(player->rate(), 1.0f);
+    for (int i = 0; i < (oneJump ? 1 : 100); ++i)
+        m_clock->advance(oneJump ? 7 : 0.07); // 5 s -> 12 s
+    EXPECT_EQ(order, (QList<double>{9, 10}));
+    EXPECT_EQ(player->rate(), 0.0f);
+    EXPECT_EQ(player->currentTime(), seconds(10));
+    EXPECT_EQ(player->currentItem()->currentTime(), seconds(10));
+    player->play();
+    m_clock->advance(3);
+    EXPECT_EQ(order, (QList<double>{9, 10, 11.5}));
+    EXPECT_EQ(player->currentTime(), seconds(11.5));
 }
 
-// Observers stay silent when a seek jumps over their time or once removed; bad ones are refused.
-TEST_F(PlayerTest, ObserversStaySilentWhenSeekJumpsOverThemOrAfterRemovalAndBadOnesAreRefused)
+INSTANTIATE_TEST_SUITE_P(Clock, PlayerBoundaryTest, ::testing::Bool(),
+                         [](const auto &info) { return info.param ? "OneJump" : "SmallSteps"; });
+
+// Observers stay silent when a seek jumps over their time or once removed.
+TEST_F(PlayerTest, ObserversStaySilentWhenASeekJumpsOverThemOrOnceRemoved)
 {
     auto player = readyPlayer(kLong);
     int fired = 0;
@@ -251,6 +262,11 @@ TEST_F(PlayerTest, ObserversStaySilentWhenSeekJumpsOverThemOrAfterRemovalAndBadO
     m_clock->advance(2);
     EXPECT_EQ(fired, 0);
     EXPECT_EQ(player->currentTime(), seconds(4));
+}
+
+TEST_F(PlayerTest, ObserversOfInvalidTimesAreRefused)
+{
+    auto player = readyPlayer(kShort);
     EXPECT_EQ(player->addPeriodicTimeObserver(MediaTime::invalid(), [](const MediaTime &) {}), 0u);
     EXPECT_EQ(player->addPeriodicTimeObserver(MediaTime::zero(), [](const MediaTime &) {}), 0u);
     EXPECT_EQ(player->addBoundaryTimeObserver({MediaTime::invalid()}, [] {}), 0u);
@@ -259,36 +275,39 @@ TEST_F(PlayerTest, ObserversStaySilentWhenSeekJumpsOverThemOrAfterRemovalAndBadO
 
 // The end pauses at the duration and signals once per arrival; with ActionAtItemEnd::None it keeps
 // the rate.
-TEST_F(PlayerTest, EndOfItemPausesAtDurationAndEmitsDidPlayToEndTimeOncePerArrival)
-{
-    for (ActionAtItemEnd action : {ActionAtItemEnd::Pause, ActionAtItemEnd::None}) {
-        SCOPED_TRACE(int(action));
-        auto player = readyPlayer(kShort);
-        player->setActionAtItemEnd(action);
-        const float rateAtEnd = action == ActionAtItemEnd::None ? 1.0f : 0.0f;
-        int ended = 0;
-        float rateAtSignal = -1;
-        QObject::connect(player->currentItem().get(), &PlayerItem::didPlayToEndTime, [&] {
-            ++ended;
-            rateAtSignal = player->rate();
-        });
-        player->play();
-        for (int i = 0; i < 12; ++i)
-            m_clock->advance(0.25);
-        EXPECT_EQ(ended, 1);
-        EXPECT_EQ(rateAtSignal, rateAtEnd);
-        EXPECT_EQ(player->rate(), rateAtEnd);
-        EXPECT_EQ(player->currentTime(), player->currentItem()->duration());
-        m_clock->advance(1);
-        EXPECT_EQ(ended, 1);
+class PlayerEndTest : public PlayerTest, public ::testing::WithParamInterface<ActionAtItemEnd> {};
 
-        // As the editor does: back to the start, play again, reach the end again.
-        player->seekToTime(MediaTime::zero());
-        player->play();
-        m_clock->advance(5);
-        EXPECT_EQ(ended, 2);
-    }
+TEST_P(PlayerEndTest, EndOfItemStopsAtTheDurationAndSignalsOncePerArrival)
+{
+    const ActionAtItemEnd action = GetParam();
+    auto player = readyPlayer(kShort);
+    player->setActionAtItemEnd(action);
+    const float rateAtEnd = action == ActionAtItemEnd::None ? 1.0f : 0.0f;
+    int ended = 0;
+    float rateAtSignal = -1;
+    QObject::connect(player->currentItem().get(), &PlayerItem::didPlayToEndTime, [&] {
+        ++ended;
+        rateAtSignal = player->rate();
+    });
+    player->play();
+    for (int i = 0; i < 12; ++i)
+        m_clock->advance(0.25);
+    EXPECT_EQ(ended, 1);
+    EXPECT_EQ(rateAtSignal, rateAtEnd);
+    EXPECT_EQ(player->rate(), rateAtEnd);
+    EXPECT_EQ(player->currentTime(), player->currentItem()->duration());
+    m_clock->advance(1);
+    EXPECT_EQ(ended, 1);
+
+    // As the editor does: back to the start, play again, reach the end again.
+    player->seekToTime(MediaTime::zero());
+    player->play();
+    m_clock->advance(5);
+    EXPECT_EQ(ended, 2);
 }
+
+INSTANTIATE_TEST_SUITE_P(Actions, PlayerEndTest, ::testing::Values(ActionAtItemEnd::Pause, ActionAtItemEnd::None),
+                         [](const auto &info) { return info.param == ActionAtItemEnd::None ? "None" : "Pause"; });
 
 // A periodic observer fires once per interval while playing (one call for a step over several
 // marks), and on play, pause and seek.
@@ -345,27 +364,43 @@ TEST_F(PlayerTest, DestroyingPlayerWhilePlayingOnRealClockIsSafe)
     }
 }
 
-// A new player shows the first frame; a seek shows the frame at its target (between keyframes, on
-// one, between frame times), limited to the item, and an invalid one is ignored.
-TEST_F(PlayerTest, SeekShowsFrameAtTargetBetweenKeyframesOnKeyframeAndBetweenFrameTimes)
+TEST_F(PlayerTest, NewPlayerShowsTheFirstFrame)
 {
     auto player = readyPlayer(kMovie);
     ASSERT_TRUE(waitUntil([&] { return !player->currentVideoFrame().isNull(); }));
     EXPECT_EQ(shownNumber(*player), 0);
     EXPECT_EQ(player->currentVideoFrame().size(), QSize(320, 240));
-    const MediaTime end = player->currentItem()->duration();
-    const QList<std::tuple<double, MediaTime, int>> cases = {{1.5, seconds(1.5), 45}, {1.0, seconds(1), 30}, {2.51, seconds(2.51), 75},
-                                                             {0.2, seconds(0.2), 6},  {3.95, seconds(3.95), 118}, {60, end, 119},
-                                                             {-3, MediaTime::zero(), 0}};
-    for (const auto &[target, time, expected] : cases) {
-        player->seekToTime(seconds(target));
-        EXPECT_EQ(player->currentTime(), time);
-        EXPECT_TRUE(waitUntil([&] { return shownNumber(*player) == expected; }))
-            << "seek to " << target << " shows " << shownNumber(*player) << ", expected " << expected;
-    }
     player->seekToTime(MediaTime::invalid());
-    EXPECT_EQ(player->currentTime(), MediaTime::zero());
+    EXPECT_EQ(player->currentTime(), MediaTime::zero()) << "an invalid seek is ignored";
 }
+
+// A seek shows the frame at its target (between keyframes, on one, between frame times), limited
+// to the item.
+struct SeekCase {
+    const char *name;
+    double target;
+    double time; // the player's time afterwards; < 0: the item's duration
+    int frame;
+};
+
+class PlayerSeekTest : public PlayerTest, public ::testing::WithParamInterface<SeekCase> {};
+
+TEST_P(PlayerSeekTest, ShowsTheFrameAtItsTarget)
+{
+    const SeekCase &c = GetParam();
+    auto player = readyPlayer(kMovie);
+    ASSERT_TRUE(waitUntil([&] { return !player->currentVideoFrame().isNull(); }));
+    player->seekToTime(seconds(c.target));
+    EXPECT_EQ(player->currentTime(), c.time < 0 ? player->currentItem()->duration() : seconds(c.time));
+    EXPECT_TRUE(waitUntil([&] { return shownNumber(*player) == c.frame; })) << "shows " << shownNumber(*player);
+}
+
+INSTANTIATE_TEST_SUITE_P(Targets, PlayerSeekTest,
+                         ::testing::Values(SeekCase{"BetweenKeyframes", 1.5, 1.5, 45}, SeekCase{"OnAKeyframe", 1.0, 1.0, 30},
+                                           SeekCase{"BetweenFrameTimes", 2.51, 2.51, 75}, SeekCase{"InTheFirstGroup", 0.2, 0.2, 6},
+                                           SeekCase{"NearTheEnd", 3.95, 3.95, 118}, SeekCase{"PastTheEnd", 60, -1, 119},
+                                           SeekCase{"BeforeTheStart", -3, 0, 0}),
+                         zaf::test::caseName);
 
 // Of rapid seeks only the latest target is ever shown, even after late pictures could arrive.
 TEST_F(PlayerTest, RapidSeeksShowOnlyTheLatestTarget)
