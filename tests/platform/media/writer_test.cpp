@@ -6,11 +6,11 @@
 #include "platform/media/movie_writer.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/named_cases.h"
 #include "tests/support/temp_dir.h"
 #include "tools/fixture/fixture_movie.h"
 #include "tools/fixture/frame_pattern.h"
 
-#include <QDir>
 #include <QFileInfo>
 #include <QTransform>
 
@@ -24,6 +24,8 @@ using zaf::media::MovieWriter;
 namespace fx = zaf::fixture;
 
 namespace {
+
+ZAF_PRINT_CASES_AS_NAMES
 
 QList<int> range(int n)
 {
@@ -57,13 +59,23 @@ void appendNumberedFrames(MovieWriter &writer, int frames)
     }
 }
 
-// The drawn number reads back at any picture size, after smooth scaling down to thumbnail size too.
-TEST(FramePatternTest, ReadFrameNumberReturnsDrawnNumberAtManySizesAndAfterScaling)
+// The drawn number reads back at any picture size.
+class FramePatternSize : public ::testing::TestWithParam<QSize> {};
+
+TEST_P(FramePatternSize, ReadsBackTheDrawnNumber)
 {
-    for (const QSize &size : {QSize(1920, 1080), QSize(320, 240), QSize(64, 36), QSize(28, 38), QSize(1080, 1920)})
-        for (int n : {0, 1, 2, 255, 256, 4097, 30000, 43690, 65535})
-            EXPECT_EQ(fx::readFrameNumber(fx::frameNumberImage(n, size.width(), size.height())), n)
-                << n << " at " << size.width() << "x" << size.height();
+    const QSize size = GetParam();
+    for (int n : {0, 1, 2, 255, 256, 4097, 30000, 43690, 65535})
+        EXPECT_EQ(fx::readFrameNumber(fx::frameNumberImage(n, size.width(), size.height())), n) << n;
+}
+
+INSTANTIATE_TEST_SUITE_P(Sizes, FramePatternSize,
+                         ::testing::Values(QSize(1920, 1080), QSize(320, 240), QSize(64, 36), QSize(28, 38), QSize(1080, 1920)),
+                         [](const auto &info) { return "Size" + std::to_string(info.param.width()) + "x" + std::to_string(info.param.height()); });
+
+// The number survives smooth scaling down to thumbnail size, and the picture stays upright.
+TEST(FramePatternTest, NumberSurvivesScalingToAThumbnail)
+{
     for (int n : {12345, 54321, 7}) {
         const QImage thumb = fx::frameNumberImage(n, 1920, 1080).scaled(68, 38, Qt::IgnoreAspectRatio, Qt::SmoothTransformation);
         EXPECT_EQ(fx::readFrameNumber(thumb), n);
@@ -72,32 +84,47 @@ TEST(FramePatternTest, ReadFrameNumberReturnsDrawnNumberAtManySizesAndAfterScali
 }
 
 // Turned, mirrored, blank or washed-out pictures are not upright or read no number.
-TEST(FramePatternTest, PicturesWithoutAnUprightPatternReadNoNumber)
-{
-    const QImage upright = fx::frameNumberImage(4242, 320, 240);
-    ASSERT_TRUE(fx::isUpright(upright));
-    for (int degrees : {90, 180, 270}) {
-        const QImage turned = upright.transformed(QTransform().rotate(degrees));
-        EXPECT_FALSE(fx::isUpright(turned)) << degrees;
-        EXPECT_EQ(fx::readFrameNumber(turned), -1) << degrees;
-    }
-    EXPECT_FALSE(fx::isUpright(upright.mirrored(true, false)));
-    EXPECT_FALSE(fx::isUpright(upright.mirrored(false, true)));
+struct PatternLessPicture {
+    const char *name;
+    std::function<QImage(const QImage &upright)> make;
+    bool upright;
+};
 
-    QImage black(320, 240, QImage::Format_RGB32);
-    black.fill(Qt::black);
-    EXPECT_EQ(fx::readFrameNumber(black), -1);
-    QImage grey(320, 240, QImage::Format_RGB32);
-    grey.fill(QColor(128, 128, 128));
-    fx::drawFrameNumber(grey, 9);
-    for (int y = 48; y < 240; ++y) // wash the bit cells out to grey
-        for (int x = 0; x < 320; ++x)
-            grey.setPixel(x, y, qRgb(128, 128, 128));
-    EXPECT_TRUE(fx::isUpright(grey));
-    EXPECT_EQ(fx::readFrameNumber(grey), -1);
-    EXPECT_EQ(fx::readFrameNumber(QImage()), -1);
-    EXPECT_FALSE(fx::isUpright(QImage(3, 3, QImage::Format_RGB32)));
+class FramePatternMissing : public ::testing::TestWithParam<PatternLessPicture> {};
+
+TEST_P(FramePatternMissing, PictureReadsNoNumber)
+{
+    const QImage picture = GetParam().make(fx::frameNumberImage(4242, 320, 240));
+    EXPECT_EQ(fx::isUpright(picture), GetParam().upright);
+    EXPECT_EQ(fx::readFrameNumber(picture), -1);
 }
+
+QImage filled(QColor colour)
+{
+    QImage image(320, 240, QImage::Format_RGB32);
+    image.fill(colour);
+    return image;
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Pictures, FramePatternMissing,
+    ::testing::Values(PatternLessPicture{"Turned90", [](const QImage &u) { return u.transformed(QTransform().rotate(90)); }, false},
+                      PatternLessPicture{"Turned180", [](const QImage &u) { return u.transformed(QTransform().rotate(180)); }, false},
+                      PatternLessPicture{"Turned270", [](const QImage &u) { return u.transformed(QTransform().rotate(270)); }, false},
+                      PatternLessPicture{"MirroredSideways", [](const QImage &u) { return u.mirrored(true, false); }, false},
+                      PatternLessPicture{"UpsideDown", [](const QImage &u) { return u.mirrored(false, true); }, false},
+                      PatternLessPicture{"Black", [](const QImage &) { return filled(Qt::black); }, false},
+                      PatternLessPicture{"BitCellsWashedOut", [](const QImage &) {
+                                             QImage grey = filled(QColor(128, 128, 128));
+                                             fx::drawFrameNumber(grey, 9);
+                                             for (int y = 48; y < 240; ++y) // wash the bit cells out to grey
+                                                 for (int x = 0; x < 320; ++x)
+                                                     grey.setPixel(x, y, qRgb(128, 128, 128));
+                                             return grey;
+                                         }, true},
+                      PatternLessPicture{"Null", [](const QImage &) { return QImage(); }, false},
+                      PatternLessPicture{"ThreeByThree", [](const QImage &) { return QImage(3, 3, QImage::Format_RGB32); }, false}),
+    zaf::test::caseName);
 
 // No tone frequency is another's or a harmonic of another, so tracks can be told apart.
 TEST(FixtureMovieTest, ToneFrequenciesAreDistinctAndNoHarmonicsOfEachOther)
@@ -202,85 +229,97 @@ TEST(MovieWriterTest, AppendVideoFrameScalesAndConvertsPicturesOfAnyFormat)
 }
 
 // The movie is written under a hidden temporary name and appears under its own name only when
-// finished, never over a file that took the name meanwhile; an abandoned writer leaves nothing.
-TEST(MovieWriterTest, MovieAppearsUnderFinalNameOnlyAfterFinishAndNeverWhenAbandoned)
+// finished.
+TEST(MovieWriterTest, MovieAppearsUnderItsNameOnlyAfterFinish)
 {
     zaf::test::ScratchDir dir;
     const QString path = dir.file(QStringLiteral("late.mp4"));
     auto writer = createWriter(path, MovieWriter::Settings{QSize(128, 96)});
     ASSERT_TRUE(writer);
     appendNumberedFrames(*writer, 5);
-    EXPECT_FALSE(QFileInfo::exists(path));
-    const QStringList during = QDir(dir.path()).entryList(QDir::Files | QDir::Hidden);
+    const QStringList during = zaf::test::entryNames(dir.path());
     ASSERT_EQ(during.size(), 1);
     EXPECT_TRUE(during[0].startsWith(".late.mp4")) << qPrintable(during[0]);
     ASSERT_FALSE(writer->finish());
-    EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"late.mp4"}));
+    EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList({"late.mp4"}));
     EXPECT_EQ(zaf::test::countVideoFrames(path), 5);
+}
 
-    writer = createWriter(dir.file(QStringLiteral("abandoned.mp4")), MovieWriter::Settings{QSize(128, 96)});
+TEST(MovieWriterTest, AbandonedWriterLeavesNothing)
+{
+    zaf::test::ScratchDir dir;
+    auto writer = createWriter(dir.file(QStringLiteral("abandoned.mp4")), MovieWriter::Settings{QSize(128, 96)});
     ASSERT_TRUE(writer);
     appendNumberedFrames(*writer, 5);
     writer.reset();
-    EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"late.mp4"}));
+    EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList());
+}
 
-    // A file that takes the name while the movie is written is kept; the movie goes.
-    writer = createWriter(dir.file(QStringLiteral("raced.mp4")), MovieWriter::Settings{QSize(128, 96)});
+// A file that takes the name while the movie is written is kept; the movie goes.
+TEST(MovieWriterTest, FileThatTookTheNameMeanwhileIsKept)
+{
+    zaf::test::ScratchDir dir;
+    auto writer = createWriter(dir.file(QStringLiteral("raced.mp4")), MovieWriter::Settings{QSize(128, 96)});
     ASSERT_TRUE(writer);
     appendNumberedFrames(*writer, 5);
     const QString raced = dir.write(QStringLiteral("raced.mp4"), 77);
-    const zaf::OptionalError refused = writer->finish();
-    ASSERT_TRUE(refused);
-    EXPECT_EQ(refused->code, zaf::media::kMediaErrorOutputExists);
+    EXPECT_EQ(writer->finish().value_or(zaf::Error{}).code, zaf::media::kMediaErrorOutputExists);
     EXPECT_EQ(QFileInfo(raced).size(), 77);
-    EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"late.mp4", "raced.mp4"}));
+    EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList({"raced.mp4"}));
 }
 
 // Creation fails, leaving no file and an existing one untouched, for an existing path, an
 // unwritable directory (logged with the path) and unsupported settings.
-TEST(MovieWriterTest, CreateFailsForExistingPathUnwritableDirectoryAndUnsupportedSettings)
+struct CreateFailure {
+    const char *name;
+    const char *path; // in the scratch directory unless absolute
+    MovieWriter::Settings settings;
+    int code;
+};
+
+class MovieWriterCreateFailure : public ::testing::TestWithParam<CreateFailure> {};
+
+TEST_P(MovieWriterCreateFailure, LeavesNoFile)
 {
+    const CreateFailure &c = GetParam();
     zaf::test::ScratchDir dir;
     const QString taken = dir.write(QStringLiteral("taken.mp4"), 1234);
-    const QString bad = dir.file(QStringLiteral("bad.mp4"));
-    struct Case {
-        const char *name;
-        QString path;
-        MovieWriter::Settings settings;
-        int code;
-    };
-    const QList<Case> cases{
-        {"existing file", taken, {}, zaf::media::kMediaErrorOutputExists},
-        {"unwritable directory", QStringLiteral("/nonexistent-dir-zaf/out.mp4"), {}, zaf::media::kMediaErrorWriteFailed},
-        {"rotation 45", bad, {.rotation = 45}, zaf::media::kMediaErrorInvalidArgument},
-        {"3 channels", bad, {.audioTracks = 1, .channels = 3}, zaf::media::kMediaErrorInvalidArgument},
-        {"empty picture", bad, {.videoSize = QSize(0, 100)}, zaf::media::kMediaErrorInvalidArgument},
-        {"no frame rate", bad, {.frameRate = 0}, zaf::media::kMediaErrorInvalidArgument},
-    };
-    for (const auto &[name, path, settings, code] : cases) {
-        SCOPED_TRACE(name);
-        zaf::test::LogCapture log;
-        auto created = MovieWriter::create(path, settings);
-        ASSERT_FALSE(created.ok());
-        EXPECT_EQ(created.error->domain, "zaf.media");
-        EXPECT_EQ(created.error->code, code);
-        const QString logged = log.messages(QStringLiteral("zaf.media")).join(u'\n');
-        EXPECT_TRUE(code != zaf::media::kMediaErrorWriteFailed || logged.contains("/nonexistent-dir-zaf")) << qPrintable(logged);
-    }
+    zaf::test::LogCapture log;
+    auto created = MovieWriter::create(c.path[0] == '/' ? QString::fromLatin1(c.path) : dir.file(c.path), c.settings);
+    ASSERT_FALSE(created.ok());
+    EXPECT_EQ(created.error->domain, "zaf.media");
+    EXPECT_EQ(created.error->code, c.code);
+    const QString logged = log.messages(QStringLiteral("zaf.media")).join(u'\n');
+    EXPECT_TRUE(c.code != zaf::media::kMediaErrorWriteFailed || logged.contains("/nonexistent-dir-zaf")) << qPrintable(logged);
     EXPECT_EQ(QFileInfo(taken).size(), 1234);
-    EXPECT_EQ(QDir(dir.path()).entryList(QDir::Files | QDir::Hidden), QStringList({"taken.mp4"}));
+    EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList({"taken.mp4"}));
 }
 
-// An unknown audio track is refused, and after finish() nothing more is accepted.
-TEST(MovieWriterTest, AppendRejectsUnknownTrackAndAnythingAfterFinish)
+INSTANTIATE_TEST_SUITE_P(
+    Cases, MovieWriterCreateFailure,
+    ::testing::Values(CreateFailure{"ExistingFile", "taken.mp4", {}, zaf::media::kMediaErrorOutputExists},
+                      CreateFailure{"UnwritableDirectory", "/nonexistent-dir-zaf/out.mp4", {}, zaf::media::kMediaErrorWriteFailed},
+                      CreateFailure{"Rotation45", "bad.mp4", {.rotation = 45}, zaf::media::kMediaErrorInvalidArgument},
+                      CreateFailure{"ThreeChannels", "bad.mp4", {.audioTracks = 1, .channels = 3}, zaf::media::kMediaErrorInvalidArgument},
+                      CreateFailure{"EmptyPicture", "bad.mp4", {.videoSize = QSize(0, 100)}, zaf::media::kMediaErrorInvalidArgument},
+                      CreateFailure{"NoFrameRate", "bad.mp4", {.frameRate = 0}, zaf::media::kMediaErrorInvalidArgument}),
+    zaf::test::caseName);
+
+TEST(MovieWriterTest, AppendToAnUnknownAudioTrackIsRefused)
+{
+    zaf::test::ScratchDir dir;
+    auto writer = createWriter(dir.file(QStringLiteral("out.mp4")), {.videoSize = QSize(128, 96), .audioTracks = 1});
+    ASSERT_TRUE(writer);
+    const float samples[4] = {0, 0, 0, 0};
+    EXPECT_EQ(writer->appendAudio(1, samples, 2).value_or(zaf::Error{}).code, zaf::media::kMediaErrorInvalidArgument);
+}
+
+TEST(MovieWriterTest, NothingIsAcceptedAfterFinish)
 {
     zaf::test::ScratchDir dir;
     auto writer = createWriter(dir.file(QStringLiteral("closed.mp4")), {.videoSize = QSize(128, 96), .audioTracks = 1});
     ASSERT_TRUE(writer);
     const float samples[4] = {0, 0, 0, 0};
-    const zaf::OptionalError unknown = writer->appendAudio(1, samples, 2);
-    ASSERT_TRUE(unknown);
-    EXPECT_EQ(unknown->code, zaf::media::kMediaErrorInvalidArgument);
     ASSERT_FALSE(writer->appendVideoFrame(fx::frameNumberImage(0, 128, 96)));
     ASSERT_FALSE(writer->appendAudio(0, samples, 2));
     ASSERT_FALSE(writer->finish());
