@@ -1,12 +1,10 @@
 // Movies with tiny and odd picture sizes through every place that converts or scales pictures:
 // thumbnails at any height (rotation included), the player's first picture and its layer, and trim
 // and mix exports. Each must keep the size and colour of the movie and never write past a picture.
-#include "platform/media/export_session.h"
 #include "platform/media/image_generator.h"
 #include "platform/media/player.h"
 #include "platform/media/player_layer.h"
-#include "tests/support/media/fixture_movies.h"
-#include "tests/support/temp_dir.h"
+#include "tests/platform/media/export_test_support.h"
 #include "tests/support/wait_until.h"
 
 #include <QUrl>
@@ -14,8 +12,6 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <condition_variable>
-#include <mutex>
 
 namespace zaf::media {
 namespace {
@@ -51,23 +47,23 @@ protected:
     // Runs an export of the movie to its end; the output's path, "" when it did not complete.
     QString exported(const QString &name, const std::function<void(ExportSession &)> &configure)
     {
-        auto session = ExportSession::exportSessionWithAsset(asset(movie()), QString::fromLatin1(kExportPresetHighestQuality));
-        const QString output = m_scratch.file(name);
-        session->setOutputURL(QUrl::fromLocalFile(output));
-        session->setOutputFileType(QString::fromLatin1(kFileTypeMPEG4));
+        auto session = makeSession(movie(), m_scratch.file(name));
         configure(*session);
-        std::mutex mutex;
-        std::condition_variable_any done;
-        bool finished = false;
-        session->exportAsynchronously([&] {
-            std::lock_guard lock(mutex);
-            finished = true;
-            done.notify_all();
-        });
-        std::unique_lock lock(mutex);
-        EXPECT_TRUE(done.wait_for(lock, std::chrono::seconds(120), [&] { return finished; }));
-        EXPECT_EQ(session->status(), ExportStatus::Completed) << (session->error() ? qPrintable(session->error()->description()) : "");
-        return session->status() == ExportStatus::Completed ? output : QString();
+        EXPECT_EQ(runToEnd(session), ExportStatus::Completed) << (session->error() ? qPrintable(session->error()->description()) : "");
+        return session->status() == ExportStatus::Completed ? m_scratch.file(name) : QString();
+    }
+    // The export keeps the coded size, the rotation, the one audio track and the colour.
+    void expectTheMoviesShape(const QString &output)
+    {
+        const QList<QJsonObject> video = probeStreams(output, QStringLiteral("video"));
+        ASSERT_EQ(video.size(), 1);
+        EXPECT_EQ(QSize(video[0]["width"].toInt(), video[0]["height"].toInt()), GetParam().size);
+        EXPECT_EQ(probeRotation(video[0]), GetParam().rotation);
+        EXPECT_EQ(probeStreams(output, QStringLiteral("audio")).size(), 1);
+        if (flat()) {
+            auto generator = ImageGenerator::imageGeneratorWithAsset(asset(output));
+            EXPECT_LE(largestColourDistance(generator->copyImageAtTime(MediaTime::zero(), nullptr, nullptr), kFlatColour), kColourTolerance);
+        }
     }
 
     ScratchDir m_scratch;
@@ -75,7 +71,7 @@ protected:
 
 // Thumbnails keep the upright aspect at every maximum height down to one pixel, never scale up,
 // and show the movie's colour; without the transform they come at the coded size.
-TEST_P(OddSizeMovieTest, ThumbnailsAtAnyHeightHaveTheBoundedUprightSizeAndTheColour)
+TEST_P(OddSizeMovieTest, ThumbnailsAtAnyHeightShowTheMovieUpright)
 {
     const OddShape &shape = GetParam();
     auto generator = ImageGenerator::imageGeneratorWithAsset(asset(movie()));
@@ -99,7 +95,7 @@ TEST_P(OddSizeMovieTest, ThumbnailsAtAnyHeightHaveTheBoundedUprightSizeAndTheCol
 }
 
 // The player shows the first picture at its coded size and colour, and its layer paints it.
-TEST_P(OddSizeMovieTest, PlayerShowsFirstPictureAndLayerPaintsIt)
+TEST_P(OddSizeMovieTest, PlayerAndItsLayerShowTheFirstPicture)
 {
     auto item = std::make_shared<PlayerItem>(asset(movie()));
     Player player(item);
@@ -121,40 +117,31 @@ TEST_P(OddSizeMovieTest, PlayerShowsFirstPictureAndLayerPaintsIt)
     }
 }
 
-// A trim (cut frames re-encoded, converted where the encoder needs another format) and a mix keep
-// the coded size, the rotation and the colour.
-TEST_P(OddSizeMovieTest, TrimAndMixKeepSizeRotationAndColour)
+// A trim re-encodes the cut frames, converted where the encoder needs another format.
+TEST_P(OddSizeMovieTest, TrimKeepsTheMoviesShape)
 {
-    const OddShape &shape = GetParam();
     const QString trimmed = exported(QStringLiteral("trim.mp4"), [](ExportSession &session) {
         session.setTimeRange(MediaTimeRange{MediaTime::make(1, 5), MediaTime::make(3, 5)});
     });
-    const QString mixed = exported(QStringLiteral("mix.mp4"), [&](ExportSession &session) {
-        AudioMix mix;
-        for (const AssetTrack &track : asset(movie())->tracksWithMediaType(MediaType::Audio))
-            mix.inputParameters.append(AudioMixInputParameters{track.trackID});
-        session.setAudioMix(mix);
-    });
-    for (const QString &output : {trimmed, mixed}) {
-        SCOPED_TRACE(output.toStdString());
-        const QList<QJsonObject> video = probeStreams(output, QStringLiteral("video"));
-        ASSERT_EQ(video.size(), 1);
-        EXPECT_EQ(QSize(video[0]["width"].toInt(), video[0]["height"].toInt()), shape.size);
-        EXPECT_EQ(probeRotation(video[0]), shape.rotation);
-        EXPECT_EQ(probeStreams(output, QStringLiteral("audio")).size(), 1);
-        if (flat()) {
-            auto generator = ImageGenerator::imageGeneratorWithAsset(asset(output));
-            EXPECT_LE(largestColourDistance(generator->copyImageAtTime(MediaTime::zero(), nullptr, nullptr), kFlatColour), kColourTolerance);
-        }
-    }
+    expectTheMoviesShape(trimmed);
     EXPECT_NEAR(countVideoFrames(trimmed), 18, 1);
+}
+
+TEST_P(OddSizeMovieTest, MixKeepsTheMoviesShape)
+{
+    expectTheMoviesShape(exported(QStringLiteral("mix.mp4"), [&](ExportSession &session) { session.setAudioMix(mixOfAllAudioTracks(movie())); }));
 }
 
 INSTANTIATE_TEST_SUITE_P(TinyAndOddSizes, OddSizeMovieTest,
                          ::testing::Values(OddShape{{2, 2}}, OddShape{{3, 3}}, OddShape{{4, 4}}, OddShape{{6, 4}}, OddShape{{14, 14}},
                                            OddShape{{15, 15}}, OddShape{{16, 16}}, OddShape{{641, 361}},
                                            OddShape{{4, 4}, 0, "libx264rgb"}, OddShape{{15, 15}, 0, "libx264rgb"},
-                                           OddShape{{4, 4}, 90}, OddShape{{6, 2}, 270}, OddShape{{2, 2}, 90}));
+                                           OddShape{{4, 4}, 90}, OddShape{{6, 2}, 270}, OddShape{{2, 2}, 90}),
+                         [](const auto &info) {
+                             const OddShape &shape = info.param;
+                             return std::to_string(shape.size.width()) + "x" + std::to_string(shape.size.height()) +
+                                    (shape.rotation ? "Turned" + std::to_string(shape.rotation) : "") + (QLatin1String(shape.codec) == "libx264" ? "" : "Rgb");
+                         });
 
 } // namespace
 } // namespace zaf::media
