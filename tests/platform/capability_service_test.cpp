@@ -27,29 +27,41 @@ protected:
     test::ScratchDir scratch;
     CapabilityService &s = CapabilityService::shared(); // built (and its file read) before any capture starts
     const QString homeButton = capability::kHomeButtonType;
-};
-
-TEST_F(CapabilityServiceTest, DesktopDefaultsAnswerWithoutAFileAndStandWhenItIsMalformedOrMissing)
-{
-    auto expectDefaults = [&] {
+    void expectDefaults()
+    {
         EXPECT_EQ(s.integerAnswer(homeButton, 7), 0);
         EXPECT_TRUE(s.booleanAnswer(capability::kNotGreenTea, false));
         EXPECT_FALSE(s.canTellDeviceIdiom());
         // Tests run on the offscreen platform, where only software rendering exists.
         EXPECT_EQ(s.graphicsQualityLevel(), 10);
-    };
+    }
+};
+
+TEST_F(CapabilityServiceTest, DesktopDefaultsAnswerWithoutAFile)
+{
     expectDefaults();
     EXPECT_EQ(s.integerAnswer("unknown-key", 42), 42);
     EXPECT_TRUE(s.booleanAnswer("unknown-key", true));
-
-    test::LogCapture logs;
-    useFile("{\"home-button-type\": 2,");
-    expectDefaults();
-    qputenv("ZAF_CAPABILITIES_FILE", "/nonexistent/caps.json");
-    s.reload();
-    expectDefaults();
-    EXPECT_EQ(logs.messages("zaf.capability").size(), 2);
 }
+
+// A malformed or missing file is logged, and the defaults stand.
+class CapabilityFileFault : public CapabilityServiceTest, public ::testing::WithParamInterface<bool> {};
+
+TEST_P(CapabilityFileFault, LeavesTheDefaults)
+{
+    test::LogCapture logs;
+    if (GetParam()) {
+        useFile("{\"home-button-type\": 2,");
+    } else {
+        qputenv("ZAF_CAPABILITIES_FILE", "/nonexistent/caps.json");
+        s.reload();
+    }
+    expectDefaults();
+    EXPECT_EQ(logs.messages("zaf.capability").size(), 1);
+}
+
+INSTANTIATE_TEST_SUITE_P(Files, CapabilityFileFault, ::testing::Bool(), [](const auto &info) { return info.param ? "Malformed" : "Missing"; });
+
 
 TEST_F(CapabilityServiceTest, FileOverridesTheDefaults)
 {

@@ -19,12 +19,15 @@ TEST(Dispatch, MainQueueRunsOnALaterPassOfTheMainLoop)
     EXPECT_TRUE(ran);
 }
 
-TEST(Dispatch, MainSyncRunsInlineOnMainAndBlocksFromWorkers)
+TEST(Dispatch, MainSyncRunsInlineOnTheMainThread)
 {
     bool inlineRan = false;
     mainSync([&] { inlineRan = true; });
     EXPECT_TRUE(inlineRan);
+}
 
+TEST(Dispatch, MainSyncFromAWorkerRunsOnTheMainThread)
+{
     std::atomic<bool> onMain{false}, workerDone{false};
     async(Priority::Default, [&] {
         mainSync([&] { onMain = isMainThread(); });
