@@ -85,21 +85,23 @@ protected:
 
 // Store fields come from the catalogue, the name from it or else from the local entry; what the
 // store does not know is an empty author and link, and no name without a local entry.
-TEST_F(StoreManagerTest, RecordsCombineTheStoreAndTheLocalEntries)
+class StoreManagerRecordTest : public StoreManagerTest, public ::testing::WithParamInterface<std::pair<const char *, Expected>> {};
+
+TEST_P(StoreManagerRecordTest, CombinesTheStoreAndTheLocalEntry)
 {
-    const ZafStoreManager manager(fixtureCatalogue());
-    expectRecord(manager, QStringLiteral("org.zafrel.Recorder"),
-                 {QStringLiteral("Zafrel Recorder"), QStringLiteral("Zafrel Labs"), QStringLiteral("appstream://org.zafrel.Recorder"),
-                  QStringList{QStringLiteral("AudioVideo"), QStringLiteral("Recorder")}});
-    expectRecord(manager, QStringLiteral("org.zafrel.Nameless"),
-                 {QStringLiteral("Local Nameless"), QStringLiteral("Nameless Works"), QStringLiteral("appstream://org.zafrel.Nameless")});
-    expectRecord(manager, QStringLiteral("org.zafrel.LocalOnly"), {QStringLiteral("Local LocalOnly"), QString(""), QString("")});
-    expectRecord(manager, QStringLiteral("org.zafrel.Nowhere"), {std::nullopt, QString(""), QString("")});
+    expectRecord(ZafStoreManager(fixtureCatalogue()), QStringLiteral("org.zafrel.") + QLatin1String(GetParam().first), GetParam().second);
 }
+
+INSTANTIATE_TEST_SUITE_P(
+    Applications, StoreManagerRecordTest,
+    ::testing::Values(std::pair{"Recorder", Expected{"Zafrel Recorder", "Zafrel Labs", "appstream://org.zafrel.Recorder", QStringList{"AudioVideo", "Recorder"}}},
+                      std::pair{"Nameless", Expected{"Local Nameless", "Nameless Works", "appstream://org.zafrel.Nameless"}},
+                      std::pair{"LocalOnly", Expected{"Local LocalOnly", "", ""}}, std::pair{"Nowhere", Expected{std::nullopt, "", ""}}),
+    [](const auto &info) { return std::string(info.param.first); });
 
 // A corrupt catalogue is logged once and a missing one answers at once; either way a record with
 // the local name is still delivered on the main thread.
-TEST_F(StoreManagerTest, UnreadableCataloguesStillDeliverARecord)
+TEST_F(StoreManagerTest, CorruptCatalogueStillDeliversARecord)
 {
     CatalogueDirectory corrupt(QStringLiteral("corrupt"));
     corrupt.write(QStringLiteral("corrupt.xml"), zaf::test::kCorruptCollection);
@@ -107,7 +109,10 @@ TEST_F(StoreManagerTest, UnreadableCataloguesStillDeliverARecord)
     const ZafStoreManager corrupted(Catalogue::loadFromDirectory(corrupt.path(), QStringLiteral("en_US")));
     EXPECT_EQ(log.messages(QStringLiteral("zaf.store")).size(), 1);
     expectRecord(corrupted, QStringLiteral("org.zafrel.Recorder"), {QStringLiteral("Local Recorder"), QString(""), QString("")});
+}
 
+TEST_F(StoreManagerTest, MissingCatalogueStillDeliversARecord)
+{
     const QString missing = QDir::temp().filePath(QStringLiteral("zaf-store-fixtures/missing-catalogue"));
     QDir(missing).removeRecursively();
     expectRecord(ZafStoreManager(Catalogue::loadFromDirectory(missing)), QStringLiteral("org.zafrel.Nameless"),

@@ -82,32 +82,34 @@ protected:
 
 } // namespace
 
-// Each component gives exactly the properties it has; unknown and empty identifiers give none; a
-// German catalogue takes the translated name and falls back to the untranslated one.
-TEST_F(CatalogueTest, ItemForIdentifierGivesThePropertiesTheComponentHas)
-{
-    const struct {
-        const char *id;
-        const char *expected;
-    } cases[] = {
-        {"org.zafrel.Recorder", "appstream://org.zafrel.Recorder | Zafrel Recorder | Zafrel Labs | AudioVideo,Recorder"},
-        {"org.zafrel.Nameless", "appstream://org.zafrel.Nameless | - | Nameless Works | -"},
-        {"org.zafrel.Plain", "appstream://org.zafrel.Plain | Plain App | - | -"},
-        {"org.zafrel.Unknown", "none"},
-        {"", "none"},
-    };
-    for (const auto &c : cases)
-        EXPECT_EQ(describe(m_catalogue->itemForIdentifier(QString::fromLatin1(c.id))), QString::fromLatin1(c.expected)) << c.id;
+// Each component gives exactly the properties it has; unknown and empty identifiers give none.
+class CatalogueItemTest : public CatalogueTest, public ::testing::WithParamInterface<std::pair<const char *, const char *>> {};
 
+TEST_P(CatalogueItemTest, HoldsThePropertiesTheComponentHas)
+{
+    const auto [id, expected] = GetParam();
+    EXPECT_EQ(describe(m_catalogue->itemForIdentifier(QString::fromLatin1(id))), QString::fromLatin1(expected));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Identifiers, CatalogueItemTest,
+    ::testing::Values(std::pair{"org.zafrel.Recorder", "appstream://org.zafrel.Recorder | Zafrel Recorder | Zafrel Labs | AudioVideo,Recorder"},
+                      std::pair{"org.zafrel.Nameless", "appstream://org.zafrel.Nameless | - | Nameless Works | -"},
+                      std::pair{"org.zafrel.Plain", "appstream://org.zafrel.Plain | Plain App | - | -"},
+                      std::pair{"org.zafrel.Unknown", "none"}, std::pair{"", "none"}),
+    [](const auto &info) { return *info.param.first ? QString::fromLatin1(info.param.first).section('.', -1).toStdString() : "Empty"; });
+
+// A German catalogue takes the translated name and falls back to the untranslated one.
+TEST_F(CatalogueTest, GermanCatalogueTakesTheTranslatedName)
+{
     const auto german = Catalogue::loadFromDirectory(m_dir.path(), QStringLiteral("de-DE"));
     EXPECT_EQ(german->locale(), QStringLiteral("de_DE"));
     EXPECT_EQ(german->itemForIdentifier(QStringLiteral("org.zafrel.Recorder"))->displayName, QStringLiteral("Zafrel Rekorder"));
     EXPECT_EQ(german->itemForIdentifier(QStringLiteral("org.zafrel.Plain"))->displayName, QStringLiteral("Plain App"));
 }
 
-// Known identifiers are answered, off the main thread, in the order asked and unknown ones skipped; a
-// request without a key profile or without identifiers is answered with none.
-TEST_F(CatalogueTest, StartAnswersKnownIdentifiersInOrderAndMalformedRequestsWithNone)
+// Known identifiers are answered, off the main thread, in the order asked and unknown ones skipped.
+TEST_F(CatalogueTest, StartAnswersKnownIdentifiersInOrder)
 {
     const Answer answer = answerOf(productLookup(m_catalogue,
         {QStringLiteral("org.zafrel.Plain"), QStringLiteral("org.zafrel.Unknown"), QStringLiteral("org.zafrel.Recorder")}));
@@ -116,22 +118,23 @@ TEST_F(CatalogueTest, StartAnswersKnownIdentifiersInOrderAndMalformedRequestsWit
     ASSERT_EQ(answer.response->results.size(), 2);
     EXPECT_EQ(answer.response->results[0].displayName, QStringLiteral("Plain App"));
     EXPECT_EQ(answer.response->results[1].displayName, QStringLiteral("Zafrel Recorder"));
+}
 
+// A request without a key profile or without identifiers is answered with none.
+TEST_F(CatalogueTest, MalformedRequestIsAnsweredWithNone)
+{
     StoreLookup noProfile(m_catalogue);
     noProfile.setBundleIdentifiers({QStringLiteral("org.zafrel.Recorder")});
     EXPECT_FALSE(answerOf(noProfile).response.has_value());
     EXPECT_FALSE(answerOf(productLookup(m_catalogue, {})).response.has_value());
 }
 
-// Each corrupt file is logged by name and the good items stay; with only corrupt files the answer,
-// still off the main thread, has no items.
-TEST(StoreCatalogueErrorsTest, CorruptFilesAreLoggedAndTheGoodItemsStay)
+// Each corrupt file is logged by name and the good items stay.
+TEST(StoreCatalogueErrorsTest, CorruptFileIsLoggedAndTheGoodItemsStay)
 {
-    CatalogueDirectory mixed(QStringLiteral("mixed")), corrupt(QStringLiteral("corrupt"));
+    CatalogueDirectory mixed(QStringLiteral("mixed"));
     mixed.write(QStringLiteral("a-good.xml"), zaf::test::kFixtureCollection);
     const QString bad = mixed.write(QStringLiteral("b-corrupt.xml"), zaf::test::kCorruptCollection);
-    corrupt.write(QStringLiteral("corrupt.xml"), zaf::test::kCorruptCollection);
-    corrupt.write(QStringLiteral("garbage.xml.gz"), QByteArray("\x1f\x8b not really gzip", 19));
     LogCapture log;
     const auto catalogue = Catalogue::loadFromDirectory(mixed.path(), QStringLiteral("en_US"));
     const QStringList messages = log.messages(QStringLiteral("zaf.store"));
@@ -139,8 +142,15 @@ TEST(StoreCatalogueErrorsTest, CorruptFilesAreLoggedAndTheGoodItemsStay)
     EXPECT_TRUE(messages[0].startsWith(QStringLiteral("Store catalogue file %1 is unreadable: ").arg(bad))) << messages[0].toStdString();
     EXPECT_TRUE(catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Recorder")).has_value());
     EXPECT_FALSE(catalogue->itemForIdentifier(QStringLiteral("org.zafrel.Bro")).has_value());
+}
 
-    log.clear();
+// With only corrupt files each is logged, and the answer, still off the main thread, has no items.
+TEST(StoreCatalogueErrorsTest, OnlyCorruptFilesAnswerWithoutItems)
+{
+    CatalogueDirectory corrupt(QStringLiteral("corrupt"));
+    corrupt.write(QStringLiteral("corrupt.xml"), zaf::test::kCorruptCollection);
+    corrupt.write(QStringLiteral("garbage.xml.gz"), QByteArray("\x1f\x8b not really gzip", 19));
+    LogCapture log;
     const auto broken = Catalogue::loadFromDirectory(corrupt.path(), QStringLiteral("en_US"));
     EXPECT_EQ(log.messages(QStringLiteral("zaf.store")).size(), 2);
     const Answer answer = answerOf(productLookup(broken, {QStringLiteral("org.zafrel.Recorder")}));
