@@ -7,6 +7,7 @@
 #include "tests/support/log_capture.h"
 #include "tests/support/process_temp_directory.h"
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/media/unusable_movies.h"
 #include "tests/support/temp_dir.h"
 
 #include <QFileInfo>
@@ -79,40 +80,48 @@ TEST(AudioMixUtility, TwoTrackMovieBecomesOneTrackCarryingBothTonesWithTheVideoC
     EXPECT_EQ(streamMD5(out, QStringLiteral("0:v")), streamMD5(source, QStringLiteral("0:v")));
 }
 
-// The mix lists every audio track in order and nothing else (the video is track 1); a movie
-// without audio gets an empty mix and exports without an audio track.
-TEST(AudioMixUtility, MixListsEveryAudioTrackInOrderAndNothingElse)
+// The mix lists every audio track in order and nothing else (the video is track 1), without reading
+// the movie while the session is made.
+class AudioMixTracks : public ::testing::TestWithParam<std::pair<int, QList<std::int32_t>>> {};
+
+TEST_P(AudioMixTracks, MixListsEveryAudioTrackInOrder)
 {
     ScratchDir scratch;
-    for (const auto &[tracks, ids] : {std::pair{0, QList<std::int32_t>{}}, {3, {2, 3, 4}}}) {
-        SCOPED_TRACE(tracks);
-        const QString source = sharedFixtureMovie({.audioTracks = tracks});
-        const auto session = ZafAudioMixUtility::exportSessionForMixingAudio(QUrl::fromLocalFile(source),
-                                                                             QUrl::fromLocalFile(scratch.file(QStringLiteral("o.mp4"))));
-        ASSERT_TRUE(session);
-        EXPECT_FALSE(session->asset()->isLoaded()) << "making the session reads nothing";
-        QList<std::int32_t> listed;
-        for (const auto &p : ZafAudioMixUtility::audioMixForAsset(*session->asset()).inputParameters)
-            listed << p.trackID;
-        EXPECT_EQ(listed, ids);
-    }
+    const auto &[tracks, ids] = GetParam();
+    const auto session = ZafAudioMixUtility::exportSessionForMixingAudio(QUrl::fromLocalFile(sharedFixtureMovie({.audioTracks = tracks})),
+                                                                         QUrl::fromLocalFile(scratch.file(QStringLiteral("o.mp4"))));
+    ASSERT_TRUE(session);
+    EXPECT_FALSE(session->asset()->isLoaded()) << "making the session reads nothing";
+    QList<std::int32_t> listed;
+    for (const auto &p : ZafAudioMixUtility::audioMixForAsset(*session->asset()).inputParameters)
+        listed << p.trackID;
+    EXPECT_EQ(listed, ids);
+}
+
+INSTANTIATE_TEST_SUITE_P(Movies, AudioMixTracks, ::testing::Values(std::pair{0, QList<std::int32_t>{}}, std::pair{3, QList<std::int32_t>{2, 3, 4}}),
+                         [](const auto &info) { return std::to_string(info.param.first) + "AudioTracks"; });
+
+// A movie without audio gets an empty mix and exports without an audio track.
+TEST(AudioMixUtility, MovieWithoutAudioMixesIntoOneWithoutAudio)
+{
     const MixResult r = mix(QUrl::fromLocalFile(sharedFixtureMovie({.audioTracks = 0})));
     ASSERT_FALSE(r.error.has_value());
     EXPECT_EQ(audioStreamCount(r.url.toLocalFile()), 0);
 }
 
-TEST(AudioMixUtility, UnreadableMovieFailsWithExportCodeAndLogs)
+class AudioMixUnreadable : public ::testing::TestWithParam<UnusableMovie> {};
+
+TEST_P(AudioMixUnreadable, FailsWithTheExportCodeAndLogs)
 {
     ScratchDir scratch;
     LogCapture logs;
-    for (const QString &path : {scratch.write(QStringLiteral("garbage.mp4"), 5000), scratch.file(QStringLiteral("missing.mp4"))}) {
-        const MixResult r = mix(QUrl::fromLocalFile(path));
-        EXPECT_TRUE(r.url.isEmpty());
-        ASSERT_TRUE(r.error.has_value());
-        EXPECT_EQ(r.error->code, -5812);
-    }
-    EXPECT_EQ(logs.count(QStringLiteral("ZafAudioMixUtility: MvAssetExportSessionFailed")), 2);
+    const MixResult r = mix(QUrl::fromLocalFile(GetParam().make(scratch)));
+    EXPECT_TRUE(r.url.isEmpty());
+    EXPECT_EQ(r.error.value_or(Error{}).code, -5812);
+    EXPECT_EQ(logs.count(QStringLiteral("ZafAudioMixUtility: MvAssetExportSessionFailed")), 1);
 }
+
+INSTANTIATE_TEST_SUITE_P(Files, AudioMixUnreadable, ::testing::ValuesIn(unusableMovies()), caseName);
 
 // The temporary file is named from the directory path (whose trailing "/" gives a double slash)
 // and the whole seconds of the time.

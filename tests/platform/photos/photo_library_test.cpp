@@ -2,6 +2,7 @@
 #include "platform/photos/photo_library.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/named_cases.h"
 #include "tests/support/private_mounts.h"
 #include "tests/support/temp_dir.h"
 
@@ -14,6 +15,8 @@
 
 namespace zaf::photos {
 namespace {
+
+ZAF_PRINT_CASES_AS_NAMES
 
 struct Outcome {
     bool success = false;
@@ -32,11 +35,6 @@ Outcome save(PhotoLibrary &library, const QString &movie)
     return future.get();
 }
 
-QStringList entries(const QString &dir)
-{
-    return QDir(dir).entryList(QDir::AllEntries | QDir::Hidden | QDir::NoDotAndDotDot, QDir::Name);
-}
-
 // A volume that reports a chosen free size.
 class SmallVolume : public FileManager {
 public:
@@ -47,7 +45,7 @@ public:
     }
 };
 
-TEST(PhotoLibrary, SavesCopiesUnderUniqueNamesOffTheMainThreadAndKeepsTheSource)
+TEST(PhotoLibrary, SavesCopiesUnderUniqueNamesOffTheMainThread)
 {
     test::ScratchDir scratch;
     const QString movie = test::makeFixtureMovie(scratch.path(), {});
@@ -56,31 +54,43 @@ TEST(PhotoLibrary, SavesCopiesUnderUniqueNamesOffTheMainThreadAndKeepsTheSource)
     EXPECT_TRUE(first.success);
     EXPECT_FALSE(first.onMainThread);
     EXPECT_TRUE(save(library, movie).success);
-    const QStringList saved = entries(library.libraryDirectory());
+    const QStringList saved = test::entryNames(library.libraryDirectory());
     ASSERT_EQ(saved.size(), 2) << saved.join(',').toStdString();
     EXPECT_TRUE(QFile::exists(movie));
     for (const QString &name : saved)
         EXPECT_EQ(test::streamMD5(QDir(library.libraryDirectory()).filePath(name), "0"), test::streamMD5(movie, "0"));
 }
 
-TEST(PhotoLibrary, RefusesNonMoviesFullVolumesAndUnusableLibrariesWithoutWritingAnything)
+// A save the library refuses writes nothing and keeps the source.
+struct Refusal {
+    const char *name;
+    int code;
+};
+
+class PhotoLibraryRefusal : public ::testing::TestWithParam<Refusal> {};
+
+TEST_P(PhotoLibraryRefusal, WritesNothing)
 {
     test::ScratchDir scratch;
-    auto expectRefused = [](PhotoLibrary library, const QString &movie, int code) {
-        const Outcome outcome = save(library, movie);
-        EXPECT_FALSE(outcome.success);
-        EXPECT_EQ(outcome.error.value_or(Error{}).code, code);
-        EXPECT_TRUE(entries(library.libraryDirectory()).isEmpty());
-        EXPECT_TRUE(QFile::exists(movie));
-    };
-    expectRefused(PhotoLibrary(scratch.file("Videos")), scratch.write("x.mp4", 5000), kPhotoLibraryErrorNotPlayable);
-    const QString movie = test::makeFixtureMovie(scratch.path(), {});
-    SmallVolume volume;
-    volume.freeSize = std::uint64_t(QFileInfo(movie).size());
-    expectRefused(PhotoLibrary(scratch.file("Full"), volume), movie, kPhotoLibraryErrorNotEnoughSpace);
+    const QString name = QString::fromLatin1(GetParam().name);
+    const QString movie = name == "NotAMovie" ? scratch.write("x.mp4", 5000) : test::makeFixtureMovie(scratch.path(), {});
+    SmallVolume full;
+    full.freeSize = std::uint64_t(QFileInfo(movie).size());
     // A library that cannot be made: a file stands where its parent should be.
-    expectRefused(PhotoLibrary(scratch.write("blocker", 1) + "/Videos"), movie, kPhotoLibraryErrorLibraryUnavailable);
+    PhotoLibrary library = name == "FullVolume" ? PhotoLibrary(scratch.file("Full"), full)
+                           : name == "LibraryBlocked" ? PhotoLibrary(scratch.write("blocker", 1) + "/Videos")
+                                                      : PhotoLibrary(scratch.file("Videos"));
+    const Outcome outcome = save(library, movie);
+    EXPECT_FALSE(outcome.success);
+    EXPECT_EQ(outcome.error.value_or(Error{}).code, GetParam().code);
+    EXPECT_TRUE(test::entryNames(library.libraryDirectory()).isEmpty());
+    EXPECT_TRUE(QFile::exists(movie));
 }
+
+INSTANTIATE_TEST_SUITE_P(Cases, PhotoLibraryRefusal,
+                         ::testing::Values(Refusal{"NotAMovie", kPhotoLibraryErrorNotPlayable}, Refusal{"FullVolume", kPhotoLibraryErrorNotEnoughSpace},
+                                           Refusal{"LibraryBlocked", kPhotoLibraryErrorLibraryUnavailable}),
+                         test::caseName);
 
 // The library on a file system of its own that fails the copy: one that fills up part-way through
 // (its volume claims room enough, so the copy starts) and a read-only one. The save fails with a
@@ -91,7 +101,6 @@ struct OwnVolumeCase {
     bool readOnly;
     int code;
 };
-void PrintTo(const OwnVolumeCase &c, std::ostream *os) { *os << c.name; }
 
 class PhotoLibraryOnItsOwnVolume : public ::testing::TestWithParam<OwnVolumeCase> {};
 
@@ -116,7 +125,7 @@ TEST_P(PhotoLibraryOnItsOwnVolume, FailsWithALoggedErrorLeavingNothingAndKeeping
     const Outcome outcome = save(library, movie);
     EXPECT_FALSE(outcome.success);
     EXPECT_EQ(outcome.error.value_or(Error{}).code, GetParam().code) << outcome.error.value_or(Error{}).message.toStdString();
-    EXPECT_TRUE(entries(directory).isEmpty()) << entries(directory).join(", ").toStdString();
+    EXPECT_TRUE(test::entryNames(directory).isEmpty()) << test::entryNames(directory).join(", ").toStdString();
     EXPECT_EQ(test::fileDigest(movie), before);
     const QString logged = logs.messages("zaf.photos").join('\n');
     EXPECT_TRUE(logged.contains("cannot add the video to " + directory)) << logged.toStdString();
@@ -125,7 +134,7 @@ TEST_P(PhotoLibraryOnItsOwnVolume, FailsWithALoggedErrorLeavingNothingAndKeeping
 INSTANTIATE_TEST_SUITE_P(Faults, PhotoLibraryOnItsOwnVolume,
                          ::testing::Values(OwnVolumeCase{"FillsUpMidCopy", false, kPhotoLibraryErrorNotEnoughSpace},
                                            OwnVolumeCase{"ReadOnly", true, kPhotoLibraryErrorLibraryUnavailable}),
-                         [](const auto &info) { return std::string(info.param.name); });
+                         test::caseName);
 
 } // namespace
 } // namespace zaf::photos
