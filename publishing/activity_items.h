@@ -8,6 +8,8 @@
 // attachment. The movie always comes before the attachment, so the movie is the first local file of
 // the list, and only when it plays: an attachment is never published in the recording's place, even
 // when it is a movie itself. No position past the end of the list is ever read.
+//
+// Threads: any thread; nothing here reads a file.
 
 #include <QString>
 #include <QUrl>

@@ -5,6 +5,7 @@
 #include "publishing/plugin_loader.h"
 #include "publishing/publishing_agent.h"
 #include "publishing/youtube_activity.h"
+#include "tests/publishing/case_names.h"
 #include "tests/publishing/sign_in_support.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/temp_dir.h"
@@ -18,10 +19,7 @@
 
 namespace {
 
-// Test names show a case's name, not its bytes.
-template <typename Case>
-    requires requires(const Case &c) { c.name; }
-void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
+using zaf::test::PrintTo;
 
 const QString kPluginPath = QStringLiteral(ZAF_PUBLISHING_PLUGIN_PATH);
 
@@ -106,54 +104,40 @@ TEST(PublishingPluginTest, FindsTheAgentClassByName)
     EXPECT_NE(qobject_cast<ZafPublishingAgent *>(agent.get()), nullptr);
 }
 
-struct RefusedLookup {
-    const char *name;
-    const char *file;      // "" for the built plug-in; else a scratch file, written when `written`
-    bool written;
-    const char *className; // the name that is looked up, and so named by the reason
-};
+class RefusedLookupTest : public ::testing::TestWithParam<const char *> {};
 
-class RefusedLookupTest : public ::testing::TestWithParam<RefusedLookup> {};
-
-// A wrong class name, a file that is no plug-in and a missing file are refused with a reason.
+// A wrong class name, a file that is no plug-in and a missing file are refused with a reason that
+// names the class or the file.
 TEST_P(RefusedLookupTest, IsRefusedWithAReason)
 {
-    const RefusedLookup &c = GetParam();
     zaf::test::ScratchDir scratch;
-    const QString file = QString::fromLatin1(c.file);
-    const QString path = file.isEmpty() ? kPluginPath : c.written ? scratch.write(file, 64) : scratch.file(file);
-    const auto lookup = zaf::publishing::publishingAgentClass(path, QString::fromLatin1(c.className));
+    const QString which = QString::fromLatin1(GetParam());
+    const bool wrongClass = which == QLatin1String("WrongClassName");
+    const QString path = wrongClass ? kPluginPath
+                         : which == QLatin1String("NotAPlugin") ? scratch.write(QStringLiteral("libnot_a_plugin.so"), 64)
+                                                                 : scratch.file(QStringLiteral("absent.so"));
+    const QString className = wrongClass ? QStringLiteral("NoSuchAgent") : QLatin1String(kZafYouTubePublishingAgentClassName);
+    const auto lookup = zaf::publishing::publishingAgentClass(path, className);
     EXPECT_FALSE(lookup.ok());
-    EXPECT_FALSE(lookup.errorText.isEmpty());
-    if (file.isEmpty()) {
-        EXPECT_TRUE(lookup.errorText.contains(QLatin1String(c.className))) << lookup.errorText.toStdString();
-    }
+    EXPECT_TRUE(lookup.errorText.contains(wrongClass ? className : path)) << lookup.errorText.toStdString();
 }
 
-INSTANTIATE_TEST_SUITE_P(Lookups, RefusedLookupTest, ::testing::Values(
-    RefusedLookup{"WrongClassName", "", false, "NoSuchAgent"},
-    RefusedLookup{"NotAPlugin", "libnot_a_plugin.so", true, kZafYouTubePublishingAgentClassName},
-    RefusedLookup{"MissingFile", "absent.so", false, kZafYouTubePublishingAgentClassName}),
-    [](const auto &info) { return std::string(info.param.name); });
+INSTANTIATE_TEST_SUITE_P(Lookups, RefusedLookupTest, ::testing::Values("WrongClassName", "NotAPlugin", "MissingFile"),
+                         [](const auto &info) { return std::string(info.param); });
 
-// The description cell is reached through the form's table, as the share action reaches it; row 3
-// has no such cell.
-TEST_F(PublishingAgentTest, TheDescriptionCellIsReachedThroughTheTable)
+// The description cell is reached by name through the form's table, as the share action reaches it;
+// a section the table lacks has no cell.
+TEST_F(PublishingAgentTest, TheDescriptionCellIsReachedByName)
 {
     QObject *form = formOf(m_agent.get());
-    ASSERT_NE(form, nullptr);
-    auto *table = form->property(kZafFormTableProperty).value<QObject *>();
-    ASSERT_NE(table, nullptr);
-    const auto cell = [table](int row) {
-        QObject *cell = reinterpret_cast<QObject *>(1);
-        EXPECT_TRUE(QMetaObject::invokeMethod(table, kZafTableCellMethod, Q_RETURN_ARG(QObject *, cell), Q_ARG(int, 1), Q_ARG(int, row)));
-        return cell;
-    };
-    ASSERT_NE(cell(0), nullptr);
-    EXPECT_TRUE(QMetaObject::invokeMethod(cell(0), kZafCellSetValueMethod, Q_ARG(QString, QStringLiteral("My run"))));
-    EXPECT_TRUE(QMetaObject::invokeMethod(cell(0), kZafCellSetPlaceholderMethod, Q_ARG(QString, QString())));
+    zaf::test::LogCapture log;
+    zaf::publishing::fillDescriptionOfForm(form, QStringLiteral("My run"));
     EXPECT_EQ(invokeForString(form, "description"), QStringLiteral("My run"));
-    EXPECT_EQ(cell(3), nullptr);
+    EXPECT_TRUE(log.messages(QStringLiteral("zaf.publishing.activity")).isEmpty());
+    QObject *cell = form;
+    EXPECT_TRUE(QMetaObject::invokeMethod(zaf::publishing::objectProperty(form, kZafFormTableProperty), kZafTableCellMethod,
+                                          Q_RETURN_ARG(QObject *, cell), Q_ARG(int, 1), Q_ARG(int, 3)));
+    EXPECT_EQ(cell, nullptr);
 }
 
 // The form lists the assignable categories, "20" among them, and its own routine pre-selects "22".
@@ -238,7 +222,7 @@ INSTANTIATE_TEST_SUITE_P(Reaches, MissingMemberTest, ::testing::Values(
                       {"the publishing form has no _table"}, ""},
     MissingMemberCase{"AgentCancel", [](QObject *form) { zaf::publishing::invokeByName(form, kZafAgentCancelMethod); },
                       {"the publishing form does not answer cancelAction on QObject"}, ""}),
-    [](const auto &info) { return std::string(info.param.name); });
+    zaf::test::kCaseName);
 
 // The form's appearance and its Done and Cancel buttons reach the delegate, in that order.
 TEST_F(PublishingAgentTest, TheFormsEventsReachTheDelegate)

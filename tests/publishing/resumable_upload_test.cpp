@@ -1,7 +1,8 @@
 // The resumable upload against the loopback server: a clean run, recovery from each fault the
 // service produces, and the errors that end an upload for good.
-#include "tests/publishing/upload_test_support.h"
 #include "publishing/plugin/upload/upload_chunk_device.h"
+#include "tests/publishing/case_names.h"
+#include "tests/publishing/upload_test_support.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/temp_dir.h"
 
@@ -52,10 +53,7 @@ int failureCode(UploadHarness &h)
 
 } // namespace
 
-// Test names show a case's name, not its bytes.
-template <typename Case>
-    requires requires(const Case &c) { c.name; }
-void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
+using zaf::test::PrintTo;
 
 // A clean upload sends the file in chunks with rising progress and reports completion once, with
 // the watch URL and a byte-identical file on the server. (Metadata: see the flow tests.)
@@ -134,23 +132,7 @@ INSTANTIATE_TEST_SUITE_P(Faults, RecoverableFaultTest, ::testing::Values(
     // A connection lost once is the network stack's to mend: it rewinds the chunk and sends it
     // again, and the upload neither waits nor asks the server.
     FaultCase{"InterruptedOnceResentByTheNetworkStack", 2 * kChunk, {{FaultKind::DropBodyOnce, 1000}}, {}, {0, kChunk}, 0, 1}),
-    [](const auto &info) { return std::string(info.param.name); });
-
-// A 400 is final: no retry, no wait, the error carries the service's reason and is logged.
-TEST(ResumableUpload, badRequestEndsAtOnceWithTheServicesReason)
-{
-    zaf::test::LogCapture log;
-    UploadHarness h(kChunk);
-    h.server.setAcceptedCategories({QStringLiteral("20")});
-    VideoMetadata metadata;
-    metadata.categoryId = QStringLiteral("22");
-    h.upload.setMetadata(metadata);
-    EXPECT_EQ(failureCode(h), 400);
-    EXPECT_TRUE(h.results.front().error->message.contains(QStringLiteral("invalid video category")));
-    EXPECT_EQ(h.server.requests().size(), 1);
-    EXPECT_TRUE(h.delays.empty());
-    EXPECT_TRUE(log.messages(QStringLiteral("zaf.publishing")).join(QLatin1Char('\n')).contains(QStringLiteral("HTTP 400")));
-}
+    zaf::test::kCaseName);
 
 struct LimitCase {
     const char *name;
@@ -163,7 +145,8 @@ struct LimitCase {
 
 class UploadLimitTest : public ::testing::TestWithParam<LimitCase> {};
 
-// An upload that makes no progress, a missing file and a cancel end with their error, once.
+// The errors that end an upload for good, once: a 400 (at once, with the service's reason, logged),
+// an upload that makes no progress, a missing file and a cancel.
 TEST_P(UploadLimitTest, endsWithItsError)
 {
     const LimitCase &c = GetParam();
@@ -175,6 +158,17 @@ TEST_P(UploadLimitTest, endsWithItsError)
 }
 
 INSTANTIATE_TEST_SUITE_P(Limits, UploadLimitTest, ::testing::Values(
+    LimitCase{"BadRequest", kChunk, 60, [](UploadHarness &h) {
+        h.server.setAcceptedCategories({QStringLiteral("20")});
+        VideoMetadata metadata;
+        metadata.categoryId = QStringLiteral("22");
+        h.upload.setMetadata(metadata);
+    }, 400, [](const UploadHarness &h, const auto &log) {
+        EXPECT_TRUE(h.results.front().error->message.contains(QStringLiteral("invalid video category")));
+        EXPECT_EQ(h.server.requests().size(), 1);
+        EXPECT_TRUE(h.delays.empty());
+        EXPECT_TRUE(log.messages(QStringLiteral("zaf.publishing")).join(QLatin1Char('\n')).contains(QStringLiteral("HTTP 400")));
+    }},
     LimitCase{"SessionGoneBeyondTheRestartLimit", kChunk, 60, [](UploadHarness &h) {
         h.upload.setMaxRestarts(2);
         for (int i = 0; i < 3; ++i)
@@ -195,7 +189,7 @@ INSTANTIATE_TEST_SUITE_P(Limits, UploadLimitTest, ::testing::Values(
                 h.upload.cancel();
         });
     }, UploadCancelledError, [](const UploadHarness &, const auto &) {}}),
-    [](const auto &info) { return std::string(info.param.name); });
+    zaf::test::kCaseName);
 
 struct MisleadingCase {
     const char *name;
@@ -229,7 +223,7 @@ INSTANTIATE_TEST_SUITE_P(Servers, MisleadingServerTest, ::testing::Values(
     MisleadingCase{"RangeStuckAfterTheFirstChunk", kChunk, {}, UploadTooManyRetriesError, 5},
     MisleadingCase{"SessionOnAnotherHost", -1, QStringLiteral("http://localhost:PORT"), UploadUntrustedSessionError, 0},
     MisleadingCase{"SessionOnAnotherPort", -1, QStringLiteral("http://127.0.0.1:1"), UploadUntrustedSessionError, 0}),
-    [](const auto &info) { return std::string(info.param.name); });
+    zaf::test::kCaseName);
 
 struct AnswerCase {
     const char *name;
@@ -265,7 +259,7 @@ INSTANTIATE_TEST_SUITE_P(Headers, UploadAnswerTest, ::testing::Values(
     AnswerCase{"RetryAfterPastTheLargestWait", 503, {}, "9223372036854776", Action::Retry, 503, 600000ms},
     AnswerCase{"RangeInsideTheFile", 308, "bytes=0-499", {}, Action::SendFrom, 500, std::nullopt},
     AnswerCase{"RangeAtTheLargestByteNumber", 308, "bytes=0-9223372036854775807", {}, Action::Fail, UploadMalformedAnswerError, std::nullopt}),
-    [](const auto &info) { return std::string(info.param.name); });
+    zaf::test::kCaseName);
 
 // The chunk device reads its slice of the file and rewinds, so the network stack can resend it.
 TEST(UploadChunkDevice, readsItsSliceAndRewinds)

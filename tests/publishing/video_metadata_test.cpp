@@ -1,5 +1,6 @@
 // The metadata rules of the video service: what normalising repairs and what it refuses.
 #include "publishing/plugin/upload/video_metadata.h"
+#include "tests/publishing/case_names.h"
 
 #include <QJsonDocument>
 #include <QJsonObject>
@@ -9,12 +10,8 @@ using namespace zaf::publishing;
 
 namespace {
 
-// Test names show a case's name, not its bytes.
-template <typename Case>
-    requires requires(const Case &c) { c.name; }
-void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
+using zaf::test::PrintTo;
 
-const auto kCaseName = [](const auto &info) { return std::string(info.param.name); };
 const QString kEmoji = QString::fromUtf8("\xF0\x9F\x8E\xAE");
 
 struct TitleCase {
@@ -40,7 +37,7 @@ INSTANTIATE_TEST_SUITE_P(Titles, TitleTest, ::testing::Values(
     TitleCase{"TooLong", QString(150, QLatin1Char('a')), QString(100, QLatin1Char('a'))},
     // The 100th character is one whole emoji (two UTF-16 units).
     TitleCase{"CutAfterASurrogatePair", QString(99, QLatin1Char('b')) + kEmoji + kEmoji, QString(99, QLatin1Char('b')) + kEmoji}),
-    kCaseName);
+    zaf::test::kCaseName);
 
 // Descriptions lose angle brackets and are cut at 5000 UTF-8 bytes on a character boundary.
 TEST(VideoMetadata, normaliseDescriptionCutsOnACharacterBoundary)
@@ -75,7 +72,7 @@ TEST_P(RefusedMetadataTest, normalisedRefusesWhatCannotBeRepaired)
 
 INSTANTIATE_TEST_SUITE_P(Fields, RefusedMetadataTest, ::testing::Values(
     RefusedCase{"CategoryThatCannotBeAssigned", "18", "private", InvalidCategoryError}, // it exists
-    RefusedCase{"UnknownPrivacyStatus", "20", "friends", InvalidPrivacyStatusError}), kCaseName);
+    RefusedCase{"UnknownPrivacyStatus", "20", "friends", InvalidPrivacyStatusError}), zaf::test::kCaseName);
 
 // The JSON carries the normalised fields; the privacy status is read in any case and with spaces.
 TEST(VideoMetadata, toJsonWritesTheNormalisedFields)

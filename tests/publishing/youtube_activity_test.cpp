@@ -6,6 +6,7 @@
 #include "publishing/activity_items.h"
 #include "publishing/youtube_activity.h"
 #include "tempstore/temp_store.h"
+#include "tests/publishing/case_names.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
 #include "tests/support/process_temp_directory.h"
@@ -21,10 +22,7 @@
 namespace zaf::test {
 namespace {
 
-// Test names show a case's name, not its bytes.
-template <typename Case>
-    requires requires(const Case &c) { c.name; }
-void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
+using zaf::test::PrintTo;
 
 class TempDirectoryEnvironment : public ::testing::Environment {
 public:
@@ -66,15 +64,13 @@ void giveUpCopy(ZafYouTubeActivity &activity)
     dispatch::waitForGlobalQueue(dispatch::Priority::Background);
 }
 
-// Points the capability service at a file answering "not-green-tea" with `allowed`.
-class CapabilityOverride {
-public:
+// Points the capability service at a file answering "not-green-tea" with `allowed`, for the scope.
+struct CapabilityOverride {
     explicit CapabilityOverride(bool allowed)
     {
-        const QString path = m_scratch.file(QStringLiteral("capabilities.json"));
+        const QString path = scratch.file(QStringLiteral("capabilities.json"));
         QFile file(path);
-        EXPECT_TRUE(file.open(QIODevice::WriteOnly));
-        file.write(allowed ? R"({"not-green-tea": true})" : R"({"not-green-tea": false})");
+        EXPECT_TRUE(file.open(QIODevice::WriteOnly) && file.write(allowed ? R"({"not-green-tea": true})" : R"({"not-green-tea": false})") > 0);
         file.close();
         qputenv("ZAF_CAPABILITIES_FILE", QFile::encodeName(path));
         CapabilityService::shared().reload();
@@ -84,9 +80,7 @@ public:
         qunsetenv("ZAF_CAPABILITIES_FILE");
         CapabilityService::shared().reload();
     }
-
-private:
-    ScratchDir m_scratch;
+    ScratchDir scratch;
 };
 
 // Type, title and category do not change with the language.
@@ -149,11 +143,12 @@ INSTANTIATE_TEST_SUITE_P(Items, ActivityDescriptionTest, ::testing::Values(
     DescriptionCase{"HostMessageAndAttachment", {"Host message", "@movie", "@notes"}, "Host message"},
     DescriptionCase{"HostMessageOnly", {"Host message"}, "Host message"},
     DescriptionCase{"MovieFirst", {"@movie", "Text"}, "Text"},
-    DescriptionCase{"NoItems", {}, ""}), [](const auto &info) { return std::string(info.param.name); });
+    DescriptionCase{"NoItems", {}, ""}), zaf::test::kCaseName);
 
 struct SourceCase {
     const char *name;
     QStringList items;
+    bool probes;         // a file among the items is opened before anything is copied
     bool copiesTheMovie; // else nothing is copied
     bool editorNamesTheMovie = false;
 };
@@ -162,6 +157,8 @@ class ActivitySourceTest : public ::testing::TestWithParam<SourceCase> {};
 
 // The movie copied is the editor's when it names one, else the first file of the list when it
 // plays: never a later attachment, even a playable one. Without one, nothing is copied (logged).
+// Preparation returns before that file is opened: the probe's answer reaches the main thread through
+// its event loop, and only then does the copy start.
 TEST_P(ActivitySourceTest, CopiesTheRecordingOnly)
 {
     const SourceCase &c = GetParam();
@@ -169,6 +166,8 @@ TEST_P(ActivitySourceTest, CopiesTheRecordingOnly)
     ZafYouTubeActivity activity;
     activity.setSourceMovieURL(c.editorNamesTheMovie ? fixtureMovie(2) : QUrl());
     activity.prepareWithActivityItems(items(c.items));
+    EXPECT_EQ(activity.isProbingMovie(), c.probes);
+    EXPECT_EQ(bool(activity.exportSession()), c.copiesTheMovie && !c.probes);
     ASSERT_TRUE(waitUntil([&] { return !activity.isProbingMovie(); }));
     EXPECT_EQ(activity.sourceMovieURL(), c.copiesTheMovie ? fixtureMovie(2) : QUrl());
     EXPECT_EQ(bool(activity.exportSession()), c.copiesTheMovie);
@@ -177,28 +176,14 @@ TEST_P(ActivitySourceTest, CopiesTheRecordingOnly)
 }
 
 INSTANTIATE_TEST_SUITE_P(Items, ActivitySourceTest, ::testing::Values(
-    SourceCase{"UsualList", {"T", "L", "@movie"}, true},
-    SourceCase{"HostMessageAndAttachment", {"Host message", "@movie", "@notes"}, true},
-    SourceCase{"HostMessageAndAMovieAttachment", {"Host message", "@movie", "@silent"}, true},
-    SourceCase{"UsualListAndAMovieAttachment", {"T", "L", "@movie", "@silent"}, true},
-    SourceCase{"UnplayableMovieBeforeAMovieAttachment", {"M", "@garbage", "@silent"}, false},
-    SourceCase{"TheEditorsMovie", {"M", "@silent", "@silent"}, true, true},
-    SourceCase{"NoFile", {"a", "b"}, false},
-    SourceCase{"NoItems", {}, false}), [](const auto &info) { return std::string(info.param.name); });
-
-// Preparation returns before the movie among the items is opened: the probe's answer reaches the
-// main thread through its event loop, and only then does the copy start.
-TEST(YouTubeActivity, PrepareReturnsBeforeTheMovieIsOpened)
-{
-    ZafYouTubeActivity activity;
-    activity.prepareWithActivityItems(items({"T", "L", "@movie"}));
-    EXPECT_TRUE(activity.isProbingMovie());
-    EXPECT_TRUE(activity.sourceMovieURL().isEmpty());
-    EXPECT_FALSE(activity.exportSession());
-    EXPECT_EQ(activity.descriptionText(), QStringLiteral("T L"));
-    ASSERT_TRUE(waitUntil([&] { return activity.exportSession() != nullptr; }));
-    giveUpCopy(activity);
-}
+    SourceCase{"UsualList", {"T", "L", "@movie"}, true, true},
+    SourceCase{"HostMessageAndAttachment", {"Host message", "@movie", "@notes"}, true, true},
+    SourceCase{"HostMessageAndAMovieAttachment", {"Host message", "@movie", "@silent"}, true, true},
+    SourceCase{"UsualListAndAMovieAttachment", {"T", "L", "@movie", "@silent"}, true, true},
+    SourceCase{"UnplayableMovieBeforeAMovieAttachment", {"M", "@garbage", "@silent"}, true, false},
+    SourceCase{"TheEditorsMovie", {"M", "@silent", "@silent"}, false, true, true},
+    SourceCase{"NoFile", {"a", "b"}, false, false},
+    SourceCase{"NoItems", {}, false, false}), zaf::test::kCaseName);
 
 // Cancel while the movie is still probed gives the copy up: the probe's answer starts no export.
 TEST(YouTubeActivity, CancelDuringTheProbeStartsNoCopy)

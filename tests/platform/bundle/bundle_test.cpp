@@ -62,27 +62,15 @@ TEST_F(DirectoryBundleTest, OpensWithItsInformationResourcesAndLocalizations)
     EXPECT_EQ(m_bundle->localizations(), QStringList({QStringLiteral("de"), QStringLiteral("en"), QStringLiteral("pt_BR")}));
 }
 
-struct ResourceCase {
-    const char *name;
-    const char *resource, *type, *localization;
-    const char *found; // below the resource directory; "" when absent
-};
-
-class PathForResourceTest : public DirectoryBundleTest, public ::testing::WithParamInterface<ResourceCase> {};
-
 // A resource is found in a localization's folder; a string table is stored compiled.
-TEST_P(PathForResourceTest, FindsTheResourceInItsLocalization)
+TEST_F(DirectoryBundleTest, PathForResourceFindsTheResourceInItsLocalization)
 {
-    const ResourceCase &c = GetParam();
-    const QString found = m_bundle->pathForResource(QLatin1String(c.resource), QLatin1String(c.type), QLatin1String(c.localization));
-    EXPECT_EQ(found, *c.found ? m_resources + QLatin1Char('/') + QLatin1String(c.found) : QString());
+    const QString deTable = m_resources + QStringLiteral("/de.lproj/Localizable.mo");
+    EXPECT_EQ(m_bundle->pathForResource(QStringLiteral("Localizable"), QStringLiteral("mo"), QStringLiteral("de")), deTable);
+    EXPECT_EQ(m_bundle->pathForResource(QStringLiteral("Localizable"), QStringLiteral("strings"), QStringLiteral("de")), deTable);
+    EXPECT_EQ(m_bundle->pathForResource(QStringLiteral("Localizable"), QStringLiteral("strings"), QStringLiteral("fr")), QString());
+    EXPECT_EQ(m_bundle->pathForResource(QStringLiteral("Info"), QStringLiteral("plist"), QString()), QString());
 }
-
-INSTANTIATE_TEST_SUITE_P(Resources, PathForResourceTest, ::testing::Values(
-    ResourceCase{"CompiledTable", "Localizable", "mo", "de", "de.lproj/Localizable.mo"},
-    ResourceCase{"StringsFoundCompiled", "Localizable", "strings", "de", "de.lproj/Localizable.mo"},
-    ResourceCase{"MissingLocalization", "Localizable", "strings", "fr", ""},
-    ResourceCase{"MissingResource", "Info", "plist", "", ""}), test::CaseName());
 
 // Paths that are no bundle give none: a missing one, an entry that is no application, an empty one.
 TEST_F(DirectoryBundleTest, PathsThatAreNoBundleGiveNone)

@@ -32,7 +32,8 @@ QByteArray appEntry(const char *name)
 }
 
 // Scratch XDG data directories: `home` is XDG_DATA_HOME, `system` the only XDG_DATA_DIRS entry, and
-// `bin` the only PATH entry, which holds zaf-editor. The editor's entry is in `home`.
+// `bin` the only PATH entry, which holds zaf-editor and a link zaf-viewer to opt/viewer/viewer-bin.
+// The editor's entry is in `home`; org.example.Both in both; vendor/tool and the viewer in `system`.
 class DesktopEntryTest : public ::testing::Test {
 protected:
     DesktopEntryTest()
@@ -41,7 +42,14 @@ protected:
           m_dataDirs("XDG_DATA_DIRS", m_system.toUtf8()), m_path("PATH", m_bin.toUtf8())
     {
         test::writeExecutable(m_bin + QStringLiteral("/zaf-editor"));
+        test::writeExecutable(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")));
+        QFile::link(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")), m_bin + QStringLiteral("/zaf-viewer"));
         writeEntry(m_home, QStringLiteral("org.example.Editor.desktop"), kEditorEntry);
+        writeEntry(m_home, QStringLiteral("org.example.Both.desktop"), appEntry("From home"));
+        writeEntry(m_system, QStringLiteral("org.example.Both.desktop"), appEntry("From system"));
+        writeEntry(m_system, QStringLiteral("vendor/tool.desktop"), appEntry("Vendor tool"));
+        writeEntry(m_system, QStringLiteral("org.example.Viewer.desktop"),
+                   "[Desktop Entry]\nType=Application\nName=Viewer\nTryExec=zaf-viewer\nExec=sh -c zaf-viewer\n");
     }
 
     void writeEntry(const QString &base, const QString &relativePath, const QByteArray &contents)
@@ -69,42 +77,46 @@ TEST_F(DesktopEntryTest, AnEntryGivesAnApplicationBundle)
     EXPECT_EQ(bundle->localizedStringForKey(QStringLiteral("KEY"), QString(), QString()), QStringLiteral("KEY"));
 }
 
-// A file URL of an entry opens its bundle; another URL opens none.
-TEST_F(DesktopEntryTest, AnEntrysFileURLOpensItsBundle)
-{
-    const auto byUrl = Bundle::bundleWithURL(QUrl::fromLocalFile(m_home + QStringLiteral("/applications/org.example.Editor.desktop")));
-    EXPECT_EQ(byUrl ? byUrl->bundleIdentifier() : QString(), QStringLiteral("org.example.Editor"));
-    EXPECT_FALSE(Bundle::bundleWithURL(QUrl(QStringLiteral("https://example.org/org.example.Editor.desktop"))));
-}
+struct LookupCase {
+    const char *name;
+    enum { Identifier, FileURL, URL, Program } by;
+    const char *query;    // an identifier, a path or program below the scratch root, or a URL
+    const char *expected; // the display name of the bundle found; "" for none
+};
 
-// XDG_DATA_HOME wins over XDG_DATA_DIRS.
-TEST_F(DesktopEntryTest, TheHomeFolderWinsOverTheSystemFolders)
-{
-    writeEntry(m_home, QStringLiteral("org.example.Both.desktop"), appEntry("From home"));
-    writeEntry(m_system, QStringLiteral("org.example.Both.desktop"), appEntry("From system"));
-    EXPECT_EQ(infoString(Bundle::bundleWithIdentifier(QStringLiteral("org.example.Both")), kDisplayNameKey), QStringLiteral("From home"));
-}
+class BundleLookupTest : public DesktopEntryTest, public ::testing::WithParamInterface<LookupCase> {};
 
-// An entry in a sub-folder has the folder in its identifier.
-TEST_F(DesktopEntryTest, ASubFolderIsPartOfTheIdentifier)
+// An application's bundle is found by desktop-file ID (XDG_DATA_HOME before XDG_DATA_DIRS, a
+// sub-folder part of the ID), by its entry's file URL, or by the program it starts: its Exec
+// program, or a TryExec naming it through a link in PATH (/proc/PID/exe shows the resolved program).
+// A lookup that finds nothing logs nothing.
+TEST_P(BundleLookupTest, FindsTheApplicationsBundle)
 {
-    writeEntry(m_system, QStringLiteral("vendor/tool.desktop"), appEntry("Vendor tool"));
-    const auto tool = Bundle::bundleWithIdentifier(QStringLiteral("vendor-tool"));
-    ASSERT_TRUE(tool);
-    EXPECT_EQ(tool->bundleIdentifier(), QStringLiteral("vendor-tool"));
-    EXPECT_EQ(infoString(tool, kDisplayNameKey), QStringLiteral("Vendor tool"));
-    EXPECT_EQ(infoString(tool, kBundleNameKey), QStringLiteral("true"));
-}
-
-// Unknown identifiers, an empty one and one with a path give none, without a log.
-TEST_F(DesktopEntryTest, UnknownIdentifiersGiveNoneQuietly)
-{
+    const LookupCase &c = GetParam();
+    const QString query = QString::fromLatin1(c.query);
+    const QString path = query.isEmpty() ? QString() : m_root.filePath(query);
     zaf::test::LogCapture log;
-    EXPECT_FALSE(Bundle::bundleWithIdentifier(QStringLiteral("org.example.Unknown")));
-    EXPECT_FALSE(Bundle::bundleWithIdentifier(QString()));
-    EXPECT_FALSE(Bundle::bundleWithIdentifier(QStringLiteral("../applications/org.example.Editor")));
+    const auto bundle = c.by == LookupCase::Identifier ? Bundle::bundleWithIdentifier(query)
+                        : c.by == LookupCase::FileURL  ? Bundle::bundleWithURL(QUrl::fromLocalFile(path))
+                        : c.by == LookupCase::URL      ? Bundle::bundleWithURL(QUrl(query))
+                                                       : Bundle::bundleForExecutablePath(path);
+    EXPECT_EQ(bundle ? infoString(bundle, kDisplayNameKey) : QString(), QString::fromLatin1(c.expected));
     EXPECT_TRUE(log.messages(QStringLiteral("zaf.bundle")).isEmpty());
 }
+
+INSTANTIATE_TEST_SUITE_P(Lookups, BundleLookupTest, ::testing::Values(
+    LookupCase{"Identifier", LookupCase::Identifier, "org.example.Editor", "Editor"},
+    LookupCase{"HomeBeforeSystem", LookupCase::Identifier, "org.example.Both", "From home"},
+    LookupCase{"SubFolderInTheIdentifier", LookupCase::Identifier, "vendor-tool", "Vendor tool"},
+    LookupCase{"UnknownIdentifier", LookupCase::Identifier, "org.example.Unknown", ""},
+    LookupCase{"EmptyIdentifier", LookupCase::Identifier, "", ""},
+    LookupCase{"IdentifierWithAPath", LookupCase::Identifier, "../applications/org.example.Editor", ""},
+    LookupCase{"EntrysFileURL", LookupCase::FileURL, "home/applications/org.example.Editor.desktop", "Editor"},
+    LookupCase{"WebURL", LookupCase::URL, "https://example.org/org.example.Editor.desktop", ""},
+    LookupCase{"ExecProgram", LookupCase::Program, "bin/zaf-editor", "Editor"},
+    LookupCase{"TryExecThroughALink", LookupCase::Program, "opt/viewer/viewer-bin", "Viewer"},
+    LookupCase{"ProgramNoEntryStarts", LookupCase::Program, "opt/other", ""},
+    LookupCase{"EmptyProgram", LookupCase::Program, "", ""}), test::CaseName());
 
 struct InvalidEntry {
     const char *name; // also the entry's identifier: org.example.NAME
@@ -131,33 +143,6 @@ INSTANTIATE_TEST_SUITE_P(Entries, InvalidEntryTest, ::testing::Values(
     InvalidEntry{"NoGroup", "[Other]\nName=x\n"},
     InvalidEntry{"NoName", "[Desktop Entry]\nType=Application\nExec=/bin/true\n"},
     InvalidEntry{"BadExec", "[Desktop Entry]\nType=Application\nName=x\nExec=\"unclosed\n"}), test::CaseName());
-
-struct ProgramCase {
-    const char *name;
-    const char *program; // below the scratch root; "" for an empty path
-    const char *identifier; // "" when no bundle starts it
-};
-
-class BundleForProgramTest : public DesktopEntryTest, public ::testing::WithParamInterface<ProgramCase> {};
-
-// The bundle of a program is the entry that starts it: by its Exec program, or by a TryExec that
-// names it through a link in PATH (what /proc/PID/exe shows is the resolved program).
-TEST_P(BundleForProgramTest, IsTheEntryThatStartsIt)
-{
-    test::writeExecutable(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")));
-    QFile::link(m_root.filePath(QStringLiteral("opt/viewer/viewer-bin")), m_bin + QStringLiteral("/zaf-viewer"));
-    writeEntry(m_system, QStringLiteral("org.example.Viewer.desktop"),
-               "[Desktop Entry]\nType=Application\nName=Viewer\nTryExec=zaf-viewer\nExec=sh -c zaf-viewer\n");
-    const QString program = *GetParam().program ? m_root.filePath(QLatin1String(GetParam().program)) : QString();
-    const auto bundle = Bundle::bundleForExecutablePath(program);
-    EXPECT_EQ(bundle ? bundle->bundleIdentifier() : QString(), QLatin1String(GetParam().identifier));
-}
-
-INSTANTIATE_TEST_SUITE_P(Programs, BundleForProgramTest, ::testing::Values(
-    ProgramCase{"ExecProgram", "bin/zaf-editor", "org.example.Editor"},
-    ProgramCase{"TryExecThroughALink", "opt/viewer/viewer-bin", "org.example.Viewer"},
-    ProgramCase{"NoEntryStartsIt", "opt/other", ""},
-    ProgramCase{"EmptyPath", "", ""}), test::CaseName());
 
 struct LocalizedNameCase {
     const char *name;
