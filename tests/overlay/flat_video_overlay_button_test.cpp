@@ -35,7 +35,7 @@ TEST(FlatButtonSharedImages, RacingFirstCallsRenderEachImageOnceAndReturnTheSame
     EXPECT_EQ(Flat::sharedImageRenderCount(), 2);
 }
 
-TEST(FlatButtonSharedImages, EveryButtonShowsTheVerySameImagesSizedLikeTheBackgroundMask)
+TEST(FlatButtonSharedImages, EveryButtonShowsTheVerySameImages)
 {
     const QImage &normal = Flat::_normalButtonImage();
     const QImage &highlighted = Flat::_highlightedButtonImage();
@@ -47,13 +47,16 @@ TEST(FlatButtonSharedImages, EveryButtonShowsTheVerySameImagesSizedLikeTheBackgr
         EXPECT_EQ(button->normalImage().constBits(), normal.constBits());
         EXPECT_EQ(button->highlightedImage().constBits(), highlighted.constBits());
     }
-    EXPECT_EQ(Flat::sharedImageRenderCount(), 2);   // however many buttons exist
+    EXPECT_EQ(Flat::sharedImageRenderCount(), 2); // however many buttons exist
+}
 
-    // The background mask's size in points, at the screen's scale.
+// The background mask's size in points, at the screen's scale.
+TEST(FlatButtonSharedImages, ImagesAreSizedLikeTheBackgroundMask)
+{
     const double scale = ui::Screen::mainScreenScale();
     const QSizeF points = overlay::sizeInPoints(backgroundMask());
     ASSERT_FALSE(points.isEmpty());
-    for (const QImage *image : {&normal, &highlighted}) {
+    for (const QImage *image : {&Flat::_normalButtonImage(), &Flat::_highlightedButtonImage()}) {
         EXPECT_EQ(image->devicePixelRatio(), scale);
         EXPECT_EQ(image->size(), QSize(std::ceil(points.width() * scale), std::ceil(points.height() * scale)));
         EXPECT_TRUE(image->hasAlphaChannel());
@@ -63,60 +66,61 @@ TEST(FlatButtonSharedImages, EveryButtonShowsTheVerySameImagesSizedLikeTheBackgr
 // The compositing rules, checked on every pixel against the two masks at the same pixel: outside
 // both masks the gray fill, inside the background mask a hole, inside the glyph the white glyph at
 // its alpha. Where a mask is partly transparent (anti-aliased edges) no rule is checked.
-TEST(FlatButtonSharedImages, PixelsFollowTheFillCutOutAndGlyphRules)
+struct Composite {
+    const char *name;
+    double white, backgroundAlpha, glyphAlpha;
+    const QImage &(*shared)(); // the shared image for these values, or null to render a new one
+};
+void PrintTo(const Composite &c, std::ostream *os) { *os << c.name; }
+
+class FlatButtonComposite : public ::testing::TestWithParam<Composite> {};
+
+TEST_P(FlatButtonComposite, PixelsFollowTheFillCutOutAndGlyphRules)
 {
-    const struct {
-        const char *name;
-        double white, backgroundAlpha, glyphAlpha;
-        const QImage *shared;   // the shared image for these values, or null to render a new one
-    } cases[] = {
-        {"normal", ZafVideoOverlayFlatBackgroundWhite, ZafVideoOverlayFlatBackgroundAlpha,
-         ZafVideoOverlayDefaultGlyphAlpha, &Flat::_normalButtonImage()},
-        {"highlighted", ZafVideoOverlayFlatBackgroundWhite, ZafVideoOverlayFlatBackgroundAlpha,
-         ZafVideoOverlayHighlightedGlyphAlpha, &Flat::_highlightedButtonImage()},
-        {"opaque black fill, opaque glyph", 0.0, 1.0, 1.0, nullptr},
-        {"half white fill, invisible glyph", 1.0, 0.5, 0.0, nullptr},
-        {"no fill", 0.5, 0.0, 0.5, nullptr},
-    };
+    const Composite &c = GetParam();
     const QImage background = backgroundMask();
     const QImage glyph = glyphMask();
     ASSERT_EQ(glyph.size(), background.size());
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.name);
-        const QImage rendered =
-            c.shared ? *c.shared
-                     : Flat::_createOverlayImageWithBackgroundWhiteBackgroundAlphaGlyphAlpha(c.white, c.backgroundAlpha,
-                                                                                            c.glyphAlpha);
-        ASSERT_EQ(rendered.size(), background.size());
-        const int fillAlpha = qRound(c.backgroundAlpha * 255);
-        const int fillGray = qRound(c.white * 255);
-        const int glyphAlpha = qRound(c.glyphAlpha * 255);
-        int filled = 0, cutOut = 0, glyphPixels = 0, wrong = 0;
-        for (int y = 0; y < rendered.height(); ++y) {
-            for (int x = 0; x < rendered.width(); ++x) {
-                const int b = qAlpha(background.pixel(x, y));
-                const int g = qAlpha(glyph.pixel(x, y));
-                const QColor p = rendered.pixelColor(x, y);
-                if (b == 0 && g == 0) {   // the gray fill
-                    ++filled;
-                    wrong += std::abs(p.alpha() - fillAlpha) > 2
-                        || (fillAlpha > 0 && (std::abs(p.red() - fillGray) > 2 || p.red() != p.green() || p.red() != p.blue()));
-                } else if (b == 255 && g == 0) {   // the hole
-                    ++cutOut;
-                    wrong += p.alpha() != 0;
-                } else if (g == 255) {   // the white glyph
-                    ++glyphPixels;
-                    wrong += std::abs(p.alpha() - glyphAlpha) > 2 || (glyphAlpha > 20 && p.red() < 250);
-                }
+    const QImage rendered = c.shared ? c.shared() : Flat::_createOverlayImageWithBackgroundWhiteBackgroundAlphaGlyphAlpha(c.white, c.backgroundAlpha, c.glyphAlpha);
+    ASSERT_EQ(rendered.size(), background.size());
+    const int fillAlpha = qRound(c.backgroundAlpha * 255);
+    const int fillGray = qRound(c.white * 255);
+    const int glyphAlpha = qRound(c.glyphAlpha * 255);
+    int filled = 0, cutOut = 0, glyphPixels = 0, wrong = 0;
+    for (int y = 0; y < rendered.height(); ++y) {
+        for (int x = 0; x < rendered.width(); ++x) {
+            const int b = qAlpha(background.pixel(x, y));
+            const int g = qAlpha(glyph.pixel(x, y));
+            const QColor p = rendered.pixelColor(x, y);
+            if (b == 0 && g == 0) { // the gray fill
+                ++filled;
+                wrong += std::abs(p.alpha() - fillAlpha) > 2
+                    || (fillAlpha > 0 && (std::abs(p.red() - fillGray) > 2 || p.red() != p.green() || p.red() != p.blue()));
+            } else if (b == 255 && g == 0) { // the hole
+                ++cutOut;
+                wrong += p.alpha() != 0;
+            } else if (g == 255) { // the white glyph
+                ++glyphPixels;
+                wrong += std::abs(p.alpha() - glyphAlpha) > 2 || (glyphAlpha > 20 && p.red() < 250);
             }
         }
-        EXPECT_EQ(wrong, 0);
-        // Each rule was checked on a real area.
-        EXPECT_GT(filled, 100);
-        EXPECT_GT(cutOut, 100);
-        EXPECT_GT(glyphPixels, 100);
     }
+    EXPECT_EQ(wrong, 0);
+    // Each rule was checked on a real area.
+    EXPECT_GT(filled, 100);
+    EXPECT_GT(cutOut, 100);
+    EXPECT_GT(glyphPixels, 100);
 }
+
+INSTANTIATE_TEST_SUITE_P(
+    Images, FlatButtonComposite,
+    ::testing::Values(Composite{"Normal", ZafVideoOverlayFlatBackgroundWhite, ZafVideoOverlayFlatBackgroundAlpha, ZafVideoOverlayDefaultGlyphAlpha,
+                                &Flat::_normalButtonImage},
+                      Composite{"Highlighted", ZafVideoOverlayFlatBackgroundWhite, ZafVideoOverlayFlatBackgroundAlpha,
+                                ZafVideoOverlayHighlightedGlyphAlpha, &Flat::_highlightedButtonImage},
+                      Composite{"OpaqueBlackFillOpaqueGlyph", 0.0, 1.0, 1.0, nullptr},
+                      Composite{"HalfWhiteFillInvisibleGlyph", 1.0, 0.5, 0.0, nullptr}, Composite{"NoFill", 0.5, 0.0, 0.5, nullptr}),
+    [](const auto &info) { return std::string(info.param.name); });
 
 } // namespace
 } // namespace zaf::test

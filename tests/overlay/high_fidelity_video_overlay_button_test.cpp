@@ -16,38 +16,46 @@ namespace {
 using ui::BackdropView;
 using HighFidelityButtonTest = ButtonOnSurface<ZafHighFidelityVideoOverlayButton>;
 
-TEST(HighFidelityButtonConstruction, FitsToTheGlyphAndStacksBackdropButtonAndInvisibleMaskOnlyForStyleZero)
+class HighFidelityButtonConstruction : public ::testing::TestWithParam<std::int64_t> {};
+
+TEST_P(HighFidelityButtonConstruction, FitsToTheGlyph)
 {
     const QSize glyphPoints = overlay::sizeInPoints(glyphMask()).toSize();
     ASSERT_FALSE(glyphPoints.isEmpty());
-    for (const std::int64_t style : std::initializer_list<std::int64_t>{0, 1, 2, 3, 7, -1, INT64_MIN, INT64_MAX}) {
-        SCOPED_TRACE(style);
-        ZafHighFidelityVideoOverlayButton button(style);
-        EXPECT_EQ(button.style(), style);
-        EXPECT_EQ(button.geometry(), QRect(QPoint(0, 0), glyphPoints));
-        EXPECT_EQ(button._button->geometry(), QRect(QPoint(0, 0), glyphPoints));
-        EXPECT_EQ(button.minimumSize(), glyphPoints);   // the owner moves it; the size stays
-        EXPECT_EQ(button.maximumSize(), glyphPoints);
-        EXPECT_EQ(button.glyphAlpha(), ZafVideoOverlayDefaultGlyphAlpha);
-        const QList<QWidget *> backToFront = button.findChildren<QWidget *>(Qt::FindDirectChildrenOnly);
-        if (style != 0) {
-            EXPECT_EQ(button._backdropView, nullptr);
-            EXPECT_EQ(button.maskImageView(), nullptr);
-            EXPECT_EQ(backToFront, QList<QWidget *>{button._button});
-            continue;
-        }
-        ASSERT_NE(button._backdropView, nullptr);
-        ASSERT_NE(button.maskImageView(), nullptr);
-        EXPECT_EQ(backToFront, (QList<QWidget *>{button._backdropView, button._button, button.maskImageView()}));
-        EXPECT_EQ(button._backdropView->geometry(), button.rect());
-        // The mask view shapes the background and the tint, the glyph button cuts the tint only.
-        EXPECT_EQ(button._backdropView->maskViews(), (QList<QWidget *>{button.maskImageView(), button._button}));
-        EXPECT_EQ(BackdropView::backdropMaskFlags(button.maskImageView()), 7);
-        EXPECT_EQ(BackdropView::backdropMaskFlags(button._button), 3);
-        EXPECT_EQ(button.maskImageView()->geometry(), QRect(QPoint(0, 0), overlay::sizeInPoints(backgroundMask()).toSize()));
-        EXPECT_TRUE(button.maskImageView()->testAttribute(Qt::WA_TransparentForMouseEvents));
-    }
+    ZafHighFidelityVideoOverlayButton button(GetParam());
+    EXPECT_EQ(button.style(), GetParam());
+    EXPECT_EQ(button.geometry(), QRect(QPoint(0, 0), glyphPoints));
+    EXPECT_EQ(button._button->geometry(), QRect(QPoint(0, 0), glyphPoints));
+    EXPECT_EQ(button.minimumSize(), glyphPoints); // the owner moves it; the size stays
+    EXPECT_EQ(button.maximumSize(), glyphPoints);
+    EXPECT_EQ(button.glyphAlpha(), ZafVideoOverlayDefaultGlyphAlpha);
 }
+
+// Style 0 stacks a backdrop, the glyph button and an invisible mask; other styles the button alone.
+TEST_P(HighFidelityButtonConstruction, StacksABackdropAndAMaskOnlyForStyleZero)
+{
+    ZafHighFidelityVideoOverlayButton button(GetParam());
+    const QList<QWidget *> backToFront = button.findChildren<QWidget *>(Qt::FindDirectChildrenOnly);
+    if (GetParam() != 0) {
+        EXPECT_EQ(button._backdropView, nullptr);
+        EXPECT_EQ(button.maskImageView(), nullptr);
+        EXPECT_EQ(backToFront, QList<QWidget *>{button._button});
+        return;
+    }
+    ASSERT_NE(button._backdropView, nullptr);
+    ASSERT_NE(button.maskImageView(), nullptr);
+    EXPECT_EQ(backToFront, (QList<QWidget *>{button._backdropView, button._button, button.maskImageView()}));
+    EXPECT_EQ(button._backdropView->geometry(), button.rect());
+    // The mask view shapes the background and the tint, the glyph button cuts the tint only.
+    EXPECT_EQ(button._backdropView->maskViews(), (QList<QWidget *>{button.maskImageView(), button._button}));
+    EXPECT_EQ(BackdropView::backdropMaskFlags(button.maskImageView()), 7);
+    EXPECT_EQ(BackdropView::backdropMaskFlags(button._button), 3);
+    EXPECT_EQ(button.maskImageView()->geometry(), QRect(QPoint(0, 0), overlay::sizeInPoints(backgroundMask()).toSize()));
+    EXPECT_TRUE(button.maskImageView()->testAttribute(Qt::WA_TransparentForMouseEvents));
+}
+
+INSTANTIATE_TEST_SUITE_P(Styles, HighFidelityButtonConstruction, ::testing::Values<std::int64_t>(0, 1, 2, 3, 7, -1, INT64_MIN, INT64_MAX),
+                         [](const auto &info) { return styleName(info.param); });
 
 TEST_F(HighFidelityButtonTest, PressTakenAwayByHidingLeavesThePressedLookAndNoTap)
 {

@@ -18,7 +18,9 @@
 #include <QWindow>
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <optional>
+#include <string>
 
 namespace zaf::test {
 
@@ -102,6 +104,13 @@ public:
 private:
     ScratchDir m_scratch;
 };
+
+// A style as a test case's name: "Style0", "StyleMinus1", "StyleMax".
+inline std::string styleName(std::int64_t style)
+{
+    return "Style" + (style == INT64_MAX ? std::string("Max") : style == INT64_MIN ? std::string("Min")
+                      : style < 0 ? "Minus" + std::to_string(-style) : std::to_string(style));
+}
 
 // The mask images as the buttons load them.
 inline QImage backgroundMask()

@@ -12,37 +12,46 @@
 namespace zaf::test {
 namespace {
 
-TEST(OverlayButtonFactory, StyleAndGraphicsQualityLevelPickTheVariant)
+enum Variant { Flat, WithBackdrop, WithoutBackdrop };
+
+struct FactoryCase {
+    std::int64_t style;
+    std::optional<int> level; // none: the offscreen desktop's own answer (10)
+    Variant expected;
+};
+
+class OverlayButtonFactory : public ::testing::TestWithParam<FactoryCase> {};
+
+TEST_P(OverlayButtonFactory, StyleAndGraphicsQualityLevelPickTheVariant)
 {
-    enum Variant { Flat, WithBackdrop, WithoutBackdrop };
-    const struct {
-        std::int64_t style;
-        std::optional<int> level;   // none: the offscreen desktop's own answer (10)
-        Variant expected;
-    } cases[] = {
-        {0, 10, Flat},           {0, std::nullopt, Flat},    {2, 10, Flat},           {2, 100, Flat},
-        {0, 100, WithBackdrop},  {0, 11, WithBackdrop},      {0, 9, WithBackdrop},    {0, 0, WithBackdrop},
-        {1, 10, WithoutBackdrop}, {1, 100, WithoutBackdrop}, {7, 10, WithoutBackdrop}, {3, 100, WithoutBackdrop},
-        {-1, 10, WithoutBackdrop}, {INT64_MAX, 10, WithoutBackdrop}, {INT64_MIN, 100, WithoutBackdrop},
-    };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(testing::Message() << "style " << c.style << " level " << c.level.value_or(-1));
-        GraphicsQualityLevel device(c.level);
-        std::unique_ptr<ZafVideoOverlayButton> button(ZafVideoOverlayButtonFactory::_srVideoOverlayButtonWithStyle(c.style));
-        ASSERT_NE(button, nullptr);
-        EXPECT_EQ(button->style(), c.style);
-        QWidget *widget = button->widget();
-        EXPECT_EQ(widget->parentWidget(), nullptr);
-        EXPECT_EQ(widget->geometry(), QRect(QPoint(0, 0), overlay::sizeInPoints(glyphMask()).toSize()));
-        auto *highFidelity = dynamic_cast<ZafHighFidelityVideoOverlayButton *>(button.get());
-        if (c.expected == Flat) {
-            EXPECT_EQ(dynamic_cast<ZafFlatVideoOverlayButton *>(button.get()), widget);
-        } else {
-            ASSERT_EQ(highFidelity, widget);
-            EXPECT_EQ(highFidelity->_backdropView != nullptr, c.expected == WithBackdrop);
-        }
+    const FactoryCase &c = GetParam();
+    GraphicsQualityLevel device(c.level);
+    std::unique_ptr<ZafVideoOverlayButton> button(ZafVideoOverlayButtonFactory::_srVideoOverlayButtonWithStyle(c.style));
+    ASSERT_NE(button, nullptr);
+    EXPECT_EQ(button->style(), c.style);
+    QWidget *widget = button->widget();
+    EXPECT_EQ(widget->parentWidget(), nullptr);
+    EXPECT_EQ(widget->geometry(), QRect(QPoint(0, 0), overlay::sizeInPoints(glyphMask()).toSize()));
+    auto *highFidelity = dynamic_cast<ZafHighFidelityVideoOverlayButton *>(button.get());
+    if (c.expected == Flat) {
+        EXPECT_EQ(dynamic_cast<ZafFlatVideoOverlayButton *>(button.get()), widget);
+    } else {
+        ASSERT_EQ(highFidelity, widget);
+        EXPECT_EQ(highFidelity->_backdropView != nullptr, c.expected == WithBackdrop);
     }
 }
+
+INSTANTIATE_TEST_SUITE_P(
+    Cases, OverlayButtonFactory,
+    ::testing::Values(FactoryCase{0, 10, Flat}, FactoryCase{0, std::nullopt, Flat}, FactoryCase{2, 10, Flat}, FactoryCase{2, 100, Flat},
+                      FactoryCase{0, 100, WithBackdrop}, FactoryCase{0, 11, WithBackdrop}, FactoryCase{0, 9, WithBackdrop},
+                      FactoryCase{0, 0, WithBackdrop}, FactoryCase{1, 10, WithoutBackdrop}, FactoryCase{1, 100, WithoutBackdrop},
+                      FactoryCase{7, 10, WithoutBackdrop}, FactoryCase{3, 100, WithoutBackdrop}, FactoryCase{-1, 10, WithoutBackdrop},
+                      FactoryCase{INT64_MAX, 10, WithoutBackdrop}, FactoryCase{INT64_MIN, 100, WithoutBackdrop}),
+    [](const auto &info) {
+        const FactoryCase &c = info.param;
+        return styleName(c.style) + "Level" + (c.level ? std::to_string(*c.level) : "Default");
+    });
 
 using Variants = ::testing::Types<ZafFlatVideoOverlayButton, ZafHighFidelityVideoOverlayButton>;
 TYPED_TEST_SUITE(ButtonOnSurface, Variants);
@@ -91,7 +100,8 @@ TYPED_TEST(ButtonOnSurface, PointerEventsOnTheButtonNeverReachTheSurfaceBehind)
     EXPECT_EQ(this->target.calls, 2);
 }
 
-TYPED_TEST(ButtonOnSurface, TapGoesToTheLastTargetAndActionSetAndNowhereWhenEitherIsMissing)
+// The separate accessors replace one half each of the last target and action set.
+TYPED_TEST(ButtonOnSurface, TapGoesToTheLastTargetActionPairSet)
 {
     ZafVideoOverlayButton *button = this->button;
     ActionTarget second;
@@ -99,21 +109,26 @@ TYPED_TEST(ButtonOnSurface, TapGoesToTheLastTargetAndActionSetAndNowhereWhenEith
     this->pointer.tap(this->centre());
     EXPECT_EQ(this->target.calls, 0);
     EXPECT_EQ(second.calls, 1);
-
-    // The separate accessors replace one half each.
     button->setTarget(&this->target);
     this->pointer.tap(this->centre());
     EXPECT_EQ(this->target.calls, 1);
-    button->setAction("pauseAction");   // the target lacks it
-    this->pointer.tap(this->centre());
-    EXPECT_EQ(this->target.calls, 1);
     EXPECT_EQ(second.calls, 1);
+}
 
-    // A target that went away is forgotten; a tap then only ends the pressed look.
+TYPED_TEST(ButtonOnSurface, TapWithAnActionTheTargetLacksGoesNowhere)
+{
+    this->button->setAction("pauseAction");
+    this->pointer.tap(this->centre());
+    EXPECT_EQ(this->target.calls, 0);
+}
+
+// A target that went away is forgotten; a tap then only ends the pressed look.
+TYPED_TEST(ButtonOnSurface, TargetThatWentAwayIsForgotten)
+{
     auto transient = std::make_unique<ActionTarget>();
-    button->setTargetAction(transient.get(), "playAction");
+    this->button->setTargetAction(transient.get(), "playAction");
     transient.reset();
-    EXPECT_EQ(button->target(), nullptr);
+    EXPECT_EQ(this->button->target(), nullptr);
     this->pointer.tap(this->centre());
     EXPECT_FALSE(looksPressed(this->button));
 }
