@@ -262,7 +262,7 @@ INSTANTIATE_TEST_SUITE_P(Headers, UploadAnswerTest, ::testing::Values(
     zaf::test::kCaseName);
 
 // The chunk device reads its slice of the file and rewinds, so the network stack can resend it.
-TEST(UploadChunkDevice, readsItsSliceAndRewinds)
+TEST(UploadChunkDevice, readsItsSliceRepeatably)
 {
     zaf::test::ScratchDir scratch;
     const QByteArray bytes = zaf::test::variedBytes(1000);

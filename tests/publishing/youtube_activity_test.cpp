@@ -241,7 +241,7 @@ TEST(YouTubeActivity, CancelDuringTheCopysExportLeavesNoCopy)
 }
 
 // The copy's name is the temporary directory, the stem and the whole seconds.
-TEST(YouTubeActivity, TempFileURLIsTheDirectoryStemAndWholeSeconds)
+TEST(YouTubeActivity, TempFileURLNamesTheWholeSecond)
 {
     EXPECT_EQ(ZafYouTubeActivity::tempFileURLForTime(1000000000.9).toLocalFile(),
               ZafTempStore::defaultStore()._srTempPath() + QStringLiteral("/ZafReplay_YouTube1000000000.mp4"));

@@ -51,7 +51,7 @@ protected:
 };
 
 // The bundle has its identifier, its information (localized too), its resources and localizations.
-TEST_F(DirectoryBundleTest, OpensWithItsInformationResourcesAndLocalizations)
+TEST_F(DirectoryBundleTest, OpensWithWhatItsDirectoryHolds)
 {
     EXPECT_EQ(m_bundle->bundlePath(), m_path);
     EXPECT_EQ(m_bundle->bundleIdentifier(), QStringLiteral("org.example.Zafrel"));
@@ -160,7 +160,7 @@ TEST(ExecutablePathOfProcessTest, ReadsTheRunningProgram)
 class UnreadableProcessTest : public ::testing::TestWithParam<pid_t> {};
 
 // Processes that cannot be read give 0 and an empty path.
-TEST_P(UnreadableProcessTest, GivesZeroAndNoPath)
+TEST_P(UnreadableProcessTest, ReadsNothing)
 {
     QString path = QStringLiteral("stale");
     EXPECT_EQ(executablePathOfProcess(GetParam(), &path), 0);

@@ -48,7 +48,7 @@ class MoByteOrderTest : public ::testing::TestWithParam<ByteOrder> {};
 
 // Contexts are keyed "context\x04id", plurals by their singular form, and the header and
 // untranslated entries are no messages.
-TEST_P(MoByteOrderTest, ParsesMsgfmtOutputWithContextPluralsAndHeader)
+TEST_P(MoByteOrderTest, ParsesMsgfmtOutput)
 {
     const MoCatalog catalog = parseMoCatalog(test::compilePo(kRichPo, GetParam()));
     ASSERT_TRUE(catalog.isValid()) << catalog.error.toStdString();
@@ -179,7 +179,7 @@ protected:
 };
 
 // Each corruption of the header, the tables or the strings gives an error saying what is wrong, and no strings.
-TEST_P(MoCatalogCorruptionTest, GivesAnErrorAndNoStrings)
+TEST_P(MoCatalogCorruptionTest, IsAnError)
 {
     QByteArray data = validLayout().data;
     GetParam().apply(data, validLayout());
