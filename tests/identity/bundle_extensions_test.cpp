@@ -64,20 +64,21 @@ TEST_F(FrameworkBundleTest, MissingFrameworkBundleAnswersNothing)
 }
 
 // The shipped share text takes the name and the author in every shipped language.
-TEST(ShippedFrameworkBundle, ShareTextTakesTheNameAndTheAuthorInEveryLanguage)
+class ShippedFrameworkBundle : public ::testing::TestWithParam<const char *> {};
+
+TEST_P(ShippedFrameworkBundle, ShareTextTakesTheNameAndTheAuthor)
 {
     qputenv("ZAF_FRAMEWORK_BUNDLE_PATH", ZAF_SHIPPED_FRAMEWORK_BUNDLE);
-    for (const char *language : {"en", "de", "fr", "es", "ja"}) {
-        bundle::setPreferredLanguagesForTesting({QString::fromLatin1(language)});
-        const QString format = frameworkText("SHARE_TEXT_FORMAT").value_or(QString());
-        EXPECT_TRUE(format.contains(QStringLiteral("%1$@")) && format.contains(QStringLiteral("%2$@")))
-            << language << ": " << format.toStdString();
-    }
+    bundle::setPreferredLanguagesForTesting({QString::fromLatin1(GetParam())});
+    const QString format = frameworkText("SHARE_TEXT_FORMAT").value_or(QString());
+    EXPECT_TRUE(format.contains(QStringLiteral("%1$@")) && format.contains(QStringLiteral("%2$@"))) << format.toStdString();
 }
 
+INSTANTIATE_TEST_SUITE_P(Languages, ShippedFrameworkBundle, kShippedLanguages, languageName);
+
 // Display names: the localized name first, then the plain one; an unknown identifier has none and a
-// bundle without any name gives "". The base identifier drops the last component.
-TEST(BundleNames, DisplayNamePrecedenceUnknownIdentifiersAndBaseIdentifier)
+// bundle without any name gives "".
+TEST(BundleNames, DisplayNameIsTheLocalizedOneThenThePlainOne)
 {
     ScratchDir scratch;
     const QString data = scratch.file(QStringLiteral("data"));
@@ -94,7 +95,11 @@ TEST(BundleNames, DisplayNamePrecedenceUnknownIdentifiersAndBaseIdentifier)
     const auto nameless = bundle::Bundle::bundleWithPath(scratch.file(QStringLiteral("Nameless")));
     ASSERT_TRUE(nameless);
     EXPECT_EQ(ZafBundleExtensions::_zafLocalizedAppName(*nameless), QStringLiteral(""));
+}
 
+// The base identifier drops the last component; no process has a bundle of pid -1.
+TEST(BundleNames, BaseIdentifierDropsTheLastComponent)
+{
     EXPECT_EQ(ZafBundleExtensions::baseIdentifier(QStringLiteral("com.example.app")), QStringLiteral("com.example"));
     EXPECT_EQ(ZafBundleExtensions::baseIdentifier(QStringLiteral("app")), QStringLiteral(""));
     EXPECT_EQ(ZafBundleExtensions::baseIdentifier(QStringLiteral("com.example.")), QStringLiteral("com.example"));

@@ -11,6 +11,13 @@
 
 namespace zaf::test {
 
+// The languages the shipped string tables are in.
+inline const auto kShippedLanguages = ::testing::Values("en", "de", "fr", "es", "ja");
+inline std::string languageName(const ::testing::TestParamInfo<const char *> &info)
+{
+    return info.param;
+}
+
 // Writes DIR/LANG.lproj/TABLE.mo holding the pairs.
 inline void writeTable(const QString &bundleDir, const QString &localization, const QString &table,
                        const QList<std::pair<QString, QString>> &pairs)
