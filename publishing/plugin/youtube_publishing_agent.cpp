@@ -81,10 +81,10 @@ ZafYouTubePublishingAgent::ZafYouTubePublishingAgent(QObject *parent)
     connect(publishButton, &QPushButton::clicked, this, &ZafYouTubePublishingAgent::publishAction);
     m_publishItem = new zaf::ui::BarButtonItem(publishButton, m_navigation);
     m_navigation->setToolbarItems({
-        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::Cancel, this, kZafAgentCancelMethod, m_navigation),
-        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::FlexibleSpace, nullptr, {}, m_navigation),
+        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::Cancel, this, &ZafYouTubePublishingAgent::cancelAction, m_navigation),
+        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::FlexibleSpace, m_navigation),
         m_publishItem,
-        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::Done, this, "doneAction", m_navigation),
+        new zaf::ui::BarButtonItem(zaf::ui::SystemItem::Done, this, &ZafYouTubePublishingAgent::doneAction, m_navigation),
     });
     m_navigation->setWillAppearHandler([this] {
         if (m_delegate)
