@@ -94,34 +94,43 @@ TEST_F(TempStoreTest, SetupCreatesThePrivateDirectoryOnce)
     EXPECT_EQ(logs.messages("zaf.tempstore"), QStringList{"_srSetupTempDirectory"});
 }
 
-TEST_F(TempStoreTest, SetupLeavesAFileInTheWayAloneAndReportsAMissingParentWithoutCreatingIt)
+TEST_F(TempStoreTest, SetupLeavesAFileInTheWayAlone)
 {
     const QString file = scratch.write("file", 3);
     ZafTempStore(fileManager, file + "/")._srSetupTempDirectory();
     EXPECT_EQ(QFileInfo(file).size(), 3);
     EXPECT_EQ(logs.entries().size(), 1) << "only the informational entry";
+}
 
-    logs.clear();
+TEST_F(TempStoreTest, SetupReportsAMissingParentWithoutCreatingIt)
+{
     ZafTempStore(fileManager, scratch.path() + "/no/parent/Zafrel/")._srSetupTempDirectory();
     EXPECT_FALSE(QFile::exists(scratch.file("no")));
     EXPECT_EQ(logs.messages("zaf.tempstore"), QStringList({"_srSetupTempDirectory", "error creating temp directory"}));
     const QStringList console = logs.messages("default");
     ASSERT_EQ(console.size(), 1);
     EXPECT_TRUE(console[0].startsWith(QString("error: Error Domain=posix Code=%1").arg(ENOENT)));
+}
 
-    // What a process does at start creates the missing parents too, private to the user.
+// What a process does at start creates the missing parents too, private to the user.
+TEST_F(TempStoreTest, PrepareAtProcessStartCreatesTheMissingParents)
+{
     ZafTempStore(fileManager, scratch.path() + "/cache/deep/Zafrel/").prepareAtProcessStart();
     EXPECT_TRUE(QFileInfo(scratch.file("cache/deep/Zafrel")).isDir());
     EXPECT_EQ(QFileInfo(scratch.file("cache")).permissions() & QFileDevice::ReadOther, 0);
 }
 
-TEST(TempStoreNames, DirectoryIsTheProcessesOwnUnderTheRootResolvedOnceAndMovieNamesAreStemSecondsAndExtension)
+TEST(TempStoreNames, RootIsThePerUserZafrelDirectory)
 {
     const QByteArray overridden = qgetenv("ZAF_TEMP_DIRECTORY");
     qunsetenv("ZAF_TEMP_DIRECTORY");
     EXPECT_TRUE(tempstore::perUserTempRoot().endsWith("/Zafrel/")) << tempstore::perUserTempRoot().toStdString();
     qputenv("ZAF_TEMP_DIRECTORY", overridden);
+}
 
+// The directory is the process's own under the root, resolved once.
+TEST(TempStoreNames, DirectoryIsTheProcessesOwnUnderTheRoot)
+{
     usePrivateTempDirectoryForProcess();
     const QString &dir = ZafScreenRecorderTempDirectory();
     EXPECT_EQ(&dir, &ZafScreenRecorderTempDirectory());
@@ -129,7 +138,10 @@ TEST(TempStoreNames, DirectoryIsTheProcessesOwnUnderTheRootResolvedOnceAndMovieN
     EXPECT_TRUE(QFileInfo(dir).isDir());
     EXPECT_TRUE(tempstore::ProcessDirectory::isHeldByLivingProcess(dir));
     EXPECT_EQ(ZafTempStore::defaultStore()._srTempPath(), dir);
+}
 
+TEST(TempStoreNames, MovieNameIsStemSecondsAndExtension)
+{
     const qint64 before = std::time(nullptr);
     const QString name = ZafTempMovieFileName("/tmp/Zafrel//ZafReplay_Final");
     const qint64 after = std::time(nullptr);
@@ -156,7 +168,7 @@ TEST_F(TempStoreTest, AgeCleanupRemovesOnlyEntriesStrictlyOlderThanTheTimeToLive
     EXPECT_EQ(logs.messages("zaf.tempstore"), QStringList({kAgeHeader.arg(100), "deleting old file"}));
 }
 
-TEST_F(TempStoreTest, DeleteAllRemovesEverythingIncludingFutureEntriesAndDirectoriesButKeepsTheDirectory)
+TEST_F(TempStoreTest, DeleteAllEmptiesTheDirectoryFutureEntriesAndDirectoriesIncluded)
 {
     entry("a.mp4", 300, 5);
     entry("future.mp4", 700, -3600);
@@ -165,11 +177,11 @@ TEST_F(TempStoreTest, DeleteAllRemovesEverythingIncludingFutureEntriesAndDirecto
     entry("sub/inner.mp4", 5000, 1000);
     const qint64 subSize = QFileInfo(dir + "sub").size();
     EXPECT_EQ(store._srDeleteAllTempFiles(), 300 + 700 + 11 + subSize);
-    EXPECT_TRUE(QDir(dir).isEmpty(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot));
+    EXPECT_EQ(entryNames(dir), QStringList());
     EXPECT_TRUE(QDir(dir).exists());
 }
 
-TEST_F(TempStoreTest, AgeCleanupTotalCountsOnlySuccessfulRemovalsAndGoesOn)
+TEST_F(TempStoreTest, AgeCleanupGoesOnPastAFailedRemovalCountingOnlyTheRemoved)
 {
     entry("a.mp4", 100, 50);
     entry("stuck.mp4", 200, 50);
@@ -184,7 +196,8 @@ TEST_F(TempStoreTest, AgeCleanupTotalCountsOnlySuccessfulRemovalsAndGoesOn)
     EXPECT_TRUE(console[0].startsWith("error = Error Domain=posix Code=16")) << console[0].toStdString();
 }
 
-TEST_F(TempStoreTest, AgeCleanupOfAMissingDirectoryReportsOnceAndLogsTheTimeToLiveTruncatedTowardZero)
+// Each run reports the missing directory once and logs its time to live truncated toward zero.
+TEST_F(TempStoreTest, AgeCleanupOfAMissingDirectoryReportsEachRun)
 {
     ZafTempStore missing(fileManager, scratch.path() + "/absent/");
     EXPECT_EQ(missing._srDeleteFilesOlderThanTimeToLiveInSeconds(-7.9), 0);
@@ -202,19 +215,28 @@ TEST_F(TempStoreTest, SizeOfTempDirIsTheDirectoryEntrysOwnSize)
     EXPECT_FALSE(error.has_value());
     EXPECT_EQ(size, QFileInfo(dir).size());
     EXPECT_LT(size, 3 << 20);
+}
 
+TEST_F(TempStoreTest, SizeOfAMissingTempDirIsZeroWithTheError)
+{
+    OptionalError error;
     EXPECT_EQ(ZafTempStore(fileManager, scratch.path() + "/absent/")._srSizeOfTempDir(&error), 0);
     ASSERT_TRUE(error.has_value());
     EXPECT_EQ(error->code, ENOENT);
 }
 
-TEST_F(TempStoreTest, FreeSpaceMustExceedTheRequiredSpaceStrictlyAndReadsZeroWhenUnknown)
+TEST_F(TempStoreTest, FreeSpaceMustExceedTheRequiredSpaceStrictly)
 {
     fileManager.freeSize = 100000000;
     EXPECT_EQ(store._srDeviceFreeDiskSpace(), 100000000u);
     EXPECT_FALSE(store._srDeviceHasSufficientFreeSpaceForRecording());
     fileManager.freeSize = 100000001;
     EXPECT_TRUE(store._srDeviceHasSufficientFreeSpaceForRecording());
+    EXPECT_GT(ZafTempStore(FileManager::defaultManager(), dir)._srDeviceFreeDiskSpace(), 0u) << "a real volume reports its free space";
+}
+
+TEST_F(TempStoreTest, UnknownFreeSpaceReadsZero)
+{
     fileManager.fileSystemUnreadable = true;
     EXPECT_EQ(store._srDeviceFreeDiskSpace(), 0u);
     EXPECT_FALSE(store._srDeviceHasSufficientFreeSpaceForRecording());
@@ -222,7 +244,6 @@ TEST_F(TempStoreTest, FreeSpaceMustExceedTheRequiredSpaceStrictlyAndReadsZeroWhe
     ZafTempStore missing(FileManager::defaultManager(), scratch.path() + "/absent/");
     EXPECT_EQ(missing._srDeviceFreeDiskSpace(), 0u);
     EXPECT_FALSE(missing._srDeviceHasSufficientFreeSpaceForRecording());
-    EXPECT_GT(ZafTempStore(FileManager::defaultManager(), dir)._srDeviceFreeDiskSpace(), 0u) << "a real volume reports its free space";
 }
 
 struct CompletionResult {
@@ -248,52 +269,66 @@ QUrl url(const QString &path)
     return QUrl::fromLocalFile(path);
 }
 
-TEST_F(TempStoreTest, RemoveFileRemovesOffTheMainThreadTreatsNothingThereAsSuccessAndReportsFailures)
+TEST_F(TempStoreTest, RemoveFileRemovesOffTheMainThread)
 {
     const QString path = entry("gone.mp4", 10, 0);
-    CompletionResult r = await([&](auto done) { store._srRemoveFile(url(path), done); });
+    const CompletionResult r = await([&](auto done) { store._srRemoveFile(url(path), done); });
     EXPECT_FALSE(r.error.has_value());
     EXPECT_FALSE(r.onMainThread);
     EXPECT_FALSE(QFile::exists(path));
+}
 
-    r = await([&](auto done) { store._srRemoveFile(url(path), done); });
+TEST_F(TempStoreTest, RemoveFileOfNothingThereSucceedsQuietly)
+{
+    const CompletionResult r = await([&](auto done) { store._srRemoveFile(url(dir + "gone.mp4"), done); });
     EXPECT_FALSE(r.error.has_value());
     EXPECT_TRUE(logs.entries().isEmpty());
+}
 
+TEST_F(TempStoreTest, RemoveFileReportsAndLogsAFailure)
+{
     const QString stuck = entry("stuck.mp4", 10, 0);
     fileManager.failingRemovals = {"stuck.mp4"};
-    r = await([&](auto done) { store._srRemoveFile(url(stuck), done); });
+    const CompletionResult r = await([&](auto done) { store._srRemoveFile(url(stuck), done); });
     ASSERT_TRUE(r.error.has_value());
     EXPECT_EQ(r.error->code, EBUSY);
     EXPECT_EQ(logs.count(QString("_zavRemoveFile error: %1").arg(EBUSY)), 1);
     EXPECT_TRUE(QFile::exists(stuck));
+}
 
-    // Without a completion the removal still happens.
+TEST_F(TempStoreTest, RemoveFileWithoutACompletionStillRemoves)
+{
     const QString quiet = entry("quiet.mp4", 10, 0);
     store._srRemoveFile(url(quiet));
     dispatch::waitForGlobalQueue(dispatch::Priority::Background);
     EXPECT_FALSE(QFile::exists(quiet));
 }
 
-TEST_F(TempStoreTest, MoveReplacesAnExistingDestinationButAMissingSourceLeavesItAlone)
+TEST_F(TempStoreTest, MoveReplacesAnExistingDestination)
 {
     const QString from = entry("from.mp4", 123, 0);
     const QString to = entry("to.mp4", 9, 0);
-    CompletionResult r = await([&](auto done) { store._srMoveFileFromURL(url(from), url(to), done); });
+    const CompletionResult r = await([&](auto done) { store._srMoveFileFromURL(url(from), url(to), done); });
     EXPECT_FALSE(r.error.has_value());
     EXPECT_FALSE(r.onMainThread);
     EXPECT_FALSE(QFile::exists(from));
     EXPECT_EQ(QFileInfo(to).size(), 123);
+}
 
-    // The source is gone now: the move fails and the destination stays as it was.
-    r = await([&](auto done) { store._srMoveFileFromURL(url(from), url(to), done); });
+// Without a source the move fails and the destination stays as it was.
+TEST_F(TempStoreTest, MoveOfAMissingSourceLeavesTheDestinationAlone)
+{
+    const QString from = dir + "from.mp4";
+    const QString to = entry("to.mp4", 123, 0);
+    const CompletionResult r = await([&](auto done) { store._srMoveFileFromURL(url(from), url(to), done); });
     ASSERT_TRUE(r.error.has_value());
     EXPECT_EQ(r.error->code, ENOENT);
     EXPECT_EQ(QFileInfo(to).size(), 123);
     EXPECT_EQ(logs.count(QString("_zavMoveFileFromURL error: %1").arg(ENOENT)), 1);
 }
 
-TEST_F(TempStoreTest, PrefixCleanupIgnoresCaseAndDiacriticsAndRemovesMatchingDirectoriesWhole)
+// Names match ignoring case and diacritics; a matching directory goes whole.
+TEST_F(TempStoreTest, PrefixCleanupRemovesWhatMatches)
 {
     const QStringList matching = {"ZafReplay_Final1.mp4", "zafreplay_final2.mp4", "ZÀFRÉPLAY_FINAL3.mp4", "Zafreplay_Fiñal4.mp4"};
     for (const QString &name : matching)
@@ -314,17 +349,23 @@ TEST_F(TempStoreTest, PrefixCleanupIgnoresCaseAndDiacriticsAndRemovesMatchingDir
     EXPECT_TRUE(exists("keep/ZafReplay_Final9.mp4")) << "the clean-up never descends";
 }
 
-TEST_F(TempStoreTest, PrefixCleanupLogsEachFailedRemovalAndGoesOnAndIgnoresAMissingDirectory)
+TEST_F(TempStoreTest, PrefixCleanupLogsEachFailedRemovalAndGoesOn)
 {
     for (const char *name : {"ZafReplay_YouTube1.mp4", "ZafReplay_YouTube2.mp4", "ZafReplay_YouTube3.mp4"})
         entry(name, 1, 0);
     fileManager.failingRemovals = {"ZafReplay_YouTube1.mp4", "ZafReplay_YouTube3.mp4"};
     store._srDeleteFilesWithPrefix("ZafReplay_YouTube");
-    ZafTempStore(fileManager, scratch.path() + "/absent/")._srDeleteFilesWithPrefix("x");
     dispatch::waitForGlobalQueue(dispatch::Priority::Default);
     EXPECT_FALSE(exists("ZafReplay_YouTube2.mp4"));
     EXPECT_EQ(logs.messages("zaf.tempstore"), QStringList(2, QString("_zavDeleteFilesWithPrefix error: %1").arg(EBUSY)));
     EXPECT_EQ(logs.entries().size(), 2) << "nothing else, in any category";
+}
+
+TEST_F(TempStoreTest, PrefixCleanupOfAMissingDirectoryDoesNothing)
+{
+    ZafTempStore(fileManager, scratch.path() + "/absent/")._srDeleteFilesWithPrefix("x");
+    dispatch::waitForGlobalQueue(dispatch::Priority::Default);
+    EXPECT_TRUE(logs.entries().isEmpty());
 }
 
 // Editors running side by side: each process claims a locked directory of its own under the root.
@@ -334,12 +375,6 @@ class ProcessDirectoryTest : public ::testing::Test {
 protected:
     QString root() const { return scratch.path() + "/Zafrel/"; }
     tempstore::ProcessDirectory claim() const { return tempstore::ProcessDirectory::claim(fileManager, root()); }
-    QStringList rootEntries() const
-    {
-        QStringList names = QDir(root()).entryList(QDir::AllEntries | QDir::Hidden | QDir::NoDotAndDotDot);
-        std::sort(names.begin(), names.end());
-        return names;
-    }
 
     ScratchDir scratch;
     FileManager fileManager;
@@ -388,7 +423,7 @@ TEST_F(ProcessDirectoryTest, WhatEndedProcessesLeftIsSweptAtClaimAndAtEmptying)
     ASSERT_TRUE(QDir().mkpath(root() + "session-killed"));
     const ZafTempStore store(fileManager, living.path(), {}, [&living] { living.sweepAbandonedSiblings(); });
     store._srDeleteAllTempFiles();
-    EXPECT_EQ(rootEntries(), QStringList({"ZafReplay_Final1700000000.mp4", living.path().section('/', -2, -2)}));
+    EXPECT_EQ(entryNames(root()), QStringList({"ZafReplay_Final1700000000.mp4", living.path().section('/', -2, -2)}));
 }
 
 TEST_F(ProcessDirectoryTest, ARootThatCannotBeMadeLeavesTheDirectoryUnclaimedWithALoggedError)
