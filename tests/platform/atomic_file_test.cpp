@@ -153,21 +153,6 @@ INSTANTIATE_TEST_SUITE_P(Cases, AtomicFileSecondEnd,
                                            SecondEndCase{"DiscardThenDiscard", false, false, {}}),
                          test::caseName);
 
-// An encoder that wants a path opens the temporary by its name; what it writes is what commit() puts
-// in place.
-TEST(AtomicFile, CommitsWhatWasWrittenThroughTheTemporaryPath)
-{
-    test::ScratchDir scratch;
-    Result<std::unique_ptr<AtomicFile>> file = AtomicFile::create(scratch.file("movie.mp4"));
-    ASSERT_TRUE(file.ok());
-    QFile byPath((*file.value)->temporaryPath());
-    ASSERT_TRUE(byPath.open(QIODevice::WriteOnly));
-    byPath.write(QByteArray(100000, 'x'));
-    byPath.close();
-    EXPECT_FALSE((*file.value)->commit().has_value());
-    EXPECT_EQ(fileContents(scratch.file("movie.mp4")), QByteArray(100000, 'x'));
-}
-
 // The temporary's name stays within NAME_MAX however long the destination's is.
 TEST(AtomicFile, LongDestinationNameKeepsTheTemporaryWithinNameMax)
 {

@@ -91,14 +91,6 @@ INSTANTIATE_TEST_SUITE_P(
                       RingCase{"ManyLaps", {{50, 33}, {33, 41}, {41, 47}, {47, 49}, {50, 63}, {0, kRing}}}),
     test::caseName);
 
-TEST(AudioRing, IsNeverSmallerThan64Bytes)
-{
-    AudioRing ring(1);
-    const std::vector<char> bytes = streamBytes(0, kRing);
-    EXPECT_TRUE(ring.write(bytes.data(), kRing, giveUpAfter(1)));
-    EXPECT_EQ(ring.available(), kRing);
-}
-
 // A writer on a full ring that gives up keeps what fitted and returns false.
 TEST(AudioRing, WriterGivingUpOnAFullRingKeepsWhatFitted)
 {
@@ -251,29 +243,38 @@ INSTANTIATE_TEST_SUITE_P(
                       DueCase{"OtherGenerationDropped", {frame(100, 1), frame(200, 1)}, 2, 1000, std::nullopt, 0}),
     test::caseName);
 
-TEST(FrameQueue, PushOfANewGenerationDropsTheOldOnesInsteadOfWaiting)
+// What a push onto a queue holding `queued` frames of generation 1 does, with a give-up check that
+// turns true after `giveUpAfter` calls.
+struct PushCase {
+    const char *name;
+    std::size_t capacity;
+    int queued;
+    VideoFrame pushed;
+    int giveUpAfter;
+    bool returns;
+    std::size_t left;
+};
+
+class FrameQueuePush : public ::testing::TestWithParam<PushCase> {};
+
+TEST_P(FrameQueuePush, KeepsTheBound)
 {
-    FrameQueue queue(2);
-    ASSERT_TRUE(queue.push(frame(100, 1), {}));
-    ASSERT_TRUE(queue.push(frame(200, 1), {}));
-    EXPECT_TRUE(queue.push(frame(50, 2), giveUpAfter(1)));
-    EXPECT_EQ(queue.size(), 1u);
+    const PushCase &c = GetParam();
+    FrameQueue queue(c.capacity);
+    for (int i = 0; i < c.queued; ++i)
+        ASSERT_TRUE(queue.push(frame(100 * i, 1), {}));
+    EXPECT_EQ(queue.push(c.pushed, giveUpAfter(c.giveUpAfter)), c.returns);
+    EXPECT_EQ(queue.size(), c.left);
 }
 
-TEST(FrameQueue, CapacityZeroHoldsOneFrame)
-{
-    FrameQueue queue(0);
-    EXPECT_TRUE(queue.push(frame(100), giveUpAfter(1)));
-    EXPECT_FALSE(queue.push(frame(200), giveUpAfter(1)));
-    EXPECT_EQ(queue.size(), 1u);
-}
-
-TEST(FrameQueue, PushGivingUpDoesNotAppend)
-{
-    FrameQueue queue(4);
-    EXPECT_FALSE(queue.push(frame(100), giveUpAfter(0)));
-    EXPECT_EQ(queue.size(), 0u);
-}
+// A new generation drops the old frames instead of waiting; a capacity of 0 holds one frame; a
+// give-up that holds at once appends nothing, even with room.
+INSTANTIATE_TEST_SUITE_P(Cases, FrameQueuePush,
+                         ::testing::Values(PushCase{"NewGenerationDropsTheOld", 2, 2, frame(50, 2), 1, true, 1},
+                                           PushCase{"FullQueueRefusesOnGiveUp", 2, 2, frame(300, 1), 1, false, 2},
+                                           PushCase{"CapacityZeroHoldsOne", 0, 1, frame(300, 1), 1, false, 1},
+                                           PushCase{"GiveUpAppendsNothing", 4, 2, frame(300, 1), 0, false, 2}),
+                         test::caseName);
 
 struct FrameReleaseCase {
     const char *name;

@@ -228,9 +228,14 @@ TEST(MovieWriterTest, AppendVideoFrameScalesAndConvertsPicturesOfAnyFormat)
     EXPECT_EQ(zaf::test::readFrameNumbers(path), QList<int>({100, 101, 102, 103, 104, -1}));
 }
 
-// The movie is written under a hidden temporary name and appears under its own name only when
-// finished.
-TEST(MovieWriterTest, MovieAppearsUnderItsNameOnlyAfterFinish)
+// The movie is written under a hidden temporary name named after it and appears under its own name
+// only when finished; an abandoned writer leaves nothing, and a file that takes the name meanwhile
+// is kept while the movie goes.
+enum class Ending { Finished, Abandoned, NameTakenMeanwhile };
+
+class MovieWriterEnding : public ::testing::TestWithParam<Ending> {};
+
+TEST_P(MovieWriterEnding, LeavesTheWholeMovieOrNothing)
 {
     zaf::test::ScratchDir dir;
     const QString path = dir.file(QStringLiteral("late.mp4"));
@@ -240,33 +245,25 @@ TEST(MovieWriterTest, MovieAppearsUnderItsNameOnlyAfterFinish)
     const QStringList during = zaf::test::entryNames(dir.path());
     ASSERT_EQ(during.size(), 1);
     EXPECT_TRUE(during[0].startsWith(".late.mp4")) << qPrintable(during[0]);
-    ASSERT_FALSE(writer->finish());
-    EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList({"late.mp4"}));
-    EXPECT_EQ(zaf::test::countVideoFrames(path), 5);
+    if (GetParam() == Ending::Abandoned) {
+        writer.reset();
+        EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList());
+    } else if (GetParam() == Ending::NameTakenMeanwhile) {
+        dir.write(QStringLiteral("late.mp4"), 77);
+        EXPECT_EQ(writer->finish().value_or(zaf::Error{}).code, zaf::media::kMediaErrorOutputExists);
+        EXPECT_EQ(QFileInfo(path).size(), 77);
+        EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList({"late.mp4"}));
+    } else {
+        ASSERT_FALSE(writer->finish());
+        EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList({"late.mp4"}));
+        EXPECT_EQ(zaf::test::countVideoFrames(path), 5);
+    }
 }
 
-TEST(MovieWriterTest, AbandonedWriterLeavesNothing)
-{
-    zaf::test::ScratchDir dir;
-    auto writer = createWriter(dir.file(QStringLiteral("abandoned.mp4")), MovieWriter::Settings{QSize(128, 96)});
-    ASSERT_TRUE(writer);
-    appendNumberedFrames(*writer, 5);
-    writer.reset();
-    EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList());
-}
-
-// A file that takes the name while the movie is written is kept; the movie goes.
-TEST(MovieWriterTest, FileThatTookTheNameMeanwhileIsKept)
-{
-    zaf::test::ScratchDir dir;
-    auto writer = createWriter(dir.file(QStringLiteral("raced.mp4")), MovieWriter::Settings{QSize(128, 96)});
-    ASSERT_TRUE(writer);
-    appendNumberedFrames(*writer, 5);
-    const QString raced = dir.write(QStringLiteral("raced.mp4"), 77);
-    EXPECT_EQ(writer->finish().value_or(zaf::Error{}).code, zaf::media::kMediaErrorOutputExists);
-    EXPECT_EQ(QFileInfo(raced).size(), 77);
-    EXPECT_EQ(zaf::test::entryNames(dir.path()), QStringList({"raced.mp4"}));
-}
+INSTANTIATE_TEST_SUITE_P(Endings, MovieWriterEnding, ::testing::Values(Ending::Finished, Ending::Abandoned, Ending::NameTakenMeanwhile),
+                         [](const auto &info) {
+                             return info.param == Ending::Finished ? "Finished" : info.param == Ending::Abandoned ? "Abandoned" : "NameTakenMeanwhile";
+                         });
 
 // Creation fails, leaving no file and an existing one untouched, for an existing path, an
 // unwritable directory (logged with the path) and unsupported settings.
