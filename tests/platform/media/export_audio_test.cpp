@@ -99,13 +99,14 @@ QList<float> decodedSamples(const QString &path, int audioIndex)
     return samples;
 }
 
-// Noise tells every sample offset apart; a click at 2 s on an MP3 track beside it. Noise
+// Noise tells every sample offset apart; a click at 2 s on an MP3 track beside it. The noise is
+// seeded, so two test processes that make the cached file at once make the same file. Noise
 // substitution stays off: its noise is drawn anew by each decoder, so a copy would not decode to the
 // source's samples even when exact.
 QString noiseMovie()
 {
     return sharedFfmpegOutput(QStringList{QStringLiteral("-i"), sharedFixtureMovie({.seconds = 4, .audioTracks = 0})}
-                           << words("-f lavfi -i anoisesrc=d=4:c=pink:r=48000:a=0.3 -f lavfi -i aevalsrc=if(between(t\\,2\\,2.0005)\\,0.9\\,0):s=48000:d=4"
+                           << words("-f lavfi -i anoisesrc=d=4:c=pink:r=48000:a=0.3:seed=14 -f lavfi -i aevalsrc=if(between(t\\,2\\,2.0005)\\,0.9\\,0):s=48000:d=4"
                                     " -map 0:v -map 1 -map 2 -c:v copy -c:a:0 aac -b:a:0 192k -aac_pns 0 -c:a:1 libmp3lame"));
 }
 
