@@ -1,8 +1,7 @@
 // The runtime driven over a socket pair as a host would drive it: the request, the principal's view
 // coming on screen with the items already in its context, the removal (by message or by the end of
 // the channel), refusals of bad requests, and the one-way proxy back to the host. Last, the extension
-// main routine's refusal of a missing or unusable channel descriptor (it returns before any
-// application object is made, so it runs inside this test program).
+// main routine's refusal of a missing or unusable channel descriptor.
 
 #include "platform/extensionkit/channel.h"
 #include "platform/extensionkit/extension_runtime.h"
@@ -11,6 +10,7 @@
 #include "platform/ui/window_host.h"
 #include "tests/platform/extensionkit/socket_pair.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/named_cases.h"
 
 #include <QJsonArray>
 #include <QScopeGuard>
@@ -20,13 +20,18 @@
 
 #include <cerrno>
 #include <fcntl.h>
+#include <functional>
+#include <optional>
 #include <thread>
 #include <unistd.h>
 
 using namespace zaf::extensionkit;
 using zaf::test::SocketPair;
+using zaf::test::caseName;
 using zaf::test::waitUntil;
 namespace rpc = zaf::extensionkit::jsonrpc;
+
+ZAF_PRINT_CASES_AS_NAMES
 
 namespace {
 
@@ -108,7 +113,7 @@ protected:
 
 } // namespace
 
-TEST_F(RuntimeTest, StartWiresContextAndPrincipalButShowsNothingBeforeTheRequest)
+TEST_F(RuntimeTest, StartWiresTheContextToThePrincipalShowingNothing)
 {
     ASSERT_NE(runtime->context(), nullptr);
     EXPECT_EQ(runtime->principal(), recorder);
@@ -116,8 +121,12 @@ TEST_F(RuntimeTest, StartWiresContextAndPrincipalButShowsNothingBeforeTheRequest
     EXPECT_EQ(ExtensionContext::contextOfPrincipal(recorder), runtime->context());
     EXPECT_TRUE(runtime->context()->inputItems().isEmpty());
     EXPECT_FALSE(runtime->hasRequest());
+    EXPECT_FALSE(recorder->isViewLoaded());
+    EXPECT_EQ(runtime->window(), nullptr);
+}
 
-    // The channel closing before any request finishes the runtime without ever loading the view.
+TEST_F(RuntimeTest, ChannelClosingBeforeTheRequestFinishesWithoutLoadingTheView)
+{
     pair.closeHost();
     ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
     EXPECT_EQ(recorder->calls, QStringList{"finished"});
@@ -125,7 +134,7 @@ TEST_F(RuntimeTest, StartWiresContextAndPrincipalButShowsNothingBeforeTheRequest
     EXPECT_EQ(runtime->window(), nullptr);
 }
 
-TEST_F(RuntimeTest, RequestSetsTheItemsBeforeThePrincipalsViewLoadsAndShows)
+TEST_F(RuntimeTest, RequestKeepsTheItemsWithATitleString)
 {
     zaf::test::LogCapture logs;
     const QJsonArray items{
@@ -147,73 +156,99 @@ TEST_F(RuntimeTest, RequestSetsTheItemsBeforeThePrincipalsViewLoadsAndShows)
     EXPECT_FALSE(kept[1].attachments()[0]->hasItemConformingToTypeIdentifier(kTypeIdentifierData));
     EXPECT_FALSE(kept[1].attachments()[1]->hasItemConformingToTypeIdentifier(kTypeIdentifierData));
     EXPECT_TRUE(kept[2].attachments().first()->hasItemConformingToTypeIdentifier(kTypeIdentifierColor));
+    EXPECT_EQ(logs.messages("zaf.extensionkit").filter("skipped").size(), 3);
+}
 
+TEST_F(RuntimeTest, RequestShowsThePrincipalsViewWithTheItemsAlreadyInTheContext)
+{
+    begin();
     EXPECT_EQ(recorder->itemsAtViewDidLoad, 3);
     EXPECT_EQ(recorder->calls, (QStringList{"viewDidLoad", "viewWillAppear", "viewDidAppear"}));
     ASSERT_NE(runtime->window(), nullptr);
     EXPECT_TRUE(runtime->window()->isVisible());
     EXPECT_EQ(runtime->window()->windowTitle(), "Test Editor");
     EXPECT_EQ(runtime->window()->size(), QSize(640, 360));
-    EXPECT_EQ(logs.messages("zaf.extensionkit").filter("skipped").size(), 3);
 }
 
-TEST_F(RuntimeTest, ClosingTheWindowOnlyCallsTheHandlerAndRemovalMakesTheViewDisappearThenFinishesOnce)
+TEST_F(RuntimeTest, ClosingTheWindowOnlyCallsTheHandler)
 {
     begin();
     runtime->window()->close();
     EXPECT_EQ(closedWith, recorder);
     EXPECT_TRUE(runtime->window()->isVisible());
     EXPECT_EQ(finishedCount, 0);
+}
 
+TEST_F(RuntimeTest, RemovalMakesTheViewDisappearThenFinishes)
+{
+    begin();
     recorder->calls.clear();
     pair.writeMessage(rpc::makeNotification("removeExtensionView"));
     ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
     EXPECT_EQ(recorder->calls, (QStringList{"viewWillDisappear", "viewDidDisappear", "finished"}));
     EXPECT_FALSE(runtime->window()->isVisible());
+}
 
-    // The host then closing the channel is the same removal: nothing happens a second time.
+TEST_F(RuntimeTest, ChannelClosingAfterTheRemovalChangesNothing)
+{
+    begin();
+    pair.writeMessage(rpc::makeNotification("removeExtensionView"));
+    ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
     pair.closeHost();
     waitUntil([] { return false; }, 50);
     EXPECT_EQ(finishedCount, 1);
     EXPECT_EQ(recorder->calls.count("viewDidDisappear"), 1);
 }
 
-TEST_F(RuntimeTest, GarbageAndBadRequestsAreLoggedOrAnsweredAndTheRuntimeCarriesOn)
+// A bad or unknown message before the request: answered as JSON-RPC asks (frames whose id cannot
+// be read with a null id, notifications never) or logged, and the request that follows still goes
+// through.
+struct BadMessage {
+    const char *name;
+    QByteArray payload;
+    std::optional<std::pair<QJsonValue, int>> answer; // id and code; none: not answered
+};
+
+class RuntimeBadMessageTest : public RuntimeTest, public ::testing::WithParamInterface<BadMessage> {};
+
+TEST_P(RuntimeBadMessageTest, IsRefusedWhileTheRuntimeCarriesOn)
 {
-    zaf::test::LogCapture logs;
-    pair.writeFrame("\xff\xfe garbage");
-    pair.writeFrame("{\"jsonrpc\":\"2.0\",\"id\":1,\"method\":\"beginExtensionRequest\",\"params\":");
-    pair.writeFrame(R"({"jsonrpc":"2.0","id":{"x":1},"method":"beginExtensionRequest","params":{"inputItems":[]}})");
-    pair.writeMessage(rpc::makeRequest(1, "beginExtensionRequest", QJsonArray{}));
-    pair.writeMessage(rpc::makeRequest(2, "beginExtensionRequest", QJsonObject{{"inputItems", "nope"}}));
-    pair.writeMessage(rpc::makeRequest(3, "beginExtensionRequest"));
-    pair.writeMessage(rpc::makeRequest(4, "doSomethingElse", QJsonObject{}));
-    pair.writeMessage(rpc::makeRequest(5, "removeExtensionView"));
-    pair.writeMessage(rpc::makeNotification("unknownNotification"));
-    pair.writeMessage(rpc::makeNotification("beginExtensionRequest", QJsonObject{{"inputItems", QJsonArray{}}}));
-    const QList<QJsonObject> answers = pair.readMessages(8);
-    ASSERT_EQ(answers.size(), 8);
-    // Frames whose id cannot be read are answered with a null id; notifications are not answered.
-    const QList<std::pair<QJsonValue, int>> expected{{QJsonValue::Null, rpc::ParseError},     {QJsonValue::Null, rpc::ParseError},
-                                                     {QJsonValue::Null, rpc::InvalidRequest}, {1, rpc::InvalidParams},
-                                                     {2, rpc::InvalidParams},                 {3, rpc::InvalidParams},
-                                                     {4, rpc::MethodNotFound},                {5, rpc::InvalidRequest}};
-    for (qsizetype i = 0; i < answers.size(); ++i) {
-        EXPECT_EQ(answers[i].value("id"), expected[i].first) << i;
-        EXPECT_EQ(answers[i].value("error").toObject().value("code"), QJsonValue(expected[i].second)) << i;
+    pair.writeFrame(GetParam().payload);
+    if (GetParam().answer) {
+        EXPECT_EQ(pair.readErrorAnswer(), GetParam().answer);
     }
     EXPECT_TRUE(pair.nothingToRead());
     EXPECT_FALSE(runtime->hasRequest());
     EXPECT_FALSE(runtime->isFinished());
-    EXPECT_GE(logs.messages("zaf.extensionkit").filter("protocol error").size(), 3);
-    EXPECT_EQ(logs.messages("zaf.extensionkit").filter("unknown notification unknownNotification").size(), 1);
+    begin();
+}
 
-    // A valid request still goes through afterwards; a second one is refused.
+QByteArray serialized(const QJsonObject &message)
+{
+    return rpc::serialize(message);
+}
+
+INSTANTIATE_TEST_SUITE_P(Messages, RuntimeBadMessageTest, ::testing::Values(
+    BadMessage{"NotUtf8", "\xff\xfe garbage", {{QJsonValue::Null, rpc::ParseError}}},
+    BadMessage{"CutOffJson", R"({"jsonrpc":"2.0","id":1,"method":"beginExtensionRequest","params":)", {{QJsonValue::Null, rpc::ParseError}}},
+    BadMessage{"IdAnObject", R"({"jsonrpc":"2.0","id":{"x":1},"method":"beginExtensionRequest","params":{"inputItems":[]}})",
+               {{QJsonValue::Null, rpc::InvalidRequest}}},
+    BadMessage{"ParamsAnArray", serialized(rpc::makeRequest(1, "beginExtensionRequest", QJsonArray{})), {{1, rpc::InvalidParams}}},
+    BadMessage{"ItemsNotAnArray", serialized(rpc::makeRequest(2, "beginExtensionRequest", QJsonObject{{"inputItems", "nope"}})),
+               {{2, rpc::InvalidParams}}},
+    BadMessage{"NoParams", serialized(rpc::makeRequest(3, "beginExtensionRequest")), {{3, rpc::InvalidParams}}},
+    BadMessage{"UnknownMethod", serialized(rpc::makeRequest(4, "doSomethingElse", QJsonObject{})), {{4, rpc::MethodNotFound}}},
+    BadMessage{"RemovalAsARequest", serialized(rpc::makeRequest(5, "removeExtensionView")), {{5, rpc::InvalidRequest}}},
+    BadMessage{"UnknownNotification", serialized(rpc::makeNotification("unknownNotification")), std::nullopt},
+    BadMessage{"RequestAsANotification", serialized(rpc::makeNotification("beginExtensionRequest", QJsonObject{{"inputItems", QJsonArray{}}})),
+               std::nullopt}),
+    caseName);
+
+TEST_F(RuntimeTest, SecondRequestIsRefused)
+{
     begin();
     pair.writeMessage(beginRequest(9, QJsonArray{}));
-    const QList<QJsonObject> second = pair.readMessages(1);
-    ASSERT_EQ(second.size(), 1);
-    EXPECT_EQ(second[0], rpc::makeError(9, rpc::InvalidRequest, "request already begun"));
+    EXPECT_EQ(pair.readMessages(1), QList<QJsonObject>{rpc::makeError(9, rpc::InvalidRequest, "request already begun")});
     EXPECT_EQ(runtime->context()->inputItems().size(), 3);
     EXPECT_EQ(finishedCount, 0);
 }
@@ -230,7 +265,7 @@ TEST_F(RuntimeTest, OversizedFrameClosesTheChannelWhichRemovesTheView)
     EXPECT_FALSE(logs.messages("zaf.extensionkit").filter("exceeds the limit").isEmpty());
 }
 
-TEST_F(RuntimeTest, ProxyDeliversOneWayMessagesFromAnyThreadAndReportsFailures)
+TEST_F(RuntimeTest, ProxyDeliversOneWayMessagesFromAnyThread)
 {
     begin();
     QList<zaf::Error> errors;
@@ -238,74 +273,97 @@ TEST_F(RuntimeTest, ProxyDeliversOneWayMessagesFromAnyThreadAndReportsFailures)
     proxy->sendOneWay(kReportMethod, QJsonArray{QJsonArray{"save", "save"}});
     std::thread worker([proxy] { proxy->sendOneWay(kReportMethod, QJsonArray{QJsonArray{}}); });
     worker.join();
-    const QList<QJsonObject> messages = pair.readMessages(2);
-    ASSERT_EQ(messages.size(), 2);
-    EXPECT_EQ(messages[0], rpc::makeNotification(kReportMethod, QJsonArray{QJsonArray{"save", "save"}}));
-    EXPECT_EQ(messages[1], rpc::makeNotification(kReportMethod, QJsonArray{QJsonArray{}}));
+    EXPECT_EQ(pair.readMessages(2), (QList<QJsonObject>{rpc::makeNotification(kReportMethod, QJsonArray{QJsonArray{"save", "save"}}),
+                                                        rpc::makeNotification(kReportMethod, QJsonArray{QJsonArray{}})}));
     EXPECT_TRUE(errors.isEmpty());
+    // Each call makes a new proxy.
+    EXPECT_NE(runtime->context()->remoteObjectProxyWithErrorHandler({}), proxy);
+}
 
-    // A method the host's interface does not declare never reaches the wire.
-    proxy->sendOneWay("somethingUndeclared", QJsonArray{});
+TEST_F(RuntimeTest, ProxyRefusesAMethodTheHostDoesNotDeclare)
+{
+    begin();
+    QList<zaf::Error> errors;
+    runtime->context()->remoteObjectProxyWithErrorHandler([&](const zaf::Error &error) { errors.append(error); })->sendOneWay("somethingUndeclared", QJsonArray{});
     ASSERT_EQ(errors.size(), 1);
     EXPECT_EQ(errors[0].code, EINVAL);
     EXPECT_TRUE(pair.nothingToRead());
-
-    // Each call makes a new proxy; after the host went away, a send reports the write's errno.
-    EXPECT_NE(runtime->context()->remoteObjectProxyWithErrorHandler({}), proxy);
-    pair.closeHost();
-    proxy->sendOneWay(kReportMethod, QJsonArray{QJsonArray{"late"}});
-    ASSERT_EQ(errors.size(), 2);
-    EXPECT_TRUE(errors[1].code == EPIPE || errors[1].code == ECONNRESET) << errors[1].code;
 }
 
-TEST(RuntimeStart, FailsWithoutAPrincipalOrAUsableDescriptor)
+TEST_F(RuntimeTest, ProxyReportsTheWriteErrorOnceTheHostHasGone)
+{
+    begin();
+    QList<zaf::Error> errors;
+    const auto proxy = runtime->context()->remoteObjectProxyWithErrorHandler([&](const zaf::Error &error) { errors.append(error); });
+    pair.closeHost();
+    proxy->sendOneWay(kReportMethod, QJsonArray{QJsonArray{"late"}});
+    ASSERT_EQ(errors.size(), 1);
+    EXPECT_TRUE(errors[0].code == EPIPE || errors[0].code == ECONNRESET) << errors[0].code;
+}
+
+TEST(RuntimeStart, FailsWithoutAPrincipal)
 {
     SocketPair pair;
     ExtensionDeclaration noPrincipal;
     noPrincipal.principalClassName = "Missing";
-    ExtensionRuntime withoutPrincipal(pair.releaseExtensionFd(), noPrincipal);
+    ExtensionRuntime runtime(pair.releaseExtensionFd(), noPrincipal);
     QString error;
-    EXPECT_FALSE(withoutPrincipal.start(&error));
+    EXPECT_FALSE(runtime.start(&error));
     EXPECT_TRUE(error.contains("Missing"));
-
-    ExtensionDeclaration declaration;
-    declaration.makePrincipal = [] { return new zaf::ui::ViewController; };
-    ExtensionRuntime badFd(-1, declaration);
-    EXPECT_FALSE(badFd.start(&error));
-    EXPECT_EQ(badFd.principal(), nullptr);
 }
 
-TEST(ExtensionMain, ChannelDescriptorMustNameAnOpenSocketElseMainExitsWithCodeTwo)
+TEST(RuntimeStart, FailsWithoutADescriptor)
+{
+    ExtensionDeclaration declaration;
+    declaration.makePrincipal = [] { return new zaf::ui::ViewController; };
+    ExtensionRuntime runtime(-1, declaration);
+    EXPECT_FALSE(runtime.start());
+    EXPECT_EQ(runtime.principal(), nullptr);
+}
+
+// The extension main routine refuses a missing or unusable channel descriptor: it returns before
+// any application object is made, so it runs inside this test program.
+struct ChannelVariable {
+    const char *name;
+    std::function<std::optional<QByteArray>()> value;
+    const char *reason;
+};
+
+class ExtensionMainTest : public ::testing::TestWithParam<ChannelVariable> {};
+
+TEST_P(ExtensionMainTest, ExitsWithCodeTwoWhenTheDescriptorIsUnusable)
 {
     const auto unset = qScopeGuard([] { qunsetenv(kChannelFdEnvironmentVariable); });
-    const int devNull = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
-    ASSERT_GE(devNull, 0);
-    int closed[2];
-    ASSERT_EQ(::pipe(closed), 0);
-    ::close(closed[0]);
-    ::close(closed[1]);
-    const QList<std::pair<std::optional<QByteArray>, QString>> cases{
-        {std::nullopt, "is not set"},
-        {QByteArray(""), "is not set"},
-        {QByteArray("three"), "not a descriptor number"},
-        {QByteArray("-1"), "not a descriptor number"},
-        {QByteArray("3x"), "not a descriptor number"},
-        {QByteArray::number(closed[0]), "names no open descriptor"},
-        {QByteArray::number(devNull), "is not a socket"},
-    };
+    const std::optional<QByteArray> value = GetParam().value();
+    value ? qputenv(kChannelFdEnvironmentVariable, *value) : qunsetenv(kChannelFdEnvironmentVariable);
+    QString error;
+    EXPECT_EQ(channelFdFromEnvironment(&error), -1);
+    EXPECT_TRUE(error.contains(GetParam().reason)) << error.toStdString();
     char name[] = "zaf-test-extension";
     char *argv[] = {name, nullptr};
-    for (const auto &[value, reason] : cases) {
-        SCOPED_TRACE(value ? value->toStdString() : std::string("(unset)"));
-        value ? qputenv(kChannelFdEnvironmentVariable, *value) : qunsetenv(kChannelFdEnvironmentVariable);
-        QString error;
-        EXPECT_EQ(channelFdFromEnvironment(&error), -1);
-        EXPECT_TRUE(error.contains(reason)) << error.toStdString();
-        EXPECT_EQ(extensionMain(1, argv, ExtensionDeclaration{}), kExitCodeNoChannel);
-    }
-    ::close(devNull);
+    EXPECT_EQ(extensionMain(1, argv, ExtensionDeclaration{}), kExitCodeNoChannel);
+}
 
-    zaf::test::SocketPair pair;
+// A descriptor of /dev/null, open for the whole program.
+QByteArray devNull()
+{
+    static const int fd = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
+    return QByteArray::number(fd);
+}
+
+INSTANTIATE_TEST_SUITE_P(Values, ExtensionMainTest, ::testing::Values(
+    ChannelVariable{"Unset", [] { return std::optional<QByteArray>(); }, "is not set"},
+    ChannelVariable{"Empty", [] { return std::optional<QByteArray>(""); }, "is not set"},
+    ChannelVariable{"AWord", [] { return std::optional<QByteArray>("three"); }, "not a descriptor number"},
+    ChannelVariable{"Negative", [] { return std::optional<QByteArray>("-1"); }, "not a descriptor number"},
+    ChannelVariable{"TrailingLetter", [] { return std::optional<QByteArray>("3x"); }, "not a descriptor number"},
+    ChannelVariable{"NoOpenDescriptor", [] { return std::optional<QByteArray>("1048576"); }, "names no open descriptor"},
+    ChannelVariable{"NotASocket", [] { return std::optional<QByteArray>(devNull()); }, "is not a socket"}), caseName);
+
+TEST(ExtensionMain, ChannelDescriptorNamingASocketIsTaken)
+{
+    const auto unset = qScopeGuard([] { qunsetenv(kChannelFdEnvironmentVariable); });
+    SocketPair pair;
     qputenv(kChannelFdEnvironmentVariable, QByteArray::number(pair.extensionFd()));
     QString error;
     EXPECT_EQ(channelFdFromEnvironment(&error), pair.extensionFd()) << error.toStdString();

@@ -55,37 +55,45 @@ TEST(FrameCodec, DecodeGivesBackThePayloadsHoweverTheStreamIsChunked)
     }
 }
 
-TEST(FrameCodec, LengthAtTheCapIsAcceptedAndAboveItIsAStickyError)
+TEST(FrameCodec, LengthAtTheCapIsAccepted)
 {
-    FrameDecoder atCap;
+    FrameDecoder decoder;
     const QByteArray largest(int(kDefaultMaxFrameLength), 'a');
-    ASSERT_TRUE(atCap.feed(encodeFrame(largest)));
-    EXPECT_EQ(atCap.takeFrame(), largest);
+    ASSERT_TRUE(decoder.feed(encodeFrame(largest)));
+    EXPECT_EQ(decoder.takeFrame(), largest);
+}
 
-    FrameDecoder overCap;
-    EXPECT_FALSE(overCap.feed(QByteArray::fromHex("01001000"))); // 1 MiB + 1
-    EXPECT_EQ(overCap.status(), FrameDecoder::Status::TooLarge);
-    EXPECT_TRUE(overCap.errorString().contains(QString::number(kDefaultMaxFrameLength + 1)));
-    EXPECT_EQ(overCap.pendingBytes(), 0);
+TEST(FrameCodec, LengthAboveTheCapIsAStickyError)
+{
+    FrameDecoder decoder;
+    EXPECT_FALSE(decoder.feed(QByteArray::fromHex("01001000"))); // 1 MiB + 1
+    EXPECT_EQ(decoder.status(), FrameDecoder::Status::TooLarge);
+    EXPECT_TRUE(decoder.errorString().contains(QString::number(kDefaultMaxFrameLength + 1)));
+    EXPECT_EQ(decoder.pendingBytes(), 0);
     // Input after the error is discarded, even a valid frame.
-    EXPECT_FALSE(overCap.feed(encodeFrame("ok")));
-    EXPECT_FALSE(overCap.hasFrame());
+    EXPECT_FALSE(decoder.feed(encodeFrame("ok")));
+    EXPECT_FALSE(decoder.hasFrame());
+}
 
-    // A frame complete before the bad length is still there.
-    FrameDecoder smallCap(16);
-    EXPECT_TRUE(smallCap.feed(encodeFrame(QByteArray(16, 'b'))));
-    EXPECT_FALSE(smallCap.feed(encodeFrame(QByteArray(17, 'b'))));
-    EXPECT_EQ(smallCap.takeFrames(), QList<QByteArray>{QByteArray(16, 'b')});
+TEST(FrameCodec, FrameCompleteBeforeABadLengthIsKept)
+{
+    FrameDecoder decoder(16);
+    EXPECT_TRUE(decoder.feed(encodeFrame(QByteArray(16, 'b'))));
+    EXPECT_FALSE(decoder.feed(encodeFrame(QByteArray(17, 'b'))));
+    EXPECT_EQ(decoder.takeFrames(), QList<QByteArray>{QByteArray(16, 'b')});
+}
 
+TEST(FrameCodec, PendingBytesAreOnlyThoseReceived)
+{
     // With the cap lifted, a 4 GiB announcement holds only the bytes received (a partial header
     // counts too), not the announced size.
-    FrameDecoder hugeCap(0xffffffffu);
-    ASSERT_TRUE(hugeCap.feed(QByteArray::fromHex("f0ff")));
-    EXPECT_EQ(hugeCap.pendingBytes(), 2);
-    EXPECT_FALSE(hugeCap.isAtFrameBoundary());
-    ASSERT_TRUE(hugeCap.feed(QByteArray::fromHex("ffff") + QByteArray(100, 'q')));
-    EXPECT_FALSE(hugeCap.hasFrame());
-    EXPECT_EQ(hugeCap.pendingBytes(), 104);
+    FrameDecoder decoder(0xffffffffu);
+    ASSERT_TRUE(decoder.feed(QByteArray::fromHex("f0ff")));
+    EXPECT_EQ(decoder.pendingBytes(), 2);
+    EXPECT_FALSE(decoder.isAtFrameBoundary());
+    ASSERT_TRUE(decoder.feed(QByteArray::fromHex("ffff") + QByteArray(100, 'q')));
+    EXPECT_FALSE(decoder.hasFrame());
+    EXPECT_EQ(decoder.pendingBytes(), 104);
 }
 
 TEST(FrameCodec, RandomBytesNeverYieldAFrameAboveTheCap)

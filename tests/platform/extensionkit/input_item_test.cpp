@@ -3,6 +3,7 @@
 
 #include "platform/dispatch.h"
 #include "platform/extensionkit/input_item.h"
+#include "tests/support/named_cases.h"
 
 #include <QCoreApplication>
 #include <QJsonArray>
@@ -17,6 +18,9 @@
 #include <atomic>
 
 using namespace zaf::extensionkit;
+using zaf::test::caseName;
+
+ZAF_PRINT_CASES_AS_NAMES
 
 namespace {
 
@@ -49,88 +53,103 @@ std::shared_ptr<LoadOutcome> load(const ItemAttachment &attachment, const QStrin
 
 } // namespace
 
-TEST(ColorFromHexString, ParsesSixAndEightDigitFormsWithAlphaLast)
+class ColorFromHexStringTest : public ::testing::TestWithParam<std::pair<const char *, QColor>> {};
+
+TEST_P(ColorFromHexStringTest, ReadsAlphaLast)
 {
-    EXPECT_EQ(colorFromHexString("#102030"), QColor(0x10, 0x20, 0x30, 0xff));
-    EXPECT_EQ(colorFromHexString("#10203040"), QColor(0x10, 0x20, 0x30, 0x40));
-    EXPECT_EQ(colorFromHexString("#aBcDeF80"), QColor(0xab, 0xcd, 0xef, 0x80));
-    EXPECT_EQ(colorFromHexString("#FF000000").alpha(), 0);
-    for (const char *bad : {"", "#", "102030", "#12345", "#1234567", "#123456789", "#12345g", "#1020304x", " #102030", "#102030 ", "red", "##10203"})
-        EXPECT_FALSE(colorFromHexString(QString::fromLatin1(bad)).isValid()) << bad;
+    EXPECT_EQ(colorFromHexString(GetParam().first), GetParam().second);
 }
 
-TEST(ItemAttachment, ConformsToItsOwnTypeAndTheGenericTypeOnlyWhenItHasAMimeType)
+INSTANTIATE_TEST_SUITE_P(Forms, ColorFromHexStringTest, ::testing::Values(
+    std::pair("#102030", QColor(0x10, 0x20, 0x30, 0xff)), std::pair("#10203040", QColor(0x10, 0x20, 0x30, 0x40)),
+    std::pair("#aBcDeF80", QColor(0xab, 0xcd, 0xef, 0x80)), std::pair("#FF000000", QColor(0xff, 0, 0, 0))));
+
+class BadHexColorTest : public ::testing::TestWithParam<const char *> {};
+
+TEST_P(BadHexColorTest, IsNoColor)
 {
-    const ItemAttachment text("text/plain", "v");
-    EXPECT_TRUE(text.hasItemConformingToTypeIdentifier(kTypeIdentifierData));
-    EXPECT_TRUE(text.hasItemConformingToTypeIdentifier("text/plain"));
-    EXPECT_TRUE(text.hasItemConformingToTypeIdentifier("TEXT/Plain; charset=utf-8"));
-    EXPECT_FALSE(text.hasItemConformingToTypeIdentifier("text/html"));
-    EXPECT_FALSE(text.hasItemConformingToTypeIdentifier(kTypeIdentifierColor));
-    EXPECT_FALSE(text.hasItemConformingToTypeIdentifier("not a type"));
-
-    const ItemAttachment withParameters("text/plain;charset=utf-8", "v");
-    EXPECT_TRUE(withParameters.hasItemConformingToTypeIdentifier("text/plain"));
-
-    for (const char *bad : {"", "text", "text/", "/plain", "text/plain/extra", "te xt/plain", "public.data", "*/*", "text/pl ain"}) {
-        const ItemAttachment attachment(QString::fromLatin1(bad), "v");
-        EXPECT_FALSE(attachment.hasItemConformingToTypeIdentifier(kTypeIdentifierData)) << bad;
-        EXPECT_FALSE(attachment.hasItemConformingToTypeIdentifier(QString::fromLatin1(bad))) << bad;
-        EXPECT_FALSE(isMimeType(QString::fromLatin1(bad))) << bad;
-    }
+    EXPECT_FALSE(colorFromHexString(QString::fromLatin1(GetParam())).isValid());
 }
 
-TEST(ItemAttachment, LoadsEveryJsonKindAndColoursUnderEitherTypeOnAGlobalQueueThread)
+INSTANTIATE_TEST_SUITE_P(Strings, BadHexColorTest, ::testing::Values(
+    "", "#", "102030", "#12345", "#1234567", "#123456789", "#12345g", "#1020304x", " #102030", "#102030 ", "red", "##10203"));
+
+// An attachment of a MIME type conforms to that type (case and parameters aside) and to the generic
+// data type, and to nothing else.
+struct Conformance {
+    const char *name;
+    const char *type;
+    const char *asked;
+    bool conforms;
+};
+
+class ItemAttachmentConformanceTest : public ::testing::TestWithParam<Conformance> {};
+
+TEST_P(ItemAttachmentConformanceTest, FollowsTheMimeType)
 {
-    const ItemAttachment colour(kTypeIdentifierColor, "#11223380");
-    const struct {
-        ItemAttachment attachment;
-        const char *type;
-        QVariant expected;
-    } cases[] = {
-        {ItemAttachment("application/json", "/home/me/rec.mp4"), kTypeIdentifierData, QString("/home/me/rec.mp4")},
-        {ItemAttachment("application/json", 2.5), kTypeIdentifierData, 2.5},
-        {ItemAttachment("application/json", true), kTypeIdentifierData, true},
-        {ItemAttachment("application/json", QJsonArray{1, "a"}), kTypeIdentifierData, QVariantList{1.0, QString("a")}},
-        {ItemAttachment("application/json", QJsonObject{{"k", "v"}}), kTypeIdentifierData, QVariantMap{{"k", QString("v")}}},
-        {colour, kTypeIdentifierData, QColor(0x11, 0x22, 0x33, 0x80)},
-        {colour, kTypeIdentifierColor, QColor(0x11, 0x22, 0x33, 0x80)},
-    };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.expected.toString().toStdString());
-        const auto outcome = load(c.attachment, c.type);
-        EXPECT_FALSE(outcome->error.has_value());
-        EXPECT_EQ(outcome->value.metaType(), c.expected.metaType());
-        EXPECT_EQ(outcome->value, c.expected);
-        EXPECT_FALSE(outcome->onMainThread);
-    }
+    EXPECT_EQ(ItemAttachment(GetParam().type, "v").hasItemConformingToTypeIdentifier(GetParam().asked), GetParam().conforms);
 }
 
-TEST(ItemAttachment, LoadFailsOffTheCallingThreadForAMismatchedTypeOrABadValue)
+INSTANTIATE_TEST_SUITE_P(Types, ItemAttachmentConformanceTest, ::testing::Values(
+    Conformance{"GenericData", "text/plain", kTypeIdentifierData, true},
+    Conformance{"ItsOwnType", "text/plain", "text/plain", true},
+    Conformance{"OwnTypeInOtherCaseWithParameters", "text/plain", "TEXT/Plain; charset=utf-8", true},
+    Conformance{"OwnTypeWithoutItsParameters", "text/plain;charset=utf-8", "text/plain", true},
+    Conformance{"AnotherType", "text/plain", "text/html", false},
+    Conformance{"TheColorType", "text/plain", kTypeIdentifierColor, false},
+    Conformance{"NoType", "text/plain", "not a type", false}), caseName);
+
+class NoMimeTypeTest : public ::testing::TestWithParam<const char *> {};
+
+TEST_P(NoMimeTypeTest, ConformsToNothing)
 {
-    const struct {
-        const char *name;
-        ItemAttachment attachment;
-        const char *type;
-        int code;
-    } cases[] = {
-        {"another type", ItemAttachment("text/plain", "x"), "image/png", ItemAttachmentErrorTypeMismatch},
-        {"no type", ItemAttachment("", "x"), kTypeIdentifierData, ItemAttachmentErrorTypeMismatch},
-        {"null", ItemAttachment("text/plain", QJsonValue(QJsonValue::Null)), kTypeIdentifierData, ItemAttachmentErrorBadValue},
-        {"undefined", ItemAttachment("text/plain", QJsonValue(QJsonValue::Undefined)), kTypeIdentifierData, ItemAttachmentErrorBadValue},
-        {"colour name", ItemAttachment(kTypeIdentifierColor, "blue"), kTypeIdentifierData, ItemAttachmentErrorBadValue},
-        {"colour number", ItemAttachment(kTypeIdentifierColor, 255), kTypeIdentifierColor, ItemAttachmentErrorBadValue},
-    };
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.name);
-        const auto outcome = load(c.attachment, c.type);
-        ASSERT_TRUE(outcome->error.has_value());
-        EXPECT_EQ(outcome->error->domain, QString::fromLatin1(kItemAttachmentErrorDomain));
-        EXPECT_EQ(outcome->error->code, c.code);
-        EXPECT_FALSE(outcome->value.isValid());
-        EXPECT_FALSE(outcome->onMainThread);
-    }
+    const ItemAttachment attachment(QString::fromLatin1(GetParam()), "v");
+    EXPECT_FALSE(isMimeType(QString::fromLatin1(GetParam())));
+    EXPECT_FALSE(attachment.hasItemConformingToTypeIdentifier(kTypeIdentifierData));
+    EXPECT_FALSE(attachment.hasItemConformingToTypeIdentifier(QString::fromLatin1(GetParam())));
 }
+
+INSTANTIATE_TEST_SUITE_P(Strings, NoMimeTypeTest, ::testing::Values(
+    "", "text", "text/", "/plain", "text/plain/extra", "te xt/plain", "public.data", "*/*", "text/pl ain"));
+
+// A load ends off the calling thread, on a global queue's, with the value or with an error code.
+struct Load {
+    const char *name;
+    ItemAttachment attachment;
+    const char *type;
+    QVariant expected; // invalid: the load fails with `code`
+    int code = 0;
+};
+
+class ItemAttachmentLoadTest : public ::testing::TestWithParam<Load> {};
+
+TEST_P(ItemAttachmentLoadTest, EndsOnAGlobalQueueThread)
+{
+    const auto outcome = load(GetParam().attachment, GetParam().type);
+    EXPECT_FALSE(outcome->onMainThread);
+    EXPECT_EQ(outcome->value.metaType(), GetParam().expected.metaType());
+    EXPECT_EQ(outcome->value, GetParam().expected);
+    EXPECT_EQ(outcome->error.value_or(zaf::Error{}).code, GetParam().code);
+    EXPECT_EQ(outcome->error.value_or(zaf::Error{kItemAttachmentErrorDomain, 0, {}}).domain, QString::fromLatin1(kItemAttachmentErrorDomain));
+}
+
+const ItemAttachment kColour(kTypeIdentifierColor, "#11223380");
+const QJsonValue kNull(QJsonValue::Null), kUndefined(QJsonValue::Undefined);
+
+INSTANTIATE_TEST_SUITE_P(Values, ItemAttachmentLoadTest, ::testing::Values(
+    Load{"String", ItemAttachment("application/json", "/home/me/rec.mp4"), kTypeIdentifierData, QString("/home/me/rec.mp4")},
+    Load{"Number", ItemAttachment("application/json", 2.5), kTypeIdentifierData, 2.5},
+    Load{"Boolean", ItemAttachment("application/json", true), kTypeIdentifierData, true},
+    Load{"Array", ItemAttachment("application/json", QJsonArray{1, "a"}), kTypeIdentifierData, QVariantList{1.0, QString("a")}},
+    Load{"Object", ItemAttachment("application/json", QJsonObject{{"k", "v"}}), kTypeIdentifierData, QVariantMap{{"k", QString("v")}}},
+    Load{"ColourAsData", kColour, kTypeIdentifierData, QColor(0x11, 0x22, 0x33, 0x80)},
+    Load{"ColourAsColour", kColour, kTypeIdentifierColor, QColor(0x11, 0x22, 0x33, 0x80)},
+    Load{"AnotherType", ItemAttachment("text/plain", "x"), "image/png", {}, ItemAttachmentErrorTypeMismatch},
+    Load{"NoType", ItemAttachment("", "x"), kTypeIdentifierData, {}, ItemAttachmentErrorTypeMismatch},
+    Load{"Null", ItemAttachment("text/plain", kNull), kTypeIdentifierData, {}, ItemAttachmentErrorBadValue},
+    Load{"Undefined", ItemAttachment("text/plain", kUndefined), kTypeIdentifierData, {}, ItemAttachmentErrorBadValue},
+    Load{"ColourName", ItemAttachment(kTypeIdentifierColor, "blue"), kTypeIdentifierData, {}, ItemAttachmentErrorBadValue},
+    Load{"ColourNumber", ItemAttachment(kTypeIdentifierColor, 255), kTypeIdentifierColor, {}, ItemAttachmentErrorBadValue}), caseName);
 
 TEST(ItemAttachment, ManyConcurrentLoadsFromWorkerThreadsAllComplete)
 {

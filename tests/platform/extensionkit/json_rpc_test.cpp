@@ -3,6 +3,8 @@
 
 #include "platform/extensionkit/json_rpc.h"
 
+#include "tests/support/named_cases.h"
+
 #include <QJsonArray>
 
 #include <gtest/gtest.h>
@@ -10,6 +12,9 @@
 #include <random>
 
 namespace rpc = zaf::extensionkit::jsonrpc;
+using zaf::test::caseName;
+
+ZAF_PRINT_CASES_AS_NAMES
 
 namespace {
 
@@ -50,10 +55,14 @@ TEST(JsonRpc, ParsesEachKindOfMessageWithItsMembers)
     EXPECT_EQ(error.errorData, QJsonValue(QJsonArray{1}));
 }
 
-TEST(JsonRpc, NestingUpToTheLimitParsesAndBracketsInStringsDoNotCount)
+TEST(JsonRpc, NestingUpToTheLimitParses)
 {
     const QByteArray atLimit = QByteArray(rpc::kMaxNestingDepth - 1, '[') + QByteArray(rpc::kMaxNestingDepth - 1, ']');
     EXPECT_EQ(parsed(R"({"jsonrpc":"2.0","id":1,"method":"m","params":)" + atLimit + "}").kind, rpc::MessageKind::Request);
+}
+
+TEST(JsonRpc, BracketsInsideStringsAreNoNesting)
+{
     const QByteArray brackets = "\"" + QByteArray(1000, '[') + "\\\"{\"";
     EXPECT_EQ(parsed(R"({"jsonrpc":"2.0","method":"m","params":[)" + brackets + "]}").params, QJsonValue(QJsonArray{QString(QByteArray(1000, '[') + "\"{")}));
 }
@@ -71,83 +80,90 @@ TEST(JsonRpc, MadeMessagesParseBackAsTheSameKind)
     const rpc::Message error = parsed(rpc::serialize(rpc::makeError(9, rpc::MethodNotFound, "no such method")));
     EXPECT_EQ(error.errorCode, -32601);
     EXPECT_EQ(error.id, QJsonValue(9));
+}
 
-    // A notification made without params leaves the member out rather than sending null, and an
-    // error for an id that cannot be echoed goes out with a null id.
+TEST(JsonRpc, MakersLeaveOutWhatCannotBeSent)
+{
+    // A notification made without params leaves the member out rather than sending null; an error
+    // for an id that cannot be echoed goes out with a null id.
     EXPECT_FALSE(rpc::makeNotification("removeExtensionView").contains("params"));
     EXPECT_TRUE(rpc::makeError(QJsonObject{}, rpc::InvalidRequest, "x").value("id").isNull());
 }
 
-TEST(JsonRpc, RefusesMalformedMessagesWithTheRightCodeAndAnswerability)
+// Each refusal: the code, and the id an answer must carry (nullopt when it must not be answered).
+struct Refusal {
+    const char *name;
+    QByteArray payload;
+    int code;
+    std::optional<QJsonValue> answerId;
+};
+
+class JsonRpcRefusalTest : public ::testing::TestWithParam<Refusal> {};
+
+TEST_P(JsonRpcRefusalTest, CarriesTheCodeAndTheAnswerId)
 {
-    // The last member is the id an answer must carry; nullopt when the failure must not be answered.
-    struct Case {
-        const char *name;
-        QByteArray payload;
-        int code;
-        std::optional<QJsonValue> answerId;
-    };
-    const QJsonValue null(QJsonValue::Null);
-    const auto nested = [](int levels, const char *inside = "") { return QByteArray(levels, '[') + inside + QByteArray(levels, ']'); };
-    const QList<Case> cases{
-        {"empty payload", "", rpc::ParseError, null},
-        {"truncated JSON", R"({"jsonrpc":"2.0","id":1,"meth)", rpc::ParseError, null},
-        {"invalid UTF-8 in a notification", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"m\xff\xfe\"}"), rpc::ParseError, std::nullopt},
-        {"invalid UTF-8 in a request", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":8,\"method\":\"m\xff\xfe\"}"), rpc::ParseError, QJsonValue(8)},
-        {"invalid UTF-8 in a response", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":8,\"result\":\"\xff\"}"), rpc::ParseError, std::nullopt},
-        {"invalid UTF-8 and JSON", QByteArray("\xff\xfe{"), rpc::ParseError, null},
-        {"overlong UTF-8 encoding", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xc0\xaf\"}"), rpc::ParseError, std::nullopt},
-        {"lone surrogate in UTF-8", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":\"s\",\"method\":\"\xed\xa0\x80\"}"), rpc::ParseError, QJsonValue("s")},
-        {"trailing garbage", R"({"jsonrpc":"2.0","method":"m"} x)", rpc::ParseError, null},
-        {"a number", "42", rpc::InvalidRequest, null},
-        {"a string", R"("hello")", rpc::InvalidRequest, null},
-        {"a batch", R"([{"jsonrpc":"2.0","id":1,"method":"m"}])", rpc::InvalidRequest, null},
-        {"empty batch", "[]", rpc::InvalidRequest, null},
-        {"request nested one level too deep", R"({"jsonrpc":"2.0","id":"d","method":"m","params":)" + nested(rpc::kMaxNestingDepth) + "}",
-         rpc::ParseError, QJsonValue("d")},
-        {"deep request with a bad id", R"({"jsonrpc":"2.0","id":[],"method":"m","params":)" + nested(500) + "}", rpc::ParseError, null},
-        {"notification nested too deep", R"({"jsonrpc":"2.0","method":"m","params":)" + nested(100000) + "}", rpc::ParseError, std::nullopt},
-        {"batch nested too deep", nested(100000), rpc::ParseError, null},
-        {"deep and invalid UTF-8", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":2,\"method\":\"\xff\",\"params\":") + nested(70) + "}",
-         rpc::ParseError, QJsonValue(2)},
-        {"missing version", R"({"id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
-        {"version 1.0", R"({"jsonrpc":"1.0","id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
-        {"numeric version", R"({"jsonrpc":2.0,"id":"x","method":"m"})", rpc::InvalidRequest, QJsonValue("x")},
-        {"method a number", R"({"jsonrpc":"2.0","id":3,"method":12})", rpc::InvalidRequest, QJsonValue(3)},
-        {"method null", R"({"jsonrpc":"2.0","id":3,"method":null})", rpc::InvalidRequest, QJsonValue(3)},
-        {"method empty", R"({"jsonrpc":"2.0","id":3,"method":""})", rpc::InvalidRequest, QJsonValue(3)},
-        {"method an object in a notification", R"({"jsonrpc":"2.0","method":{}})", rpc::InvalidRequest, std::nullopt},
-        {"id an object", R"({"jsonrpc":"2.0","id":{},"method":"m"})", rpc::InvalidRequest, null},
-        {"id an array", R"({"jsonrpc":"2.0","id":[1],"method":"m"})", rpc::InvalidRequest, null},
-        {"id a boolean", R"({"jsonrpc":"2.0","id":true,"method":"m"})", rpc::InvalidRequest, null},
-        {"params a string", R"({"jsonrpc":"2.0","id":4,"method":"m","params":"x"})", rpc::InvalidRequest, QJsonValue(4)},
-        {"params a number", R"({"jsonrpc":"2.0","method":"m","params":5})", rpc::InvalidRequest, std::nullopt},
-        {"params null", R"({"jsonrpc":"2.0","id":4,"method":"m","params":null})", rpc::InvalidRequest, QJsonValue(4)},
-        {"method and result", R"({"jsonrpc":"2.0","id":4,"method":"m","result":1})", rpc::InvalidRequest, QJsonValue(4)},
-        {"no method, with an id", R"({"jsonrpc":"2.0","id":4})", rpc::InvalidRequest, QJsonValue(4)},
-        {"no method, with a bad id", R"({"jsonrpc":"2.0","id":{"a":1}})", rpc::InvalidRequest, null},
-        {"no method and no id", R"({"jsonrpc":"2.0"})", rpc::InvalidRequest, null},
-        {"empty object", "{}", rpc::InvalidRequest, null},
-        {"result and error", R"({"jsonrpc":"2.0","id":4,"result":1,"error":{"code":1,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
-        {"result without id", R"({"jsonrpc":"2.0","result":1})", rpc::InvalidRequest, std::nullopt},
-        {"result for a null id", R"({"jsonrpc":"2.0","id":null,"result":1})", rpc::InvalidRequest, std::nullopt},
-        {"error a string", R"({"jsonrpc":"2.0","id":4,"error":"bad"})", rpc::InvalidRequest, std::nullopt},
-        {"error code a string", R"({"jsonrpc":"2.0","id":4,"error":{"code":"1","message":"m"}})", rpc::InvalidRequest, std::nullopt},
-        {"error code fractional", R"({"jsonrpc":"2.0","id":4,"error":{"code":1.5,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
-        {"error code out of range", R"({"jsonrpc":"2.0","id":4,"error":{"code":1e12,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
-        {"error message missing", R"({"jsonrpc":"2.0","id":4,"error":{"code":1}})", rpc::InvalidRequest, std::nullopt},
-    };
-    for (const Case &c : cases) {
-        SCOPED_TRACE(c.name);
-        const rpc::ParseResult result = rpc::parseMessage(c.payload);
-        EXPECT_FALSE(result.ok());
-        EXPECT_EQ(result.errorCode, c.code);
-        EXPECT_FALSE(result.errorText.isEmpty());
-        EXPECT_EQ(result.answerId, c.answerId);
-    }
+    const rpc::ParseResult result = rpc::parseMessage(GetParam().payload);
+    EXPECT_FALSE(result.ok());
+    EXPECT_EQ(result.errorCode, GetParam().code);
+    EXPECT_FALSE(result.errorText.isEmpty());
+    EXPECT_EQ(result.answerId, GetParam().answerId);
 }
 
-TEST(JsonRpc, MutatedAndRandomPayloadsNeverCrashAndAlwaysExplainARefusal)
+const QJsonValue null(QJsonValue::Null);
+QByteArray nested(int levels)
+{
+    return QByteArray(levels, '[') + QByteArray(levels, ']');
+}
+
+INSTANTIATE_TEST_SUITE_P(Payloads, JsonRpcRefusalTest, ::testing::Values(
+    Refusal{"EmptyPayload", "", rpc::ParseError, null},
+    Refusal{"TruncatedJSON", R"({"jsonrpc":"2.0","id":1,"meth)", rpc::ParseError, null},
+    Refusal{"InvalidUtf8InANotification", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"m\xff\xfe\"}"), rpc::ParseError, std::nullopt},
+    Refusal{"InvalidUtf8InARequest", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":8,\"method\":\"m\xff\xfe\"}"), rpc::ParseError, QJsonValue(8)},
+    Refusal{"InvalidUtf8InAResponse", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":8,\"result\":\"\xff\"}"), rpc::ParseError, std::nullopt},
+    Refusal{"InvalidUtf8AndJSON", QByteArray("\xff\xfe{"), rpc::ParseError, null},
+    Refusal{"OverlongUtf8Encoding", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xc0\xaf\"}"), rpc::ParseError, std::nullopt},
+    Refusal{"LoneSurrogateInUtf8", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":\"s\",\"method\":\"\xed\xa0\x80\"}"), rpc::ParseError, QJsonValue("s")},
+    Refusal{"TrailingGarbage", R"({"jsonrpc":"2.0","method":"m"} x)", rpc::ParseError, null},
+    Refusal{"ANumber", "42", rpc::InvalidRequest, null},
+    Refusal{"AString", R"("hello")", rpc::InvalidRequest, null},
+    Refusal{"ABatch", R"([{"jsonrpc":"2.0","id":1,"method":"m"}])", rpc::InvalidRequest, null},
+    Refusal{"EmptyBatch", "[]", rpc::InvalidRequest, null},
+    Refusal{"RequestNestedOneLevelTooDeep", R"({"jsonrpc":"2.0","id":"d","method":"m","params":)" + nested(rpc::kMaxNestingDepth) + "}",
+        rpc::ParseError, QJsonValue("d")},
+    Refusal{"DeepRequestWithABadId", R"({"jsonrpc":"2.0","id":[],"method":"m","params":)" + nested(500) + "}", rpc::ParseError, null},
+    Refusal{"NotificationNestedTooDeep", R"({"jsonrpc":"2.0","method":"m","params":)" + nested(100000) + "}", rpc::ParseError, std::nullopt},
+    Refusal{"BatchNestedTooDeep", nested(100000), rpc::ParseError, null},
+    Refusal{"DeepAndInvalidUtf8", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":2,\"method\":\"\xff\",\"params\":") + nested(70) + "}",
+        rpc::ParseError, QJsonValue(2)},
+    Refusal{"MissingVersion", R"({"id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
+    Refusal{"Version1", R"({"jsonrpc":"1.0","id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
+    Refusal{"NumericVersion", R"({"jsonrpc":2.0,"id":"x","method":"m"})", rpc::InvalidRequest, QJsonValue("x")},
+    Refusal{"MethodANumber", R"({"jsonrpc":"2.0","id":3,"method":12})", rpc::InvalidRequest, QJsonValue(3)},
+    Refusal{"MethodNull", R"({"jsonrpc":"2.0","id":3,"method":null})", rpc::InvalidRequest, QJsonValue(3)},
+    Refusal{"MethodEmpty", R"({"jsonrpc":"2.0","id":3,"method":""})", rpc::InvalidRequest, QJsonValue(3)},
+    Refusal{"MethodAnObjectInANotification", R"({"jsonrpc":"2.0","method":{}})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"IdAnObject", R"({"jsonrpc":"2.0","id":{},"method":"m"})", rpc::InvalidRequest, null},
+    Refusal{"IdAnArray", R"({"jsonrpc":"2.0","id":[1],"method":"m"})", rpc::InvalidRequest, null},
+    Refusal{"IdABoolean", R"({"jsonrpc":"2.0","id":true,"method":"m"})", rpc::InvalidRequest, null},
+    Refusal{"ParamsAString", R"({"jsonrpc":"2.0","id":4,"method":"m","params":"x"})", rpc::InvalidRequest, QJsonValue(4)},
+    Refusal{"ParamsANumber", R"({"jsonrpc":"2.0","method":"m","params":5})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"ParamsNull", R"({"jsonrpc":"2.0","id":4,"method":"m","params":null})", rpc::InvalidRequest, QJsonValue(4)},
+    Refusal{"MethodAndResult", R"({"jsonrpc":"2.0","id":4,"method":"m","result":1})", rpc::InvalidRequest, QJsonValue(4)},
+    Refusal{"NoMethodWithAnId", R"({"jsonrpc":"2.0","id":4})", rpc::InvalidRequest, QJsonValue(4)},
+    Refusal{"NoMethodWithABadId", R"({"jsonrpc":"2.0","id":{"a":1}})", rpc::InvalidRequest, null},
+    Refusal{"NoMethodAndNoId", R"({"jsonrpc":"2.0"})", rpc::InvalidRequest, null},
+    Refusal{"EmptyObject", "{}", rpc::InvalidRequest, null},
+    Refusal{"ResultAndError", R"({"jsonrpc":"2.0","id":4,"result":1,"error":{"code":1,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"ResultWithoutId", R"({"jsonrpc":"2.0","result":1})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"ResultForANullId", R"({"jsonrpc":"2.0","id":null,"result":1})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"ErrorAString", R"({"jsonrpc":"2.0","id":4,"error":"bad"})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"ErrorCodeAString", R"({"jsonrpc":"2.0","id":4,"error":{"code":"1","message":"m"}})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"ErrorCodeFractional", R"({"jsonrpc":"2.0","id":4,"error":{"code":1.5,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"ErrorCodeOutOfRange", R"({"jsonrpc":"2.0","id":4,"error":{"code":1e12,"message":"m"}})", rpc::InvalidRequest, std::nullopt},
+    Refusal{"ErrorMessageMissing", R"({"jsonrpc":"2.0","id":4,"error":{"code":1}})", rpc::InvalidRequest, std::nullopt}), caseName);
+
+TEST(JsonRpc, RandomPayloadRefusalsAreExplained)
 {
     const QByteArray valid = R"({"jsonrpc":"2.0","id":1,"method":"beginExtensionRequest","params":{"inputItems":[{"title":"t","attachments":[{"type":"text/plain","value":"v"}]}]}})";
     std::mt19937 random(99);

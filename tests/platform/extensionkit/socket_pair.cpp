@@ -76,6 +76,14 @@ QList<QJsonObject> SocketPair::readMessages(int count, int timeoutMs)
     }
 }
 
+std::optional<std::pair<QJsonValue, int>> SocketPair::readErrorAnswer()
+{
+    const QList<QJsonObject> answers = readMessages(1);
+    if (answers.isEmpty())
+        return std::nullopt;
+    return std::pair(answers[0].value("id"), answers[0].value("error").toObject().value("code").toInt());
+}
+
 bool SocketPair::nothingToRead(int settleMs)
 {
     waitUntil([] { return false; }, settleMs);

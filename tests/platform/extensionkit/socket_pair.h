@@ -9,6 +9,7 @@
 #include <QJsonObject>
 #include <QList>
 
+#include <optional>
 #include <utility>
 
 namespace zaf::test {
@@ -21,6 +22,7 @@ public:
     SocketPair &operator=(const SocketPair &) = delete;
 
     int extensionFd() const { return m_fds[0]; }
+    int hostFd() const { return m_fds[1]; }
     // Gives the extension's end away to whatever takes ownership of it.
     int releaseExtensionFd() { return std::exchange(m_fds[0], -1); }
     void closeHost();
@@ -32,6 +34,8 @@ public:
     // Runs the event loop until `count` messages have arrived or `timeoutMs` has passed; returns
     // those read so far (possibly fewer).
     QList<QJsonObject> readMessages(int count, int timeoutMs = 5000);
+    // The id and code of the next message, a JSON-RPC error answer; nullopt when none arrives.
+    std::optional<std::pair<QJsonValue, int>> readErrorAnswer();
     // True when nothing arrives while the event loop runs for `settleMs`.
     bool nothingToRead(int settleMs = 50);
 
