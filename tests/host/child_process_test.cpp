@@ -9,7 +9,6 @@
 #include "tests/support/temp_dir.h"
 #include "tests/support/wait_until.h"
 
-#include <QDeadlineTimer>
 #include <QScopeGuard>
 
 #include <gtest/gtest.h>
@@ -43,15 +42,13 @@ host::ChildSpec script(const QString &text, int fd, const QList<QByteArray> &env
     return {"/bin/sh", {"-c", text}, environment, fd};
 }
 
-// Everything written to `fd` until its end (bounded).
+// Everything written to `fd` until its end (each wait bounded).
 QByteArray readToEnd(int fd)
 {
     QByteArray all;
     char buffer[4096];
-    for (QDeadlineTimer deadline(20000); !deadline.hasExpired();) {
-        pollfd pfd{fd, POLLIN, 0};
-        if (::poll(&pfd, 1, 100) <= 0)
-            continue;
+    pollfd pfd{fd, POLLIN, 0};
+    while (::poll(&pfd, 1, 20000) > 0) {
         const ssize_t n = ::read(fd, buffer, sizeof buffer);
         if (n <= 0)
             break;
@@ -60,12 +57,7 @@ QByteArray readToEnd(int fd)
     return all;
 }
 
-struct ExitCase {
-    const char *name;
-    const char *script;
-    int exitCode;
-    bool crashed;
-};
+struct ExitCase { const char *name; const char *script; int exitCode; bool crashed; };
 
 class ChildExitTest : public ::testing::TestWithParam<ExitCase> {};
 
@@ -89,11 +81,7 @@ INSTANTIATE_TEST_SUITE_P(Ends, ChildExitTest, ::testing::Values(
 // What a child started while the host ignores SIGPIPE, blocks SIGUSR1, holds a descriptor open
 // across exec and has ZAF_PROBE=host and ZAF_MARKER=inherited writes to the descriptor it was
 // handed.
-struct FindsCase {
-    const char *name;
-    const char *script;
-    const char *written;
-};
+struct FindsCase { const char *name; const char *script; const char *written; };
 
 class ChildFindsTest : public ::testing::TestWithParam<FindsCase> {};
 
@@ -129,10 +117,7 @@ INSTANTIATE_TEST_SUITE_P(Setups, ChildFindsTest, ::testing::Values(
     FindsCase{"SigpipeAtItsDefault", "set -- $(grep SigIgn /proc/self/status); echo $((0x$2 >> 12 & 1)) >&3", "0\n"},
     FindsCase{"NoBlockedSignal", "set -- $(grep SigBlk /proc/self/status); echo $((0x$2)) >&3", "0\n"}), caseName);
 
-struct StartFailure {
-    const char *name;
-    std::function<QString(const ScratchDir &)> program;
-};
+struct StartFailure { const char *name; std::function<QString(const ScratchDir &)> program; };
 
 class ChildStartFailureTest : public ::testing::TestWithParam<StartFailure> {};
 
@@ -165,13 +150,7 @@ TEST(ChildProcess, SecondStartIsRefused)
 // write end the test has closed: one that takes that end as its cue exits by itself; one that
 // hangs gets SIGTERM; one that ignores SIGTERM gets SIGKILL. Each is reaped before the destructor
 // returns, which emits nothing.
-struct TerminationCase {
-    const char *name;
-    const char *script;
-    int graceMs;
-    bool term;
-    bool kill;
-};
+struct TerminationCase { const char *name; const char *script; int graceMs; bool term; bool kill; };
 
 class ChildTerminationTest : public ::testing::TestWithParam<TerminationCase> {};
 

@@ -40,12 +40,7 @@ QList<host::InputItem> requiredItems()
 }
 
 // A table row: the fake's steps and a text the outcome must hold (or an exit code).
-struct StepsCase {
-    const char *name;
-    const char *steps;
-    const char *text = "";
-    int exitCode = 0;
-};
+struct StepsCase { const char *name; const char *steps; const char *text = ""; int exitCode = 0; };
 
 struct RecordedSession {
     RecordedSession()

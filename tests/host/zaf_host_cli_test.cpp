@@ -10,11 +10,7 @@
 namespace zaf::test {
 namespace {
 
-struct HostRun {
-    int exitCode = -1;
-    QString out;
-    QString err;
-};
+struct HostRun { int exitCode = -1; QString out; QString err; };
 
 // Runs zaf-host with `args`, the fake's steps and (when not empty) $ZAF_EXTENSION_PATH.
 HostRun runHost(const QStringList &args, const QString &fakeSteps = {}, const QString &extensionPath = {})

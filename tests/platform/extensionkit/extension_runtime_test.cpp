@@ -179,15 +179,29 @@ TEST_F(RuntimeTest, ClosingTheWindowOnlyCallsTheHandler)
     EXPECT_EQ(finishedCount, 0);
 }
 
-TEST_F(RuntimeTest, RemovalMakesTheViewDisappearThenFinishes)
+// The view shown, the host removes it by message, by closing the channel or by making it unusable
+// (an oversized frame): the view disappears, then the runtime finishes.
+class RuntimeRemovalTest : public RuntimeTest, public ::testing::WithParamInterface<std::pair<const char *, QByteArray>> {};
+
+TEST_P(RuntimeRemovalTest, MakesTheViewDisappearThenFinishes)
 {
     begin();
     recorder->calls.clear();
-    pair.writeMessage(rpc::makeNotification("removeExtensionView"));
+    if (GetParam().second.isEmpty())
+        pair.closeHost();
+    else
+        pair.writeRaw(GetParam().second);
     ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
     EXPECT_EQ(recorder->calls, (QStringList{"viewWillDisappear", "viewDidDisappear", "finished"}));
     EXPECT_FALSE(runtime->window()->isVisible());
+    EXPECT_TRUE(runtime->isFinished());
 }
+
+INSTANTIATE_TEST_SUITE_P(Ways, RuntimeRemovalTest, ::testing::Values(
+    std::pair("Message", zaf::extensionkit::encodeFrame(rpc::serialize(rpc::makeNotification("removeExtensionView")))),
+    std::pair("ChannelEnd", QByteArray()),
+    std::pair("OversizedFrame", QByteArray::fromHex("ffffffff") + QByteArray(1000, 'x'))),
+    [](const auto &info) { return std::string(info.param.first); });
 
 TEST_F(RuntimeTest, ChannelClosingAfterTheRemovalChangesNothing)
 {
@@ -253,18 +267,6 @@ TEST_F(RuntimeTest, SecondRequestIsRefused)
     EXPECT_EQ(finishedCount, 0);
 }
 
-TEST_F(RuntimeTest, OversizedFrameClosesTheChannelWhichRemovesTheView)
-{
-    zaf::test::LogCapture logs;
-    begin();
-    recorder->calls.clear();
-    pair.writeRaw(QByteArray::fromHex("ffffffff") + QByteArray(1000, 'x'));
-    ASSERT_TRUE(waitUntil([&] { return finishedCount > 0; }));
-    EXPECT_EQ(recorder->calls, (QStringList{"viewWillDisappear", "viewDidDisappear", "finished"}));
-    EXPECT_TRUE(runtime->isFinished());
-    EXPECT_FALSE(logs.messages("zaf.extensionkit").filter("exceeds the limit").isEmpty());
-}
-
 TEST_F(RuntimeTest, ProxyDeliversOneWayMessagesFromAnyThread)
 {
     begin();
@@ -323,11 +325,7 @@ TEST(RuntimeStart, FailsWithoutADescriptor)
 
 // The extension main routine refuses a missing or unusable channel descriptor: it returns before
 // any application object is made, so it runs inside this test program.
-struct ChannelVariable {
-    const char *name;
-    std::function<std::optional<QByteArray>()> value;
-    const char *reason;
-};
+struct ChannelVariable { const char *name; std::function<std::optional<QByteArray>()> value; const char *reason; };
 
 class ExtensionMainTest : public ::testing::TestWithParam<ChannelVariable> {};
 

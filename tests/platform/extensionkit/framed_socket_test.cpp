@@ -74,12 +74,7 @@ TEST(FramedSocket, FramesSplitAcrossReadsArriveWholeInOrder)
     EXPECT_TRUE(h.protocolErrors.isEmpty());
 }
 
-struct BadFrame {
-    const char *name;
-    QByteArray tail;
-    bool peerCloses;
-    const char *error;
-};
+struct BadFrame { const char *name; QByteArray tail; bool peerCloses; const char *error; };
 
 class FramedSocketBadFrameTest : public ::testing::TestWithParam<BadFrame> {};
 

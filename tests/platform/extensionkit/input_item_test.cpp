@@ -76,12 +76,7 @@ INSTANTIATE_TEST_SUITE_P(Strings, BadHexColorTest, ::testing::Values(
 
 // An attachment of a MIME type conforms to that type (case and parameters aside) and to the generic
 // data type, and to nothing else.
-struct Conformance {
-    const char *name;
-    const char *type;
-    const char *asked;
-    bool conforms;
-};
+struct Conformance { const char *name; const char *type; const char *asked; bool conforms; };
 
 class ItemAttachmentConformanceTest : public ::testing::TestWithParam<Conformance> {};
 

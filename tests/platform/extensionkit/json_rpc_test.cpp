@@ -91,12 +91,7 @@ TEST(JsonRpc, MakersLeaveOutWhatCannotBeSent)
 }
 
 // Each refusal: the code, and the id an answer must carry (nullopt when it must not be answered).
-struct Refusal {
-    const char *name;
-    QByteArray payload;
-    int code;
-    std::optional<QJsonValue> answerId;
-};
+struct Refusal { const char *name; QByteArray payload; int code; std::optional<QJsonValue> answerId; };
 
 class JsonRpcRefusalTest : public ::testing::TestWithParam<Refusal> {};
 
