@@ -17,8 +17,6 @@
 
 #include <sys/socket.h>
 
-Q_LOGGING_CATEGORY(lcHost, "zaf.host")
-
 namespace zaf::host {
 
 static_assert(kChildChannelFd == kHandedFd);

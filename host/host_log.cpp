@@ -1,0 +1,3 @@
+#include "host/host_log.h"
+
+Q_LOGGING_CATEGORY(lcHost, "zaf.host")
