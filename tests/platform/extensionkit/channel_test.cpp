@@ -22,8 +22,6 @@ using zaf::test::SocketPair;
 using zaf::test::waitUntil;
 namespace rpc = zaf::extensionkit::jsonrpc;
 
-ZAF_PRINT_CASES_AS_NAMES
-
 namespace {
 
 // A started channel on the extension's end of a socket pair, recording every signal.
@@ -71,6 +69,8 @@ TEST_F(ChannelTest, AnswersReachTheHostInOrder)
                                                         rpc::makeNotification("extensionDidFinishWithActivityTypes", QJsonArray{QJsonArray{"x"}}),
                                                         rpc::makeError(2, rpc::MethodNotFound, "no")}));
 }
+
+ZAF_PRINT_CASES_AS_NAMES
 
 // A malformed frame is logged and reported, and answered with the request's id where it can be read,
 // null where not, never for notifications and responses; the next request still comes through.
