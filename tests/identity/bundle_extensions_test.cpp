@@ -1,6 +1,11 @@
 // The recording framework's bundle operations: names, localization choice and text lookup.
 #include "identity/bundle_extensions.h"
-#include "tests/identity/identity_test_support.h"
+#include "tests/platform/bundle/bundle_fixtures.h"
+#include "tests/support/temp_dir.h"
+
+#include <QDir>
+#include <QFile>
+#include <gtest/gtest.h>
 
 namespace zaf::test {
 namespace {
@@ -18,13 +23,12 @@ protected:
     QString framework() const { return scratch.file(QStringLiteral("Zafrel")); }
     void writeText(const char *localization, const char *key, const char *text) const
     {
-        writeTable(framework(), QString::fromLatin1(localization), QStringLiteral("Localizable"),
-                   {{QString::fromLatin1(key), QString::fromUtf8(text)}});
+        bundle::test::writeTable(framework(), QString::fromLatin1(localization), QStringLiteral("Localizable"),
+                                 {{QString::fromLatin1(key), QString::fromUtf8(text)}});
     }
     ScratchDir scratch;
 };
 
-// A regional preference without its own folder is served by the bare language's folder.
 TEST_F(FrameworkBundleTest, RegionalLanguageFallsBackToTheBareLanguagesFolder)
 {
     writeText("en", "HELLO", "Hello");
@@ -37,7 +41,7 @@ TEST_F(FrameworkBundleTest, RegionalLanguageFallsBackToTheBareLanguagesFolder)
     EXPECT_EQ(frameworkText("HELLO"), QStringLiteral("Hello"));
 }
 
-// The chosen localization answers alone: a key it lacks comes back as the key.
+// The chosen localization answers alone.
 TEST_F(FrameworkBundleTest, KeyMissingFromTheChosenLocalizationComesBackAsTheKey)
 {
     writeText("pt_BR", "OTHER", "Outro");
@@ -63,30 +67,16 @@ TEST_F(FrameworkBundleTest, MissingFrameworkBundleAnswersNothing)
     EXPECT_FALSE(frameworkText("HELLO").has_value());
 }
 
-// The shipped share text takes the name and the author in every shipped language.
-class ShippedFrameworkBundle : public ::testing::TestWithParam<const char *> {};
-
-TEST_P(ShippedFrameworkBundle, ShareTextTakesTheNameAndTheAuthor)
-{
-    qputenv("ZAF_FRAMEWORK_BUNDLE_PATH", ZAF_SHIPPED_FRAMEWORK_BUNDLE);
-    bundle::setPreferredLanguagesForTesting({QString::fromLatin1(GetParam())});
-    const QString format = frameworkText("SHARE_TEXT_FORMAT").value_or(QString());
-    EXPECT_TRUE(format.contains(QStringLiteral("%1$@")) && format.contains(QStringLiteral("%2$@"))) << format.toStdString();
-}
-
-INSTANTIATE_TEST_SUITE_P(Languages, ShippedFrameworkBundle, kShippedLanguages, languageName);
-
-// Display names: the localized name first, then the plain one; an unknown identifier has none and a
-// bundle without any name gives "".
+// An unknown identifier has none and a bundle without any name gives "".
 TEST(BundleNames, DisplayNameIsTheLocalizedOneThenThePlainOne)
 {
     ScratchDir scratch;
     const QString data = scratch.file(QStringLiteral("data"));
     qputenv("XDG_DATA_HOME", QFile::encodeName(data));
     qputenv("XDG_DATA_DIRS", QFile::encodeName(scratch.file(QStringLiteral("none"))));
-    writeDesktopEntry(data, QStringLiteral("org.example.Localized"),
-                      QStringLiteral("Name=Recorder\nName[de]=Aufnahme\nExec=/usr/bin/recorder %U\n"));
-    writeDesktopEntry(data, QStringLiteral("org.example.Plain"), QStringLiteral("Name=Plain Recorder\nExec=plainrec\n"));
+    bundle::test::writeDesktopEntry(data, QStringLiteral("org.example.Localized"),
+                                    QStringLiteral("Name=Recorder\nName[de]=Aufnahme\nExec=/usr/bin/recorder %U\n"));
+    bundle::test::writeDesktopEntry(data, QStringLiteral("org.example.Plain"), QStringLiteral("Name=Plain Recorder\nExec=plainrec\n"));
     bundle::setPreferredLanguagesForTesting({QStringLiteral("de-DE")});
     EXPECT_EQ(ZafBundleExtensions::_zafLocalizedAppNameFromBundleID(QStringLiteral("org.example.Localized")), QStringLiteral("Aufnahme"));
     EXPECT_EQ(ZafBundleExtensions::_zafLocalizedAppNameFromBundleID(QStringLiteral("org.example.Plain")), QStringLiteral("Plain Recorder"));
@@ -97,7 +87,7 @@ TEST(BundleNames, DisplayNameIsTheLocalizedOneThenThePlainOne)
     EXPECT_EQ(ZafBundleExtensions::_zafLocalizedAppName(*nameless), QStringLiteral(""));
 }
 
-// The base identifier drops the last component; no process has a bundle of pid -1.
+// No process has a bundle of pid -1.
 TEST(BundleNames, BaseIdentifierDropsTheLastComponent)
 {
     EXPECT_EQ(ZafBundleExtensions::baseIdentifier(QStringLiteral("com.example.app")), QStringLiteral("com.example"));

@@ -50,4 +50,15 @@ void writeExecutable(const QString &path)
     QFile::setPermissions(path, QFile::permissions(path) | QFile::ExeOwner | QFile::ReadOwner);
 }
 
+void writeTable(const QString &bundleDir, const QString &localization, const QString &table,
+                const QList<std::pair<QString, QString>> &pairs)
+{
+    writeFile(QStringLiteral("%1/%2.lproj/%3.mo").arg(bundleDir, localization, table), compilePo(poSource(pairs)));
+}
+
+void writeDesktopEntry(const QString &dataDir, const QString &id, const QString &body)
+{
+    writeFile(QStringLiteral("%1/applications/%2.desktop").arg(dataDir, id), ("[Desktop Entry]\nType=Application\n" + body).toUtf8());
+}
+
 } // namespace zaf::bundle::test

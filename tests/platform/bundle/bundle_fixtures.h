@@ -1,7 +1,7 @@
 #pragma once
 
-// Fixtures for the bundle tests: gettext catalogues compiled with msgfmt at test time, scratch files,
-// and environment settings undone at the end of a scope.
+// Fixtures for the bundle and identity tests: string tables compiled with msgfmt at test time,
+// desktop entries, scratch files, and settings undone at the end of a scope.
 
 #include "platform/bundle/bundle.h"
 
@@ -9,8 +9,6 @@
 #include <QString>
 #include <QStringList>
 
-#include <ostream>
-#include <string>
 #include <utility>
 
 namespace zaf::bundle::test {
@@ -26,6 +24,11 @@ QByteArray poSource(const QList<std::pair<QString, QString>> &messages);
 void writeFile(const QString &path, const QByteArray &contents);
 // Writes an executable shell script that does nothing.
 void writeExecutable(const QString &path);
+// Writes BUNDLE/LOCALIZATION.lproj/TABLE.mo holding the pairs.
+void writeTable(const QString &bundleDir, const QString &localization, const QString &table,
+                const QList<std::pair<QString, QString>> &pairs);
+// Writes an application's desktop entry DATA/applications/ID.desktop with this body after its Type.
+void writeDesktopEntry(const QString &dataDir, const QString &id, const QString &body);
 
 // Sets an environment variable for the lifetime of the object, then restores it.
 class ScopedEnvironment {
@@ -44,15 +47,6 @@ private:
     bool m_wasSet;
     QByteArray m_previous;
 };
-
-// Names a TEST_P case after its parameter's `name`, and prints the parameter as that name.
-struct CaseName {
-    template <typename Info>
-    std::string operator()(const Info &info) const { return info.param.name; }
-};
-template <typename Case>
-    requires requires(const Case &c) { c.name; }
-void PrintTo(const Case &c, std::ostream *os) { *os << c.name; }
 
 // Sets the preferred languages for the lifetime of the object.
 struct ScopedPreferredLanguages {

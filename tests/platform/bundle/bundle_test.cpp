@@ -1,8 +1,8 @@
-// Directory bundles with an information dictionary and string tables, and the executable of a
-// process. Application bundles from desktop entries: desktop_entry_test.cpp.
+// Directory bundles and the executable of a process (application bundles: desktop_entry_test.cpp).
 #include "platform/bundle/bundle.h"
 #include "tests/platform/bundle/bundle_fixtures.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/named_cases.h"
 
 #include <QCoreApplication>
 #include <QDir>
@@ -15,8 +15,7 @@
 namespace zaf::bundle {
 namespace {
 
-using test::PrintTo;
-
+ZAF_PRINT_CASES_AS_NAMES
 using test::ScopedPreferredLanguages;
 
 QString displayName(const QVariantMap &info)
@@ -34,11 +33,9 @@ protected:
         m_resources = m_path + QStringLiteral("/Resources");
         test::writeFile(m_path + QStringLiteral("/Info.desktop"),
                         "[Desktop Entry]\nType=Service\nName=Zafrel\nName[de]=Zafrel DE\nX-Zaf-Identifier=org.example.Zafrel\n");
-        const auto table = [](const QList<std::pair<QString, QString>> &pairs) { return test::compilePo(test::poSource(pairs)); };
-        test::writeFile(m_resources + QStringLiteral("/de.lproj/Localizable.mo"),
-                        table({{QStringLiteral("HELLO"), QStringLiteral("Hallo")}, {QStringLiteral("ONLY_DE"), QStringLiteral("Nur Deutsch")}}));
-        test::writeFile(m_resources + QStringLiteral("/de.lproj/Other.mo"), table({{QStringLiteral("HELLO"), QStringLiteral("Servus")}}));
-        test::writeFile(m_resources + QStringLiteral("/en.lproj/Localizable.mo"), table({{QStringLiteral("HELLO"), QStringLiteral("Hello")}}));
+        test::writeTable(m_resources, "de", "Localizable", {{"HELLO", "Hallo"}, {"ONLY_DE", "Nur Deutsch"}});
+        test::writeTable(m_resources, "de", "Other", {{"HELLO", "Servus"}});
+        test::writeTable(m_resources, "en", "Localizable", {{"HELLO", "Hello"}});
         test::writeFile(m_resources + QStringLiteral("/pt_BR.lproj/Localizable.mo"), "corrupt catalogue bytes, long enough for a header");
         ASSERT_TRUE(QDir().mkpath(m_resources + QStringLiteral("/not-a-localization")));
         m_bundle = Bundle::bundleWithPath(m_path);
@@ -50,7 +47,6 @@ protected:
     std::shared_ptr<Bundle> m_bundle;
 };
 
-// The bundle has its identifier, its information (localized too), its resources and localizations.
 TEST_F(DirectoryBundleTest, OpensWithWhatItsDirectoryHolds)
 {
     EXPECT_EQ(m_bundle->bundlePath(), m_path);
@@ -72,7 +68,6 @@ TEST_F(DirectoryBundleTest, PathForResourceFindsTheResourceInItsLocalization)
     EXPECT_EQ(m_bundle->pathForResource(QStringLiteral("Info"), QStringLiteral("plist"), QString()), QString());
 }
 
-// Paths that are no bundle give none: a missing one, an entry that is no application, an empty one.
 TEST_F(DirectoryBundleTest, PathsThatAreNoBundleGiveNone)
 {
     EXPECT_FALSE(Bundle::bundleWithPath(m_root.filePath(QStringLiteral("missing"))));
@@ -80,7 +75,7 @@ TEST_F(DirectoryBundleTest, PathsThatAreNoBundleGiveNone)
     EXPECT_FALSE(Bundle::bundleWithPath(QString()));
 }
 
-// A bare localization folder is a bundle of its own whose table answers whatever the languages.
+// Its table answers whatever the languages.
 TEST_F(DirectoryBundleTest, ABareLocalizationFolderIsABundle)
 {
     const auto bare = Bundle::bundleWithPath(m_resources + QStringLiteral("/de.lproj"));
@@ -93,7 +88,7 @@ TEST_F(DirectoryBundleTest, ABareLocalizationFolderIsABundle)
     EXPECT_EQ(bare->localizedStringForKey(QStringLiteral("MISSING"), QString(), QString()), QStringLiteral("MISSING"));
 }
 
-// A malformed information dictionary is logged and leaves the bundle without one, but usable.
+// Logged, and the bundle has no information.
 TEST_F(DirectoryBundleTest, AMalformedInformationFileLeavesTheBundleUsable)
 {
     test::writeFile(m_path + QStringLiteral("/Info.desktop"), "[Desktop Entry\nName=broken\n");
@@ -113,7 +108,7 @@ struct LookupCase {
 
 class LookupTest : public DirectoryBundleTest, public ::testing::WithParamInterface<LookupCase> {};
 
-// Lookups use the best localization's table alone, then the value, then the key.
+// The best localization's table alone, then the value, then the key.
 TEST_P(LookupTest, UsesTheBestLocalizationThenTheValueThenTheKey)
 {
     const LookupCase &c = GetParam();
@@ -132,9 +127,9 @@ INSTANTIATE_TEST_SUITE_P(Lookups, LookupTest, ::testing::Values(
     LookupCase{"English", "en-GB", "HELLO", "", "", "Hello"},
     LookupCase{"NoFallbackToAnotherLocalization", "en-GB", "ONLY_DE", "", "", "ONLY_DE"},
     LookupCase{"CorruptTable", "pt-BR", "HELLO", "", "", "HELLO"},
-    LookupCase{"CorruptTableGivesTheValue", "pt-BR", "HELLO", "Olá", "", "Olá"}), test::CaseName());
+    LookupCase{"CorruptTableGivesTheValue", "pt-BR", "HELLO", "Olá", "", "Olá"}), zaf::test::caseName);
 
-// A corrupt table is logged once, with the reason, however often it is looked in.
+// However often it is looked in, with the reason.
 TEST_F(DirectoryBundleTest, ACorruptTableIsLoggedOnce)
 {
     zaf::test::LogCapture log;
@@ -146,7 +141,6 @@ TEST_F(DirectoryBundleTest, ACorruptTableIsLoggedOnce)
     EXPECT_TRUE(messages.first().contains(QStringLiteral("magic"))) << messages.first().toStdString();
 }
 
-// The running test program is read through /proc.
 TEST(ExecutablePathOfProcessTest, ReadsTheRunningProgram)
 {
     QString path;
@@ -159,7 +153,6 @@ TEST(ExecutablePathOfProcessTest, ReadsTheRunningProgram)
 
 class UnreadableProcessTest : public ::testing::TestWithParam<pid_t> {};
 
-// Processes that cannot be read give 0 and an empty path.
 TEST_P(UnreadableProcessTest, ReadsNothing)
 {
     QString path = QStringLiteral("stale");

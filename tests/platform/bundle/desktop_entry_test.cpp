@@ -1,9 +1,9 @@
-// Desktop entries and the application bundles they give, in scratch XDG directories: names and
-// their translations, the lookup by identifier and by program, and entries that give no bundle.
+// Desktop entries and the application bundles they give, in scratch XDG directories.
 #include "platform/bundle/bundle.h"
 #include "platform/bundle/desktop_entry.h"
 #include "tests/platform/bundle/bundle_fixtures.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/named_cases.h"
 
 #include <QFile>
 #include <QTemporaryDir>
@@ -12,8 +12,7 @@
 namespace zaf::bundle {
 namespace {
 
-using test::PrintTo;
-
+ZAF_PRINT_CASES_AS_NAMES
 using test::ScopedEnvironment;
 
 QString infoString(const std::shared_ptr<Bundle> &bundle, const char *key)
@@ -62,8 +61,7 @@ protected:
     ScopedEnvironment m_dataHome, m_dataDirs, m_path;
 };
 
-// An entry gives a bundle (a hidden one too) with its identifier, path and information: the name and
-// the program, resolved through PATH. It has no resources, so lookups answer the key.
+// A hidden entry too; the program is resolved through PATH; without resources lookups answer the key.
 TEST_F(DesktopEntryTest, AnEntryGivesAnApplicationBundle)
 {
     const auto bundle = Bundle::bundleWithIdentifier(QStringLiteral("org.example.Editor"));
@@ -105,7 +103,6 @@ TEST_P(BundleLookupTest, FindsTheApplicationsBundle)
 }
 
 INSTANTIATE_TEST_SUITE_P(Lookups, BundleLookupTest, ::testing::Values(
-    LookupCase{"Identifier", LookupCase::Identifier, "org.example.Editor", "Editor"},
     LookupCase{"HomeBeforeSystem", LookupCase::Identifier, "org.example.Both", "From home"},
     LookupCase{"SubFolderInTheIdentifier", LookupCase::Identifier, "vendor-tool", "Vendor tool"},
     LookupCase{"UnknownIdentifier", LookupCase::Identifier, "org.example.Unknown", ""},
@@ -116,7 +113,7 @@ INSTANTIATE_TEST_SUITE_P(Lookups, BundleLookupTest, ::testing::Values(
     LookupCase{"ExecProgram", LookupCase::Program, "bin/zaf-editor", "Editor"},
     LookupCase{"TryExecThroughALink", LookupCase::Program, "opt/viewer/viewer-bin", "Viewer"},
     LookupCase{"ProgramNoEntryStarts", LookupCase::Program, "opt/other", ""},
-    LookupCase{"EmptyProgram", LookupCase::Program, "", ""}), test::CaseName());
+    LookupCase{"EmptyProgram", LookupCase::Program, "", ""}), zaf::test::caseName);
 
 struct InvalidEntry {
     const char *name; // also the entry's identifier: org.example.NAME
@@ -125,7 +122,6 @@ struct InvalidEntry {
 
 class InvalidEntryTest : public DesktopEntryTest, public ::testing::WithParamInterface<InvalidEntry> {};
 
-// Entries that are no application, or broken, give none and one log line naming them.
 TEST_P(InvalidEntryTest, GivesNoBundleWithALog)
 {
     const QString id = QStringLiteral("org.example.") + QLatin1String(GetParam().name);
@@ -142,7 +138,7 @@ INSTANTIATE_TEST_SUITE_P(Entries, InvalidEntryTest, ::testing::Values(
     InvalidEntry{"Garbage", "this is not a key file\n[[[\n"},
     InvalidEntry{"NoGroup", "[Other]\nName=x\n"},
     InvalidEntry{"NoName", "[Desktop Entry]\nType=Application\nExec=/bin/true\n"},
-    InvalidEntry{"BadExec", "[Desktop Entry]\nType=Application\nName=x\nExec=\"unclosed\n"}), test::CaseName());
+    InvalidEntry{"BadExec", "[Desktop Entry]\nType=Application\nName=x\nExec=\"unclosed\n"}), zaf::test::caseName);
 
 struct LocalizedNameCase {
     const char *name;
@@ -152,7 +148,6 @@ struct LocalizedNameCase {
 
 class LocalizedNameTest : public ::testing::TestWithParam<LocalizedNameCase> {};
 
-// Name[...] keys follow the desktop-entry locale rules for each preferred language in turn.
 TEST_P(LocalizedNameTest, FollowsTheLocaleRulesForEachLanguageInTurn)
 {
     static QTemporaryDir dir;
@@ -172,9 +167,8 @@ INSTANTIATE_TEST_SUITE_P(Languages, LocalizedNameTest, ::testing::Values(
     LocalizedNameCase{"ScriptAsModifier", {"sr-Latn-RS"}, "Urednik"},
     LocalizedNameCase{"Untranslated", {"fr-FR"}, ""},
     LocalizedNameCase{"SecondLanguage", {"fr-FR", "de-CH"}, "Bearbeiter (Schweiz)"},
-    LocalizedNameCase{"FirstLanguageWins", {"de-DE", "de-CH"}, "Bearbeiter"}), test::CaseName());
+    LocalizedNameCase{"FirstLanguageWins", {"de-DE", "de-CH"}, "Bearbeiter"}), zaf::test::caseName);
 
-// A bundle's localized information holds the translated name only when there is one.
 TEST_F(DesktopEntryTest, TheLocalizedInformationHoldsOnlyATranslatedName)
 {
     const auto bundle = Bundle::bundleWithIdentifier(QStringLiteral("org.example.Editor"));

@@ -1,6 +1,7 @@
 // Ordering localizations against preferred languages, and where the preferred languages come from.
 #include "platform/bundle/localization_matching.h"
 #include "tests/platform/bundle/bundle_fixtures.h"
+#include "tests/support/named_cases.h"
 
 #include <QLocale>
 #include <gtest/gtest.h>
@@ -8,7 +9,7 @@
 namespace zaf::bundle {
 namespace {
 
-using test::PrintTo;
+ZAF_PRINT_CASES_AS_NAMES
 
 struct OrderCase {
     const char *name;
@@ -17,7 +18,6 @@ struct OrderCase {
 
 class PreferredLocalizationsTest : public ::testing::TestWithParam<OrderCase> {};
 
-// Localizations are ordered by the best match for each preference, then the rest as given.
 TEST_P(PreferredLocalizationsTest, OrdersByPreferenceThenKeepsTheRestInOrder)
 {
     EXPECT_EQ(preferredLocalizationsFromArray(GetParam().localizations, GetParam().preferences), GetParam().expected);
@@ -44,7 +44,7 @@ INSTANTIATE_TEST_SUITE_P(Orders, PreferredLocalizationsTest, ::testing::Values(
     OrderCase{"PreferenceThatIsNoTag", {"en", "de"}, {"not a tag!", "de"}, {"de", "en"}},
     // The given order breaks ties between equally good localizations.
     OrderCase{"TieKeepsTheGivenOrder", {"de_AT", "de_CH"}, {"de"}, {"de_AT", "de_CH"}},
-    OrderCase{"TieKeepsTheReversedOrder", {"de_CH", "de_AT"}, {"de"}, {"de_CH", "de_AT"}}), test::CaseName());
+    OrderCase{"TieKeepsTheReversedOrder", {"de_CH", "de_AT"}, {"de"}, {"de_CH", "de_AT"}}), zaf::test::caseName);
 
 // The system languages as tags (C and POSIX meaning English), replaced while a test override is set.
 TEST(PreferredLanguagesTest, TestOverrideReplacesTheSystemLanguagesUntilCleared)
@@ -64,7 +64,6 @@ TEST(PreferredLanguagesTest, TestOverrideReplacesTheSystemLanguagesUntilCleared)
     EXPECT_EQ(preferredLanguages(), system);
 }
 
-// The system languages follow LANGUAGE, as tags with "-".
 TEST(PreferredLanguagesTest, SystemLanguagesHonourTheLanguageVariable)
 {
     // Qt reads LANGUAGE at each request (LANG only once per process).
