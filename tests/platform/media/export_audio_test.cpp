@@ -1,13 +1,12 @@
-// ExportSession's audio: a trim lands every track's samples where they belong and copies AAC
-// packets bit for bit; a mix sums the tracks it lists at unity gain, limited below full scale.
+// ExportSession's audio: where a trim lands each track's samples, AAC copies, and mixes.
 #include "tests/platform/media/export_test_support.h"
 #include "tests/support/media/second_decoder.h"
 
 #include <QJsonArray>
 #include <QJsonDocument>
 
+#include <algorithm>
 #include <cmath>
-#include <cstring>
 
 namespace zaf::media {
 namespace {
@@ -87,18 +86,6 @@ QList<ProbedPacket> audioPackets(const QString &path, int audioIndex)
     return packets;
 }
 
-// The samples of an audio stream mixed to mono, as FFmpeg plays them (from where the edit list starts).
-QList<float> decodedSamples(const QString &path, int audioIndex)
-{
-    const ToolRun r = runTool(QStringLiteral("ffmpeg"), QStringList{QStringLiteral("-nostdin"), QStringLiteral("-v"), QStringLiteral("error"),
-                                                                   QStringLiteral("-i"), path, QStringLiteral("-map"), QStringLiteral("0:a:%1").arg(audioIndex)}
-                                                           << words("-ac 1 -c:a pcm_f32le -f f32le -"));
-    EXPECT_TRUE(r.ok()) << r.err.toStdString();
-    QList<float> samples(r.out.size() / qsizetype(sizeof(float)));
-    std::memcpy(samples.data(), r.out.constData(), samples.size() * sizeof(float));
-    return samples;
-}
-
 // Noise tells every sample offset apart; a click at 2 s on an MP3 track beside it. The noise is
 // seeded, so two test processes that make the cached file at once make the same file. Noise
 // substitution stays off: its noise is drawn anew by each decoder, so a copy would not decode to the
@@ -126,7 +113,7 @@ TEST_P(ExportAacCopyTest, CopiesThePacketsAndStartsOnTheSampleAtTheCut)
     const auto [name, start, end] = GetParam();
     const QString source = noiseMovie();
     const QList<ProbedPacket> sourcePackets = audioPackets(source, 0);
-    const QList<float> sourceSamples = decodedSamples(source, 0);
+    const QList<float> sourceSamples = audioSamples(source, 0, words("-ac 1"));
     const double click = loudestMoment(source, 1);
     ASSERT_NEAR(click, 2.0, 0.005);
     const QString output = trimmed(source, secondsRange(start, end, kRate));
@@ -147,7 +134,7 @@ TEST_P(ExportAacCopyTest, CopiesThePacketsAndStartsOnTheSampleAtTheCut)
     EXPECT_NEAR(seconds(audio[0], "duration"), double(last - first) / kRate, 1e-3);
     EXPECT_EQ(audio[1]["codec_name"].toString(), "aac") << "the MP3 track is re-encoded";
     // The first sample played is the one at the start; FFmpeg plays the last packet whole.
-    const QList<float> samples = decodedSamples(output, 0);
+    const QList<float> samples = audioSamples(output, 0, words("-ac 1"));
     ASSERT_GE(samples.size(), last - first);
     EXPECT_LT(samples.size(), last - first + 1024);
     float worst = 0;
@@ -169,62 +156,52 @@ INSTANTIATE_TEST_SUITE_P(Ranges, ExportAacCopyTest,
                                            AacRange{"EndInsideAFrame", 1.31, 2.0105}, AacRange{"EndPastTheMovie", 3.9, 30.0}),
                          caseName);
 
-// A trim with an audio mix gives one mixed track cut to the range.
-TEST_F(ExportTest, TrimWithAudioMixGivesOneMixedTrackCutToTheRange)
+// A mix sums the tracks it lists at unity gain (averaging would halve the tones) into one AAC track cut
+// to the range, copying the video; a mix of one AAC track copies its packets, and an empty mix of a
+// movie without audio gives no audio track.
+struct MixCase {
+    const char *name;
+    QList<AudioMixInputParameters> tracks; // of kLong, whose audio tracks are 2 and 3; empty: a silent movie
+    bool trimmed;                          // to 1 s .. 3 s
+};
+
+class ExportMixTest : public ExportTest, public ::testing::WithParamInterface<MixCase> {};
+
+TEST_P(ExportMixTest, SumsTheListedTracksIntoOne)
 {
-    const QString output = exported(sharedFixtureMovie(kLong), QStringLiteral("trim-mix.mp4"), [](ExportSession &s) {
-        s.setTimeRange(MediaTimeRange::fromStartEnd(MediaTime::make(1, 1), MediaTime::make(3, 1)));
-        s.setAudioMix(AudioMix{{{2}, {3}}});
+    const MixCase &c = GetParam();
+    const QString source = sharedFixtureMovie(c.tracks.isEmpty() ? fixture::FixtureSpec{.seconds = 1, .audioTracks = 0} : kLong);
+    const QString output = exported(source, QStringLiteral("mixed.mp4"), [&](ExportSession &s) {
+        s.setAudioMix(AudioMix{c.tracks});
+        if (c.trimmed)
+            s.setTimeRange(secondsRange(1, 3));
     });
     const QList<QJsonObject> audio = probeStreams(output, "audio");
-    ASSERT_EQ(audio.size(), 1);
-    EXPECT_NEAR(seconds(audio[0], "duration"), 2.0, kAacFrameSeconds);
-    EXPECT_GT(toneLevel(output, 0, toneFrequency(0)), 0.35);
-    EXPECT_GT(toneLevel(output, 0, toneFrequency(1)), 0.35);
-    EXPECT_EQ(readFrameNumbers(output).size(), 60);
-}
-
-// A mix of several tracks sums them at unity gain into one AAC track (averaging would halve the
-// tones); the video is copied.
-TEST_F(ExportTest, MixOfEveryTrackSumsThemAtUnityGainIntoOneAacTrack)
-{
-    const QString source = sharedFixtureMovie(kLong);
-    const AudioMix all = mixOfAllAudioTracks(source);
-    ASSERT_EQ(all.inputParameters.size(), 2);
-    const QString output = exported(source, QStringLiteral("mixed.mp4"), [&](ExportSession &s) { s.setAudioMix(all); });
-    const QList<QJsonObject> audio = probeStreams(output, "audio");
-    ASSERT_EQ(audio.size(), 1);
+    ASSERT_EQ(audio.size(), c.tracks.isEmpty() ? 0 : 1);
+    if (!c.trimmed) {
+        EXPECT_EQ(streamMD5(output, "0:v:0"), streamMD5(source, "0:v:0"));
+    }
+    if (c.tracks.isEmpty())
+        return;
+    EXPECT_EQ(readFrameNumbers(output).size(), c.trimmed ? 60 : 300);
     EXPECT_EQ(audio[0]["codec_name"].toString(), "aac");
     EXPECT_EQ(audio[0]["sample_rate"].toString(), "48000");
     EXPECT_EQ(audio[0]["channels"].toInt(), 2);
-    EXPECT_GT(toneLevel(output, 0, toneFrequency(0)), 0.4);
-    EXPECT_GT(toneLevel(output, 0, toneFrequency(1)), 0.4);
-    EXPECT_NEAR(seconds(audio[0], "duration"), seconds(probeStreams(source, "audio")[0], "duration"), kAacFrameSeconds);
-    EXPECT_EQ(probeStreams(output, "video").size(), 1);
-    EXPECT_EQ(streamMD5(output, "0:v:0"), streamMD5(source, "0:v:0"));
+    EXPECT_NEAR(seconds(audio[0], "duration"), c.trimmed ? 2.0 : seconds(probeStreams(source, "audio")[0], "duration"), kAacFrameSeconds);
+    for (int k : {0, 1}) {
+        const bool listed = std::ranges::any_of(c.tracks, [&](const AudioMixInputParameters &p) { return p.trackID == k + 2; });
+        const double level = toneLevel(output, 0, toneFrequency(k));
+        EXPECT_TRUE(listed ? level > (c.trimmed ? 0.35 : 0.4) : level < 0.05) << k << ": " << level;
+    }
+    if (c.tracks.size() == 1) {
+        EXPECT_EQ(streamMD5(output, "0:a:0"), streamMD5(source, QStringLiteral("0:a:%1").arg(c.tracks[0].trackID - 2)));
+    }
 }
 
-// A mix of one AAC track drops the others and, having nothing to sum, copies its packets.
-TEST_F(ExportTest, MixOfOneTrackIsACopyOfThatTrackAlone)
-{
-    const QString source = sharedFixtureMovie(kLong);
-    const QString output = exported(source, QStringLiteral("second.mp4"), [&](ExportSession &s) {
-        s.setAudioMix(AudioMix{{mixOfAllAudioTracks(source).inputParameters.value(1)}});
-    });
-    ASSERT_EQ(probeStreams(output, "audio").size(), 1);
-    EXPECT_GT(toneLevel(output, 0, toneFrequency(1)), 0.4);
-    EXPECT_LT(toneLevel(output, 0, toneFrequency(0)), 0.05);
-    EXPECT_EQ(streamMD5(output, "0:a:0"), streamMD5(source, "0:a:1"));
-}
-
-// An empty mix of a movie without audio gives a movie without an audio track, video copied.
-TEST_F(ExportTest, EmptyMixOfMovieWithoutAudioGivesMovieWithoutAudioTrack)
-{
-    const QString source = sharedFixtureMovie({.seconds = 1, .audioTracks = 0});
-    const QString output = exported(source, QStringLiteral("silent.mp4"), [&](ExportSession &s) { s.setAudioMix(AudioMix{}); });
-    EXPECT_TRUE(probeStreams(output, "audio").isEmpty());
-    EXPECT_EQ(streamMD5(output, "0:v:0"), streamMD5(source, "0:v:0"));
-}
+INSTANTIATE_TEST_SUITE_P(Mixes, ExportMixTest,
+                         ::testing::Values(MixCase{"BothTracks", {{2}, {3}}, false}, MixCase{"BothTracksTrimmed", {{2}, {3}}, true},
+                                           MixCase{"TheSecondTrackAlone", {{3}}, false}, MixCase{"EmptyOfASilentMovie", {}, false}),
+                         caseName);
 
 // Two in-phase tracks at 0.9 would sum to twice full scale: the mix is summed yet limited below it.
 TEST_F(ExportTest, MixOfLoudTracksIsLimitedBelowFullScale)
@@ -234,8 +211,7 @@ TEST_F(ExportTest, MixOfLoudTracksIsLimitedBelowFullScale)
                                                  " -c:v libx264 -preset ultrafast -c:a pcm_s16le"),
                                            QStringLiteral("mov"));
     const QString output = exported(source, QStringLiteral("limited.mp4"), [&](ExportSession &s) { s.setAudioMix(mixOfAllAudioTracks(source)); });
-    const ToolRun stats = runTool(QStringLiteral("ffmpeg"), QStringList{QStringLiteral("-nostdin"), QStringLiteral("-i"), output}
-                                      + words("-map 0:a -af astats=measure_overall=Peak_level:measure_perchannel=none -f null -"));
+    const ToolRun stats = runTool(QStringLiteral("ffmpeg"), words("-nostdin -i") << output << words("-map 0:a -af astats=measure_overall=Peak_level:measure_perchannel=none -f null -"));
     const QString text = QString::fromUtf8(stats.err);
     const qsizetype at = text.indexOf(QStringLiteral("Peak level dB:"));
     ASSERT_TRUE(stats.ok() && at >= 0) << stats.err.toStdString();

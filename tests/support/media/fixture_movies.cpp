@@ -17,6 +17,7 @@
 #include <cmath>
 #include <cstring>
 #include <functional>
+#include <numeric>
 
 #include <unistd.h>
 
@@ -92,14 +93,13 @@ QString makeFixtureMovie(const QString &dir, const zaf::fixture::FixtureSpec &sh
     return path;
 }
 
-namespace {
-
 // Generated fixtures are kept between test processes (ctest runs every case in a process of its
 // own) and between the builds of one source tree (the sanitizer builds reuse the normal build's),
 // in a directory named after the digest of the generator's sources, so a changed generator never
 // serves a stale movie. Files are made under a temporary name and renamed into place: a test
-// process never sees half a movie, and of two made at once either serves.
-QString fixtureCacheDirectory()
+// process never sees half a movie, and of two made at once either serves. Cached files are
+// read-only: a test that would change a shared movie fails instead of spoiling it.
+QString sharedGeneratedFile(const QString &name, const std::function<bool(const QString &path)> &make)
 {
     static const QString dir = [] {
         const QString path = QDir::temp().filePath(QStringLiteral("zaf-fixtures-%1-%2").arg(getuid()).arg(QStringLiteral(ZAF_FIXTURE_GENERATOR_DIGEST)));
@@ -107,14 +107,7 @@ QString fixtureCacheDirectory()
             ADD_FAILURE() << "cannot make the fixture cache " << qPrintable(path);
         return path;
     }();
-    return dir;
-}
-
-// The cached fixture `name` (`stem.ext`), made by `make` into the path it is given when missing.
-// Cached files are read-only: a test that would change a shared movie fails instead of spoiling it.
-QString cachedFixture(const QString &name, const std::function<bool(const QString &path)> &make)
-{
-    const QString path = QDir(fixtureCacheDirectory()).filePath(name);
+    const QString path = QDir(dir).filePath(name);
     if (QFileInfo::exists(path))
         return path;
     const QFileInfo info(path);
@@ -134,17 +127,10 @@ QString cachedFixture(const QString &name, const std::function<bool(const QStrin
     return path;
 }
 
-} // namespace
-
-QString sharedGeneratedFile(const QString &name, const std::function<bool(const QString &path)> &make)
-{
-    return cachedFixture(name, make);
-}
-
 QString sharedFfmpegOutput(const QStringList &arguments, const QString &suffix)
 {
     const QByteArray digest = QCryptographicHash::hash(arguments.join(u' ').toUtf8(), QCryptographicHash::Md5).toHex().left(12);
-    return cachedFixture(QStringLiteral("ffmpeg-%1.%2").arg(QString::fromLatin1(digest), suffix),
+    return sharedGeneratedFile(QStringLiteral("ffmpeg-%1.%2").arg(QString::fromLatin1(digest), suffix),
                          [&](const QString &path) { return ffmpeg(QStringList(arguments) << path); });
 }
 
@@ -153,7 +139,7 @@ QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape)
     const QString name = QStringLiteral("fixture-%1s-%2x%3-%4fps-a%5x%6-r%7-g%8.mp4")
                              .arg(shape.seconds).arg(shape.width).arg(shape.height).arg(shape.fps)
                              .arg(shape.audioTracks).arg(shape.channels).arg(shape.rotation).arg(shape.gop);
-    return cachedFixture(name, [&](const QString &path) {
+    return sharedGeneratedFile(name, [&](const QString &path) {
         if (OptionalError error = zaf::fixture::writeFixtureMovie(path, shape)) {
             ADD_FAILURE() << "cannot write fixture movie " << qPrintable(path) << ": " << qPrintable(error->description());
             return false;
@@ -165,7 +151,7 @@ QString sharedFixtureMovie(const zaf::fixture::FixtureSpec &shape)
 QString sharedFlatColourMovie(QSize size, const QString &codec)
 {
     const QString name = QStringLiteral("flat-%1x%2-%3.mp4").arg(size.width()).arg(size.height()).arg(codec);
-    return cachedFixture(name, [&](const QString &path) {
+    return sharedGeneratedFile(name, [&](const QString &path) {
         const bool even = size.width() % 2 == 0 && size.height() % 2 == 0;
         const QString format = codec == QLatin1String("libx264rgb") ? QStringLiteral("gbrp") : even ? QStringLiteral("yuv420p") : QStringLiteral("yuv444p");
         // The colour source only makes even sizes: crop a larger picture down to the size asked for.
@@ -222,62 +208,44 @@ int readFrameNumber(const QImage &image)
     return zaf::fixture::readFrameNumber(image);
 }
 
+QList<float> audioSamples(const QString &moviePath, int audioStreamIndex, const QStringList &options)
+{
+    const ToolRun r = ffmpegRun(QStringList{QStringLiteral("-i"), moviePath, QStringLiteral("-map"), QStringLiteral("0:a:%1").arg(audioStreamIndex)}
+                                + options + words("-c:a pcm_f32le -f f32le -"));
+    QList<float> samples(r.ok() ? r.out.size() / qsizetype(sizeof(float)) : 0);
+    std::memcpy(samples.data(), r.out.constData(), samples.size() * sizeof(float));
+    if (samples.isEmpty())
+        ADD_FAILURE() << "audio stream " << audioStreamIndex << " of " << qPrintable(moviePath) << " decodes to no samples";
+    return samples;
+}
+
 double loudestMoment(const QString &moviePath, int audioStreamIndex)
 {
-    constexpr int kRate = 48000;
     // aresample with first_pts=0 pads or drops samples so that sample i plays at i / rate on the
     // movie's timeline, whatever the track's start and edit list.
-    const ToolRun r = ffmpegRun({QStringLiteral("-i"), moviePath, QStringLiteral("-map"), QStringLiteral("0:a:%1").arg(audioStreamIndex),
-                                 QStringLiteral("-af"), QStringLiteral("aresample=async=1:first_pts=0"), QStringLiteral("-ac"),
-                                 QStringLiteral("1"), QStringLiteral("-ar"), QString::number(kRate), QStringLiteral("-c:a"),
-                                 QStringLiteral("pcm_f32le"), QStringLiteral("-f"), QStringLiteral("f32le"), QStringLiteral("-")});
-    const qsizetype samples = r.out.size() / qsizetype(sizeof(float));
-    if (!r.ok() || samples == 0) {
-        ADD_FAILURE() << "audio stream " << audioStreamIndex << " of " << qPrintable(moviePath) << " decodes to no samples";
-        return -1;
-    }
-    qsizetype loudest = 0;
-    float peak = -1;
-    for (qsizetype i = 0; i < samples; ++i) {
-        float v;
-        std::memcpy(&v, r.out.constData() + i * sizeof(float), sizeof v);
-        if (std::abs(v) > peak) {
-            peak = std::abs(v);
-            loudest = i;
-        }
-    }
-    return double(loudest) / kRate;
+    const QList<float> samples = audioSamples(moviePath, audioStreamIndex, words("-af aresample=async=1:first_pts=0 -ac 1 -ar 48000"));
+    const auto louder = [](float a, float b) { return std::abs(a) < std::abs(b); };
+    return samples.isEmpty() ? -1 : double(std::max_element(samples.begin(), samples.end(), louder) - samples.begin()) / 48000;
 }
 
 double toneLevel(const QString &moviePath, int audioStreamIndex, double frequency)
 {
-    const QList<QJsonObject> audio = probeStreams(ffprobe(moviePath), QStringLiteral("audio"));
-    const int channels = audio.value(audioStreamIndex).value(QStringLiteral("channels")).toInt();
+    const int channels = probeStreams(moviePath, QStringLiteral("audio")).value(audioStreamIndex).value(QStringLiteral("channels")).toInt();
     if (channels <= 0) {
-        ADD_FAILURE() << qPrintable(moviePath) << " has no audio stream " << audioStreamIndex << " with channels (it has "
-                      << audio.size() << " audio streams)";
+        ADD_FAILURE() << qPrintable(moviePath) << " has no audio stream " << audioStreamIndex << " with channels";
         return -1;
     }
     constexpr int kRate = 48000;
-    const ToolRun r = ffmpegRun({QStringLiteral("-i"), moviePath, QStringLiteral("-map"), QStringLiteral("0:a:%1").arg(audioStreamIndex),
-                                 QStringLiteral("-ar"), QString::number(kRate), QStringLiteral("-c:a"), QStringLiteral("pcm_f32le"),
-                                 QStringLiteral("-f"), QStringLiteral("f32le"), QStringLiteral("-")});
-    const qsizetype frames = r.out.size() / qsizetype(sizeof(float) * channels);
-    if (!r.ok() || frames == 0) {
-        ADD_FAILURE() << "audio stream " << audioStreamIndex << " of " << qPrintable(moviePath) << " decodes to no samples";
+    const QList<float> samples = audioSamples(moviePath, audioStreamIndex, words("-ar 48000"));
+    const qsizetype frames = samples.size() / channels;
+    if (frames == 0)
         return -1;
-    }
     // Goertzel filter at `frequency` over the channel mean; |X| = A * N / 2 for a tone of amplitude A.
     const double coeff = 2 * std::cos(2 * M_PI * frequency / kRate);
     double s1 = 0, s2 = 0;
     for (qsizetype i = 0; i < frames; ++i) {
-        double sum = 0;
-        for (int c = 0; c < channels; ++c) {
-            float v;
-            std::memcpy(&v, r.out.constData() + (i * channels + c) * sizeof(float), sizeof v);
-            sum += v;
-        }
-        const double s0 = sum / channels + coeff * s1 - s2;
+        const double mean = std::accumulate(samples.begin() + i * channels, samples.begin() + (i + 1) * channels, 0.0) / channels;
+        const double s0 = mean + coeff * s1 - s2;
         s2 = s1;
         s1 = s0;
     }
@@ -361,14 +329,10 @@ QList<int> keyFrameIndexes(const QString &path)
 
 QString streamMD5(const QString &path, const QString &map)
 {
-    const QByteArray line = ffmpegRun({QStringLiteral("-i"), path, QStringLiteral("-map"), map, QStringLiteral("-c"),
-                                       QStringLiteral("copy"), QStringLiteral("-f"), QStringLiteral("md5"), QStringLiteral("-")})
-                                .out.trimmed();
-    if (!line.startsWith("MD5=")) {
+    const QByteArray line = ffmpegRun(QStringList{QStringLiteral("-i"), path, QStringLiteral("-map"), map} + words("-c copy -f md5 -")).out.trimmed();
+    if (!line.startsWith("MD5="))
         ADD_FAILURE() << "ffmpeg gave no MD5 for " << qPrintable(map) << " of " << qPrintable(path) << ": " << line.constData();
-        return {};
-    }
-    return QString::fromLatin1(line.mid(4));
+    return line.startsWith("MD5=") ? QString::fromLatin1(line.mid(4)) : QString();
 }
 
 } // namespace zaf::test

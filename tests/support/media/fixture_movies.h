@@ -53,6 +53,10 @@ int readFrameNumber(const QImage &image);
 // the audio streams), mixed to mono: ~0.5 for a fixture tone, ~0 for an absent one. -1 on failure.
 double toneLevel(const QString &moviePath, int audioStreamIndex, double frequency);
 
+// The samples of audio stream `audioStreamIndex` (0-based among the audio streams) as 32-bit floats,
+// interleaved, after the ffmpeg output `options` ("-ac 1" mixes to mono).
+QList<float> audioSamples(const QString &moviePath, int audioStreamIndex, const QStringList &options = {});
+
 // The moment (seconds on the movie's timeline) of the loudest sample of audio stream
 // `audioStreamIndex`, mixed to mono: where a click sits. -1 on failure.
 double loudestMoment(const QString &moviePath, int audioStreamIndex);

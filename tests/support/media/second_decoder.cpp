@@ -17,17 +17,12 @@ bool secondDecoderAvailable()
 int decodeVideoFramesWithSecondDecoder(const QString &path)
 {
     // The sink reports every buffer it takes ("chain" lines with -v): one per decoded picture.
-    const ToolRun run = runTool(QStringLiteral("gst-launch-1.0"),
-                                {QStringLiteral("-v"), QStringLiteral("filesrc"), QStringLiteral("location=") + path,
-                                 QStringLiteral("!"), QStringLiteral("qtdemux"), QStringLiteral("name=demux"),
-                                 QStringLiteral("demux.video_0"), QStringLiteral("!"), QStringLiteral("queue"),
-                                 QStringLiteral("!"), QStringLiteral("avdec_h264"), QStringLiteral("output-corrupt=false"), QStringLiteral("!"),
-                                 QStringLiteral("fakesink"), QStringLiteral("silent=false"), QStringLiteral("sync=false")});
+    const ToolRun run = runTool(QStringLiteral("gst-launch-1.0"), QStringList{QStringLiteral("-v"), QStringLiteral("filesrc"), QStringLiteral("location=") + path}
+                                    + words("! qtdemux name=demux demux.video_0 ! queue ! avdec_h264 output-corrupt=false ! fakesink silent=false sync=false"));
     const QString out = QString::fromUtf8(run.out);
     const QString err = QString::fromUtf8(run.err);
     // A decoding error is a warning of the decoder, and the picture is dropped (output-corrupt=false).
-    const bool complained = out.contains(QLatin1String("ERROR")) || err.contains(QLatin1String("ERROR"))
-        || out.contains(QLatin1String("WARNING")) || err.contains(QLatin1String("WARNING"));
+    const bool complained = (out + err).contains(QLatin1String("ERROR")) || (out + err).contains(QLatin1String("WARNING"));
     if (!run.ok() || complained) {
         ADD_FAILURE() << "GStreamer could not decode " << path.toStdString() << ":\n" << err.toStdString() << out.right(2000).toStdString();
         return -1;
