@@ -22,11 +22,6 @@ protected:
         QApplication::setActiveWindow(host.get());
         ASSERT_TRUE(QTest::qWaitForWindowActive(host.get()));
     }
-    void TearDown() override
-    {
-        host.reset();
-        editor.reset();
-    }
     void press(int key, Qt::KeyboardModifiers modifiers = Qt::NoModifier)
     {
         QTest::keyClick(host.get(), Qt::Key(key), modifiers);
@@ -47,7 +42,6 @@ TEST_F(EditorKeyboardTest, SpaceTogglesPlayback)
     EXPECT_EQ(editor->mvPlayer()->rate(), 0);
 }
 
-// Right steps one frame, Shift+Left one second back.
 TEST_F(EditorKeyboardTest, ArrowKeysStepThePlayhead)
 {
     editor->mvTrimmer()->setValue(1.0);
@@ -101,10 +95,8 @@ TEST_P(EditorTrimKeysTest, TheEditorsRangeIsTheTimelinesRange)
 INSTANTIATE_TEST_SUITE_P(Keys, EditorTrimKeysTest, ::testing::Values(
     TrimKeys{"InThenOut", {{1.0, Qt::Key_I}, {2.5, Qt::Key_O}}, 1.0, 2.5},
     TrimKeys{"OutBeforeTheStartPushesTheStartBack", {{1.0, Qt::Key_I}, {2.5, Qt::Key_O}, {1.2, Qt::Key_O}}, 0.2, 1.2},
-    TrimKeys{"InPastTheEndPushesTheEndOn", {{1.0, Qt::Key_I}, {2.5, Qt::Key_O}, {2.0, Qt::Key_I}}, 2.0, 3.0},
-    TrimKeys{"InNearTheEndStopsAMinimumBeforeIt", {{3.8, Qt::Key_I}}, 3.0, 4.0},
-    TrimKeys{"OutNearTheStartStopsAMinimumAfterIt", {{0.3, Qt::Key_O}}, 0.0, 1.0}),
-    [](const ::testing::TestParamInfo<TrimKeys> &info) { return std::string(info.param.name); });
+    TrimKeys{"InPastTheEndPushesTheEndOn", {{1.0, Qt::Key_I}, {2.5, Qt::Key_O}, {2.0, Qt::Key_I}}, 2.0, 3.0}),
+    caseName);
 
 } // namespace
 } // namespace zaf::test

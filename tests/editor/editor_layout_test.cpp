@@ -1,5 +1,4 @@
-// Layout choice, toolbar frames, the timeline container, the size transitions and the overlay play
-// button's place.
+// Layout choice, toolbar frames, the timeline container, size transitions, the overlay button, tint.
 #include "tests/editor/editor_test_support.h"
 
 #include "overlay/video_overlay_button.h"
@@ -9,66 +8,46 @@
 namespace zaf::test {
 namespace {
 
+// The pad layout is for a tablet, or for a landscape frame when the device is not known to be one.
+// The toolbars are short on a device with a home button and tall without one; the fixed space is a
+// fraction of the view's width. (The home-button answer is read once per process: each test has its own.)
 struct LayoutChoice {
     const char *name;
-    int idiom;   // -1 cannot tell, 0 phone, 1 tablet
+    const char *capabilities;
     QRectF rect;
     bool pad;
+    int top = 60, bottom = 44;
 };
 
 class EditorLayoutChoiceTest : public EditorTest, public testing::WithParamInterface<LayoutChoice> {};
 
-// The pad layout is for a tablet, or for a landscape frame when the device is not known to be one.
-TEST_P(EditorLayoutChoiceTest, PicksThePadLayoutForATabletOrALandscapeFrame)
+TEST_P(EditorLayoutChoiceTest, PicksTheLayoutAndTheToolbarFrames)
 {
-    useCapabilities(scratch, QStringLiteral("{\"device-idiom\": %1}").arg(GetParam().idiom).toUtf8());
-    auto editor = makeEditor(noMovie(), GetParam().rect);
-    EXPECT_EQ(editor->isPadMode(), GetParam().pad);
-    EXPECT_EQ(ui::superview(editor->bottomToolBar()) != nullptr, !GetParam().pad);
+    const LayoutChoice &row = GetParam();
+    ScopedCapabilities capabilities(row.capabilities);
+    auto editor = makeEditor(noMovie(), row.rect);
+    const QRect frame = row.rect.toRect();
+    EXPECT_EQ(editor->isPadMode(), row.pad);
+    EXPECT_EQ(ui::superview(editor->bottomToolBar()) != nullptr, !row.pad);
+    EXPECT_EQ(editor->topToolBar()->geometry(), QRect(0, 0, frame.width(), row.top));
+    if (!row.pad)
+        EXPECT_EQ(editor->bottomToolBar()->geometry(), QRect(0, frame.height() - row.bottom, frame.width(), row.bottom));
+    EXPECT_DOUBLE_EQ(editor->fixSpace()->width(), 0.005 * frame.width());
 }
 
 INSTANTIATE_TEST_SUITE_P(
     Frames, EditorLayoutChoiceTest,
-    testing::Values(LayoutChoice{"PhoneLandscape", 0, QRectF(0, 0, 800, 400), true},
-                    LayoutChoice{"PhonePortrait", 0, QRectF(0, 0, 400, 800), false},
-                    LayoutChoice{"PhoneSquare", 0, QRectF(0, 0, 500, 500), false},
-                    LayoutChoice{"UnknownLandscape", -1, QRectF(0, 0, 800, 400), true},
-                    LayoutChoice{"UnknownSquare", -1, QRectF(0, 0, 500, 500), false},
-                    LayoutChoice{"TabletLandscape", 1, QRectF(0, 0, 800, 400), true},
-                    LayoutChoice{"TabletPortrait", 1, QRectF(0, 0, 400, 800), true},
-                    LayoutChoice{"TabletSquare", 1, QRectF(0, 0, 500, 500), true}),
-    [](const testing::TestParamInfo<LayoutChoice> &info) { return std::string(info.param.name); });
-
-struct ToolbarHeights {
-    const char *name;
-    const char *capabilities;
-    bool homeButton;
-    int top, bottom;
-};
-
-class EditorToolbarHeightTest : public EditorTest, public testing::WithParamInterface<ToolbarHeights> {};
-
-// The toolbars are short on a device with a home button and tall without one.
-TEST_P(EditorToolbarHeightTest, ToolbarHeightsFollowTheHomeButton)
-{
-    useCapabilities(scratch, GetParam().capabilities);
-    auto editor = makeEditor(noMovie());
-    EXPECT_EQ(editor->hasHomeButton(), GetParam().homeButton);
-    EXPECT_EQ(editor->topToolBar()->geometry(), QRect(0, 0, 400, GetParam().top));
-    EXPECT_EQ(editor->bottomToolBar()->geometry(), QRect(0, 700 - GetParam().bottom, 400, GetParam().bottom));
-}
-
-INSTANTIATE_TEST_SUITE_P(
-    HomeButton, EditorToolbarHeightTest,
-    testing::Values(ToolbarHeights{"WithHomeButton", R"({"home-button-type": 1})", true, 60, 44},
-                    ToolbarHeights{"WithoutHomeButton", R"({"home-button-type": 2})", false, 85, 64}),
-    [](const testing::TestParamInfo<ToolbarHeights> &info) { return std::string(info.param.name); });
-
-TEST_F(EditorTest, FixedSpaceIsAFractionOfTheViewsWidth)
-{
-    auto editor = makeEditor(noMovie());
-    EXPECT_DOUBLE_EQ(editor->fixSpace()->width(), 0.005 * 400);
-}
+    testing::Values(LayoutChoice{"PhoneLandscape", R"({"device-idiom": 0})", QRectF(0, 0, 800, 400), true},
+                    LayoutChoice{"PhonePortrait", R"({"device-idiom": 0})", QRectF(0, 0, 400, 800), false},
+                    LayoutChoice{"PhoneSquare", R"({"device-idiom": 0})", QRectF(0, 0, 500, 500), false},
+                    LayoutChoice{"UnknownLandscape", R"({"device-idiom": -1})", QRectF(0, 0, 800, 400), true},
+                    LayoutChoice{"UnknownSquare", R"({"device-idiom": -1})", QRectF(0, 0, 500, 500), false},
+                    LayoutChoice{"TabletLandscape", R"({"device-idiom": 1})", QRectF(0, 0, 800, 400), true},
+                    LayoutChoice{"TabletPortrait", R"({"device-idiom": 1})", QRectF(0, 0, 400, 800), true},
+                    LayoutChoice{"TabletSquare", R"({"device-idiom": 1})", QRectF(0, 0, 500, 500), true},
+                    LayoutChoice{"WithHomeButton", R"({"home-button-type": 1})", QRectF(0, 0, 400, 700), false},
+                    LayoutChoice{"WithoutHomeButton", R"({"home-button-type": 2})", QRectF(0, 0, 400, 700), false, 85, 64}),
+    caseName);
 
 // Turning to landscape and back: the timeline sits above the bottom toolbar or on the bottom edge,
 // and the items follow the layout while keeping the playing and trimming state.
@@ -118,19 +97,15 @@ TEST_F(EditorTest, OverlayPlayButtonIsCentredInTheViewAndStaysCentredOnResize)
     expectCentred(1280, 720);
 }
 
-TEST_F(EditorTest, ShortInitializerLeavesTheFrameAndTintUnset)
-{
-    ZafVideoEditorViewController plain(QStringLiteral("id"), QUrl::fromLocalFile(noMovie()), QStringLiteral("Recorder"));
-    EXPECT_EQ(plain.view()->geometry(), QWidget().geometry());
-    EXPECT_FALSE(plain.topToolBar()->tintColor().isValid());
-}
-
+// The tint colours the top toolbar only; the short initializer sets no tint.
 TEST_F(EditorTest, TintGoesToTheTopToolbarOnly)
 {
     auto tinted = makeEditor(noMovie(), QRectF(10, 20, 400, 700), QColor(0xff, 0x40, 0x00));
     EXPECT_EQ(tinted->view()->geometry(), QRect(10, 20, 400, 700));
     EXPECT_EQ(tinted->topToolBar()->tintColor(), QColor(0xff, 0x40, 0x00));
     EXPECT_FALSE(tinted->bottomToolBar()->tintColor().isValid());
+    ZafVideoEditorViewController plain(QStringLiteral("id"), QUrl::fromLocalFile(noMovie()), QStringLiteral("Recorder"));
+    EXPECT_FALSE(plain.topToolBar()->tintColor().isValid());
 }
 
 } // namespace

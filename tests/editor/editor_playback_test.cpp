@@ -3,14 +3,12 @@
 
 #include "editor/date_extensions.h"
 #include "overlay/video_overlay_button.h"
-#include "platform/ui/bar_button_item.h"
 #include "platform/ui/view_animation.h"
 
 #include <QFileInfo>
 #include <QLabel>
 #include <QLocale>
 
-#include <cmath>
 #include <functional>
 
 namespace zaf::test {
@@ -147,7 +145,7 @@ INSTANTIATE_TEST_SUITE_P(Files, EditorUnplayableMovieTest, ::testing::Values(
         ffmpeg(words("-f lavfi -i sine=frequency=440:duration=1 -c:a aac") << path);
         return path;
     }, kNotAMovie}),
-    [](const ::testing::TestParamInfo<UnplayableMovie> &info) { return std::string(info.param.name); });
+    caseName);
 
 TEST(EditorTitle, DateLineShowsMonthDayAndTwelveHourTime)
 {

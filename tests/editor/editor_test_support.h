@@ -1,10 +1,8 @@
 #pragma once
 
-// Editors on generated movies, for the editor's tests: each test gets a private temporary
-// directory, a fixture movie and, where it matters, a capability file.
+// Editors on generated movies, each test with a private temporary directory, and the editor's reports.
 
 #include "editor/editor.h"
-#include "platform/capability/capability_service.h"
 #include "platform/media/playback/playback_clock.h"
 #include "platform/media/player_item.h"
 #include "platform/ui/bar_button_item.h"
@@ -12,18 +10,20 @@
 #include "platform/ui/toolbar.h"
 #include "platform/ui/transition_coordinator.h"
 #include "tests/support/log_capture.h"
-#include "tests/support/process_temp_directory.h"
 #include "tests/support/media/fixture_movies.h"
-#include "tempstore/temp_store.h"
+#include "tests/support/named_cases.h"
+#include "tests/support/process_temp_directory.h"
+#include "tests/support/scoped_capabilities.h"
 #include "tests/support/temp_dir.h"
 #include "tests/support/wait_until.h"
+#include "tempstore/temp_store.h"
 
 #include <QCoreApplication>
 #include <QElapsedTimer>
-#include <QFile>
 #include <QWidget>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <memory>
 
 namespace zaf::test {
@@ -39,19 +39,6 @@ public:
         reports << types;
     }
 };
-
-// Points the process at a capability file with these answers (before the first editor: the
-// home-button answer is read once per process, and each test runs in a process of its own).
-inline void useCapabilities(const ScratchDir &scratch, const QByteArray &json)
-{
-    const QString path = scratch.file(QStringLiteral("capabilities.json"));
-    QFile f(path);
-    if (f.open(QIODevice::WriteOnly))
-        f.write(json);
-    f.close();
-    qputenv("ZAF_CAPABILITIES_FILE", QFile::encodeName(path));
-    CapabilityService::shared().reload();
-}
 
 // Waits (bounded) until the editor's current item is ready, handling events.
 inline bool waitUntilReady(ZafVideoEditorViewController &editor)
@@ -71,10 +58,7 @@ inline void spin(int ms = 50)
 
 class EditorTest : public ::testing::Test {
 protected:
-    void SetUp() override
-    {
-        usePrivateTempDirectoryForProcess();
-    }
+    void SetUp() override { usePrivateTempDirectoryForProcess(); }
 
     // A movie of the given shape in the scratch directory.
     QString movie(double seconds = 3, int width = 320, int height = 240, int rotation = 0, int audioTracks = 1)
@@ -143,21 +127,14 @@ inline bool applyTrim(ZafVideoEditorViewController &e)
 // The items of a toolbar, by the editor's names for them.
 inline QStringList itemNames(const ZafVideoEditorViewController &e, ui::Toolbar *toolbar)
 {
-    const QList<std::pair<ui::BarButtonItem *, QString>> names = {
-        {e.shareButton(), QStringLiteral("share")},   {e.pauseButton(), QStringLiteral("pause")},
-        {e.saveButton(), QStringLiteral("save")},     {e.flexSpace(), QStringLiteral("flex")},
-        {e.doneButton(), QStringLiteral("done")},     {e.cancelButton(), QStringLiteral("cancel")},
-        {e.cancelTrimButton(), QStringLiteral("cancelTrim")}, {e.trimButton(), QStringLiteral("trim")},
-        {e.undoButton(), QStringLiteral("undo")},     {e.titleButton(), QStringLiteral("title")},
-        {e.playButton(), QStringLiteral("play")},     {e.fixSpace(), QStringLiteral("fix")},
-    };
+    const QList<std::pair<ui::BarButtonItem *, const char *>> names = {
+        {e.shareButton(), "share"}, {e.pauseButton(), "pause"}, {e.saveButton(), "save"}, {e.flexSpace(), "flex"},
+        {e.doneButton(), "done"}, {e.cancelButton(), "cancel"}, {e.cancelTrimButton(), "cancelTrim"}, {e.trimButton(), "trim"},
+        {e.undoButton(), "undo"}, {e.titleButton(), "title"}, {e.playButton(), "play"}, {e.fixSpace(), "fix"}};
     QStringList out;
     for (ui::BarButtonItem *item : toolbar->items()) {
-        QString name = QStringLiteral("?");
-        for (const auto &[candidate, label] : names)
-            if (candidate == item)
-                name = label;
-        out << name;
+        auto named = std::find_if(names.begin(), names.end(), [&](const auto &name) { return name.first == item; });
+        out << (named == names.end() ? "?" : named->second);
     }
     return out;
 }
