@@ -1,5 +1,4 @@
-// The flat overlay button's two shared images: rendered once per process even when first asked for
-// from racing threads, shown by every flat button, and composited from the mask images.
+// The flat overlay button's two shared images: rendered once, shown by every button, composited from the masks.
 #include "overlay/overlay_images.h"
 #include "overlay/video_overlay_constants.h"
 #include "platform/ui/screen.h"
@@ -50,22 +49,10 @@ TEST(FlatButtonSharedImages, EveryButtonShowsTheVerySameImages)
     EXPECT_EQ(Flat::sharedImageRenderCount(), 2); // however many buttons exist
 }
 
-// The background mask's size in points, at the screen's scale.
-TEST(FlatButtonSharedImages, ImagesAreSizedLikeTheBackgroundMask)
-{
-    const double scale = ui::Screen::mainScreenScale();
-    const QSizeF points = overlay::sizeInPoints(backgroundMask());
-    ASSERT_FALSE(points.isEmpty());
-    for (const QImage *image : {&Flat::_normalButtonImage(), &Flat::_highlightedButtonImage()}) {
-        EXPECT_EQ(image->devicePixelRatio(), scale);
-        EXPECT_EQ(image->size(), QSize(std::ceil(points.width() * scale), std::ceil(points.height() * scale)));
-        EXPECT_TRUE(image->hasAlphaChannel());
-    }
-}
-
 // The compositing rules, checked on every pixel against the two masks at the same pixel: outside
 // both masks the gray fill, inside the background mask a hole, inside the glyph the white glyph at
-// its alpha. Where a mask is partly transparent (anti-aliased edges) no rule is checked.
+// its alpha. Where a mask is partly transparent (anti-aliased edges) no rule is checked. The image has
+// the mask's size at the screen's scale.
 struct Composite {
     const char *name;
     double white, backgroundAlpha, glyphAlpha;
@@ -83,6 +70,8 @@ TEST_P(FlatButtonComposite, PixelsFollowTheFillCutOutAndGlyphRules)
     ASSERT_EQ(glyph.size(), background.size());
     const QImage rendered = c.shared ? c.shared() : Flat::_createOverlayImageWithBackgroundWhiteBackgroundAlphaGlyphAlpha(c.white, c.backgroundAlpha, c.glyphAlpha);
     ASSERT_EQ(rendered.size(), background.size());
+    EXPECT_EQ(rendered.devicePixelRatio(), ui::Screen::mainScreenScale());
+    EXPECT_TRUE(rendered.hasAlphaChannel());
     const int fillAlpha = qRound(c.backgroundAlpha * 255);
     const int fillGray = qRound(c.white * 255);
     const int glyphAlpha = qRound(c.glyphAlpha * 255);

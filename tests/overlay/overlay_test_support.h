@@ -1,25 +1,17 @@
 #pragma once
 
-// Support for the overlay button tests: an action target, a surface standing for the video behind
-// the button, a pointer that delivers mouse events through the window as the windowing system does,
-// the capability file that picks the graphics-quality level, and a fixture showing a button of one
-// variant on a surface.
+// The overlay button tests' action target, surface, pointer, masks, pressed look and fixture.
 
 #include "overlay/flat_video_overlay_button.h"
 #include "overlay/high_fidelity_video_overlay_button.h"
 #include "overlay/overlay_images.h"
 #include "overlay/video_overlay_constants.h"
-#include "platform/capability/capability_service.h"
-#include "tests/support/temp_dir.h"
-
 #include <QApplication>
-#include <QFile>
 #include <QMouseEvent>
 #include <QWindow>
 #include <gtest/gtest.h>
 
 #include <cstdint>
-#include <optional>
 #include <string>
 
 namespace zaf::test {
@@ -79,31 +71,6 @@ inline QPoint outsideInWindow(const QWidget *widget)
 {
     return widget->mapTo(widget->window(), QPoint(widget->width() + 10, widget->height() + 10));
 }
-
-// Points the capability service at a file answering `level` as graphics-quality level (no file when
-// empty); the destructor restores the defaults.
-class GraphicsQualityLevel {
-public:
-    explicit GraphicsQualityLevel(std::optional<int> level)
-    {
-        qunsetenv("ZAF_CAPABILITIES_FILE");
-        if (level) {
-            QFile file(m_scratch.file(QStringLiteral("capabilities.json")));
-            if (file.open(QIODevice::WriteOnly))
-                file.write(QByteArray(R"({"graphics-quality-level": )") + QByteArray::number(*level) + "}");
-            qputenv("ZAF_CAPABILITIES_FILE", QFile::encodeName(file.fileName()));
-        }
-        CapabilityService::shared().reload();
-    }
-    ~GraphicsQualityLevel()
-    {
-        qunsetenv("ZAF_CAPABILITIES_FILE");
-        CapabilityService::shared().reload();
-    }
-
-private:
-    ScratchDir m_scratch;
-};
 
 // A style as a test case's name: "Style0", "StyleMinus1", "StyleMax".
 inline std::string styleName(std::int64_t style)

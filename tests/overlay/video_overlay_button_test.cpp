@@ -1,7 +1,7 @@
-// What both overlay button variants share: the factory that picks one, the pressed look following
-// the pointer, and the tap that calls the target's action.
+// What both overlay button variants share: the factory, the pressed look and the tap's action.
 #include "overlay/overlay_images.h"
 #include "tests/overlay/overlay_test_support.h"
+#include "tests/support/scoped_capabilities.h"
 
 #include <gtest/gtest.h>
 
@@ -25,7 +25,7 @@ class OverlayButtonFactory : public ::testing::TestWithParam<FactoryCase> {};
 TEST_P(OverlayButtonFactory, StyleAndGraphicsQualityLevelPickTheVariant)
 {
     const FactoryCase &c = GetParam();
-    GraphicsQualityLevel device(c.level);
+    ScopedCapabilities device(c.level ? "{\"graphics-quality-level\": " + QByteArray::number(*c.level) + "}" : QByteArray());
     std::unique_ptr<ZafVideoOverlayButton> button(ZafVideoOverlayButtonFactory::_srVideoOverlayButtonWithStyle(c.style));
     ASSERT_NE(button, nullptr);
     EXPECT_EQ(button->style(), c.style);

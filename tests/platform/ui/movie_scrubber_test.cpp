@@ -1,6 +1,4 @@
-// MovieScrubber: what the thumbnail strip asks its data source and which images it keeps and draws,
-// what the pointer and the keys report on the playhead and the trim handles, and zooming in while a
-// handle is held. The rules and geometry behind them are in timeline_model_test.cpp.
+// MovieScrubber: what it asks, keeps, draws and reports; the rules behind it are in timeline_model_test.cpp.
 #include "platform/ui/movie_scrubber.h"
 #include "platform/ui/timeline_timer.h"
 #include "tests/support/wait_until.h"
@@ -211,12 +209,6 @@ TEST_F(ScrubberTest, WorksWithoutADelegate)
     key(Qt::Key_End);
     EXPECT_DOUBLE_EQ(scrubber.editingStartValue(), 10.0);
     EXPECT_DOUBLE_EQ(scrubber.value(), 40.0);
-}
-
-TEST_F(ScrubberTest, HandleZoomWaitsHalfASecondByDefault)
-{
-    press(415);
-    EXPECT_EQ(timer->running, std::chrono::milliseconds(500));
 }
 
 TEST_F(ScrubberTest, LeavingEditingKeepsTheRange)

@@ -1,6 +1,5 @@
-// The timeline model without a widget: thumbnail slots, strip positions and times, grips, the trim
-// range and playhead rules, reloads, the zoom window and the key steps. The strip of the 420 x 38
-// scrubber is x 10 .. 410, so on a 40 s movie one point is a tenth of a second.
+// The timeline model without a widget. The strip of the 420 x 38 scrubber is x 10 .. 410, so on a
+// 40 s movie one point is a tenth of a second.
 #include "platform/ui/timeline_model.h"
 
 #include <gtest/gtest.h>

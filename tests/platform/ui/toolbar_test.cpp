@@ -1,5 +1,4 @@
-// Toolbar and BarButtonItem: item lists set whole, spaces, tint, image insets, custom views and
-// the items' standard texts, on real widgets.
+// Toolbar and BarButtonItem on real widgets.
 #include "platform/ui/bar_button_item.h"
 #include "platform/ui/toolbar.h"
 
@@ -226,10 +225,8 @@ TEST_F(ToolbarTest, ClickingAButtonSendsTheActionEvenWhenItReplacesTheItems)
     settle();
     QWidget *button = top->widgetForItemAt(1);
     const QPointF centre = button->rect().center();
-    QMouseEvent press(QEvent::MouseButtonPress, centre, button->mapToGlobal(centre), Qt::LeftButton,
-                      Qt::LeftButton, Qt::NoModifier);
-    QMouseEvent release(QEvent::MouseButtonRelease, centre, button->mapToGlobal(centre), Qt::LeftButton,
-                        Qt::NoButton, Qt::NoModifier);
+    QMouseEvent press(QEvent::MouseButtonPress, centre, button->mapToGlobal(centre), Qt::LeftButton, Qt::LeftButton, Qt::NoModifier);
+    QMouseEvent release(QEvent::MouseButtonRelease, centre, button->mapToGlobal(centre), Qt::LeftButton, Qt::NoButton, Qt::NoModifier);
     QApplication::sendEvent(button, &press);
     QApplication::sendEvent(button, &release);
     EXPECT_EQ(plays, 1);

@@ -1,5 +1,4 @@
-// ViewController and WindowHost: appearance order, containment, size transitions, first responder
-// and the shake (Ctrl+Z), closing, and modal presentation, on real windows.
+// ViewController and WindowHost on real windows.
 #include "platform/ui/transition_coordinator.h"
 #include "platform/ui/view_controller.h"
 #include "platform/ui/window_host.h"
