@@ -1,13 +1,11 @@
 // The publishing plug-in as the editor uses it: loaded from its file, its agent class found by name,
 // the form's interior reached by name and the agent's delegate calls. Uploads: see the flow tests.
-#include "platform/ui/view_controller.h"
 #include "publishing/form_reflection.h"
 #include "publishing/plugin_loader.h"
-#include "publishing/publishing_agent.h"
 #include "publishing/youtube_activity.h"
-#include "tests/publishing/case_names.h"
-#include "tests/publishing/sign_in_support.h"
+#include "tests/publishing/agent_test_support.h"
 #include "tests/support/log_capture.h"
+#include "tests/support/named_cases.h"
 #include "tests/support/temp_dir.h"
 #include "tests/support/wait_until.h"
 
@@ -19,7 +17,10 @@
 
 namespace {
 
-using zaf::test::PrintTo;
+ZAF_PRINT_CASES_AS_NAMES
+using zaf::test::formOf;
+using zaf::test::invokeForObject;
+using zaf::test::invokeForString;
 
 const QString kPluginPath = QStringLiteral(ZAF_PUBLISHING_PLUGIN_PATH);
 
@@ -30,29 +31,9 @@ std::unique_ptr<ZafPublishingAgent> makeAgent()
     if (!agentClass.ok())
         return nullptr;
     std::unique_ptr<ZafPublishingAgent> agent(qobject_cast<ZafPublishingAgent *>(agentClass.value->newInstance()));
-    if (agent && !agent->navigationController()->childViewControllers().isEmpty())
-        agent->navigationController()->childViewControllers().first()->view();
+    if (auto *form = formOf(agent.get()))
+        form->view();
     return agent;
-}
-
-QObject *formOf(ZafPublishingAgent *agent)
-{
-    const QList<zaf::ui::ViewController *> children = agent->navigationController()->childViewControllers();
-    return children.isEmpty() ? nullptr : children.first();
-}
-
-QObject *invokeForObject(QObject *target, const char *method)
-{
-    QObject *result = nullptr;
-    QMetaObject::invokeMethod(target, method, Q_RETURN_ARG(QObject *, result));
-    return result;
-}
-
-QString invokeForString(QObject *target, const char *method)
-{
-    QString result;
-    QMetaObject::invokeMethod(target, method, Q_RETURN_ARG(QString, result));
-    return result;
 }
 
 class RecordingDelegate : public ZafPublishingAgentDelegate {
@@ -84,15 +65,7 @@ protected:
     RecordingDelegate m_delegate;
 };
 
-// The plug-in loads with the API version this program needs.
-TEST(PublishingPluginTest, LoadsWithTheExpectedApiVersion)
-{
-    const auto plugin = zaf::publishing::loadPublishingPlugin(kPluginPath);
-    ASSERT_TRUE(plugin.ok()) << plugin.errorText.toStdString();
-    EXPECT_EQ(plugin.value->apiVersion(), kZafPublishingPluginApiVersion);
-}
-
-// The agent class is found by name, once: a later look-up gives the same class, which makes agents.
+// Once: a later look-up gives the same class, which makes agents.
 TEST(PublishingPluginTest, FindsTheAgentClassByName)
 {
     const auto agentClass = zaf::publishing::publishingAgentClass(kPluginPath, QLatin1String(kZafYouTubePublishingAgentClassName));
@@ -106,8 +79,7 @@ TEST(PublishingPluginTest, FindsTheAgentClassByName)
 
 class RefusedLookupTest : public ::testing::TestWithParam<const char *> {};
 
-// A wrong class name, a file that is no plug-in and a missing file are refused with a reason that
-// names the class or the file.
+// The reason names the class or the file.
 TEST_P(RefusedLookupTest, IsRefusedWithAReason)
 {
     zaf::test::ScratchDir scratch;
@@ -157,7 +129,6 @@ TEST_F(PublishingAgentTest, TheFormsOwnRoutinePreselects22)
     EXPECT_EQ(invokeForString(invokeForObject(form, kZafFormCategoryCellMethod), "categoryString"), QStringLiteral("People & Blogs"));
 }
 
-// A replaced default-category routine runs for every later form.
 TEST(PublishingPluginTest, AReplacedDefaultCategoryRoutineRunsForEveryLaterForm)
 {
     const auto plugin = zaf::publishing::loadPublishingPlugin(kPluginPath);
@@ -179,7 +150,6 @@ TEST(PublishingPluginTest, AReplacedDefaultCategoryRoutineRunsForEveryLaterForm)
     plugin.value->setFormDefaultCategoryRoutine({});
 }
 
-// An empty routine restores the form's own.
 TEST(PublishingPluginTest, AnEmptyRoutineRestoresTheFormsOwn)
 {
     const auto plugin = zaf::publishing::loadPublishingPlugin(kPluginPath);
@@ -222,9 +192,8 @@ INSTANTIATE_TEST_SUITE_P(Reaches, MissingMemberTest, ::testing::Values(
                       {"the publishing form has no _table"}, ""},
     MissingMemberCase{"AgentCancel", [](QObject *form) { zaf::publishing::invokeByName(form, kZafAgentCancelMethod); },
                       {"the publishing form does not answer cancelAction on QObject"}, ""}),
-    zaf::test::kCaseName);
+    zaf::test::caseName);
 
-// The form's appearance and its Done and Cancel buttons reach the delegate, in that order.
 TEST_F(PublishingAgentTest, TheFormsEventsReachTheDelegate)
 {
     m_agent->navigationController()->beginAppearanceTransition(true, false);
@@ -234,7 +203,7 @@ TEST_F(PublishingAgentTest, TheFormsEventsReachTheDelegate)
     EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("displayed"), QStringLiteral("done"), QStringLiteral("cancel")}));
 }
 
-// Without an access token or a client id to sign in with, publishing ends at once, naming the setting.
+// Naming the setting.
 TEST_F(PublishingAgentTest, WithoutCredentialsPublishingEndsAtOnceWithAnError)
 {
     qunsetenv("ZAF_YOUTUBE_ACCESS_TOKEN");

@@ -1,5 +1,4 @@
-// The progress overlay over the publishing form: its fades, the indicator made when the fade-in
-// ends, the progress display under it and the removal when it hides.
+// The progress overlay over the publishing form.
 #include "publishing/progress_overlay.h"
 
 #include "platform/ui/activity_indicator.h"
@@ -91,7 +90,7 @@ TEST_F(ProgressOverlayTest, ShowingTwiceBuildsTheOverlayOnce)
     EXPECT_GT(m_overlay->progressBar()->geometry().top(), indicator->geometry().bottom());
 }
 
-// Before the indicator exists stopActivity does nothing, so the fade-in still brings it on screen.
+// The fade-in still brings the indicator on screen.
 TEST_F(ProgressOverlayTest, StopActivityDuringFadeInDoesNothing)
 {
     m_overlay->setShowingAnimated(true, true);
@@ -103,7 +102,7 @@ TEST_F(ProgressOverlayTest, StopActivityDuringFadeInDoesNothing)
     EXPECT_TRUE(m_overlay->activityIndicator()->isVisible());
 }
 
-// From set-up on, the overlay's own Cancel is on top of it and asks for cancelling.
+// From set-up on, on top of it.
 TEST_F(ProgressOverlayTest, ItsOwnCancelAsksForCancelling)
 {
     m_overlay->setShowingAnimated(true, true);
@@ -118,8 +117,7 @@ TEST_F(ProgressOverlayTest, ItsOwnCancelAsksForCancelling)
     EXPECT_EQ(cancels, 1);
 }
 
-// Once the fade-in is over, stopActivity takes the indicator and the Cancel off the screen; the
-// dimming, the progress and the overlay stay.
+// The indicator and the Cancel go off the screen; the dimming, the progress and the overlay stay.
 TEST_F(ProgressOverlayTest, StopActivityLeavesTheDimmingWithTheProgress)
 {
     m_overlay->setShowingAnimated(true, true);
@@ -197,7 +195,7 @@ TEST_F(ProgressOverlayTest, ProgressDisplayFollowsSetProgress)
     EXPECT_EQ(bar->maximum(), 0);
 }
 
-// The text rounds down, clamps at 100 % and is empty when the total is unknown.
+// Empty when the total is unknown.
 class ProgressTextTest : public ::testing::TestWithParam<std::pair<double, const char *>> {};
 
 TEST_P(ProgressTextTest, RoundsDownWithinZeroToAHundred)

@@ -1,6 +1,6 @@
 // The metadata rules of the video service: what normalising repairs and what it refuses.
 #include "publishing/plugin/upload/video_metadata.h"
-#include "tests/publishing/case_names.h"
+#include "tests/support/named_cases.h"
 
 #include <QJsonDocument>
 #include <QJsonObject>
@@ -10,7 +10,7 @@ using namespace zaf::publishing;
 
 namespace {
 
-using zaf::test::PrintTo;
+ZAF_PRINT_CASES_AS_NAMES
 
 const QString kEmoji = QString::fromUtf8("\xF0\x9F\x8E\xAE");
 
@@ -20,6 +20,14 @@ struct TitleCase {
 };
 
 class TitleTest : public ::testing::TestWithParam<TitleCase> {};
+
+struct RefusedCase {
+    const char *name;
+    const char *categoryId, *privacyStatus;
+    int code;
+};
+
+class RefusedMetadataTest : public ::testing::TestWithParam<RefusedCase> {};
 
 } // namespace
 
@@ -37,7 +45,7 @@ INSTANTIATE_TEST_SUITE_P(Titles, TitleTest, ::testing::Values(
     TitleCase{"TooLong", QString(150, QLatin1Char('a')), QString(100, QLatin1Char('a'))},
     // The 100th character is one whole emoji (two UTF-16 units).
     TitleCase{"CutAfterASurrogatePair", QString(99, QLatin1Char('b')) + kEmoji + kEmoji, QString(99, QLatin1Char('b')) + kEmoji}),
-    zaf::test::kCaseName);
+    zaf::test::caseName);
 
 // Descriptions lose angle brackets and are cut at 5000 UTF-8 bytes on a character boundary.
 TEST(VideoMetadata, normaliseDescriptionCutsOnACharacterBoundary)
@@ -51,17 +59,6 @@ TEST(VideoMetadata, normaliseDescriptionCutsOnACharacterBoundary)
     EXPECT_EQ(VideoMetadata::normaliseDescription(fits), fits);
 }
 
-namespace {
-struct RefusedCase {
-    const char *name;
-    const char *categoryId, *privacyStatus;
-    int code;
-};
-
-class RefusedMetadataTest : public ::testing::TestWithParam<RefusedCase> {};
-} // namespace
-
-// A category that cannot be assigned and an unknown privacy status are errors.
 TEST_P(RefusedMetadataTest, normalisedRefusesWhatCannotBeRepaired)
 {
     VideoMetadata metadata;
@@ -72,7 +69,7 @@ TEST_P(RefusedMetadataTest, normalisedRefusesWhatCannotBeRepaired)
 
 INSTANTIATE_TEST_SUITE_P(Fields, RefusedMetadataTest, ::testing::Values(
     RefusedCase{"CategoryThatCannotBeAssigned", "18", "private", InvalidCategoryError}, // it exists
-    RefusedCase{"UnknownPrivacyStatus", "20", "friends", InvalidPrivacyStatusError}), zaf::test::kCaseName);
+    RefusedCase{"UnknownPrivacyStatus", "20", "friends", InvalidPrivacyStatusError}), zaf::test::caseName);
 
 // The JSON carries the normalised fields; the privacy status is read in any case and with spaces.
 TEST(VideoMetadata, toJsonWritesTheNormalisedFields)

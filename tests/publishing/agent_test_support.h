@@ -1,8 +1,11 @@
 #pragma once
 
-// Helpers for the browser sign-in tests: the environment that makes the agent sign in (a client id,
-// no access token), and a stand-in for the browser that takes the authorization page the process
-// opens instead of starting a desktop browser. Main thread only.
+// Helpers for the tests that drive the publishing agent: calls by name on its form, the environment
+// that makes it sign in (a client id, no access token), and a stand-in for the browser that takes
+// the authorization page the process opens instead of starting a desktop browser. Main thread only.
+
+#include "platform/ui/view_controller.h"
+#include "publishing/publishing_agent.h"
 
 #include <QDesktopServices>
 #include <QObject>
@@ -11,6 +14,27 @@
 #include <QUrlQuery>
 
 namespace zaf::test {
+
+inline QObject *invokeForObject(QObject *target, const char *method)
+{
+    QObject *result = nullptr;
+    QMetaObject::invokeMethod(target, method, Q_RETURN_ARG(QObject *, result));
+    return result;
+}
+
+inline QString invokeForString(QObject *target, const char *method)
+{
+    QString result;
+    QMetaObject::invokeMethod(target, method, Q_RETURN_ARG(QString, result));
+    return result;
+}
+
+// The agent's form, the first view controller of its navigation; null when it has none.
+inline ui::ViewController *formOf(ZafPublishingAgent *agent)
+{
+    const QList<ui::ViewController *> children = agent ? agent->navigationController()->childViewControllers() : QList<ui::ViewController *>();
+    return children.isEmpty() ? nullptr : children.first();
+}
 
 class BrowserStub : public QObject {
     Q_OBJECT
