@@ -1,6 +1,4 @@
-// The editor extension driven over a real socket pair, in this process (the test is the host): the
-// input items decoded by title, whatever their order, into exactly one editor; the report to the
-// host; and the tear-down when the host removes the view.
+// The editor extension over a real socket pair, in this process (the test is the host).
 #include "extension/extension_declaration.h"
 #include "extension/extension_keys.h"
 #include "extension/extension_view_controller.h"
@@ -12,6 +10,7 @@
 #include "tests/platform/extensionkit/socket_pair.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/named_cases.h"
 #include "tests/support/process_temp_directory.h"
 #include "tests/support/temp_dir.h"
 
@@ -170,18 +169,19 @@ TEST_F(ExtensionTest, CompletedActivitiesThenDoneAreReportedInOrder)
     EXPECT_EQ(reportedTypes(), (QStringList{"com.zafrel.activity.Mail", "ZafPublishToYouTube"}));
 }
 
-// The host removes the view before the user finished, or the host dies (its end of the channel
-// closes): either way the extension tears down without a report, empties its temporary directory
-// and keeps the host's movie as it was.
-class ExtensionRemovalTest : public ExtensionTest, public ::testing::WithParamInterface<bool> {};
+// The host removes the view before the user finished (with or without an editor), or the host dies
+// (its end of the channel closes): the extension tears down without a report and keeps the host's
+// movie as it was; the editor's end empties the temporary directory.
+struct Removal { const char *name; bool hostDies, withEditor; };
+class ExtensionRemovalTest : public ExtensionTest, public ::testing::WithParamInterface<Removal> {};
 
 TEST_P(ExtensionRemovalTest, TearsDownWithoutReportEmptiesTheDirectoryAndKeepsTheMovie)
 {
-    const bool hostDies = GetParam();
+    const bool hostDies = GetParam().hostDies;
     const QByteArray movieBefore = fileDigest(moviePath);
     LogCapture logs;
-    beginWith(requiredItems());
-    ASSERT_NE(editor(), nullptr);
+    beginWith(GetParam().withEditor ? requiredItems() : QList<Item>{text(ZafVideoEditorExtensionAppNameKey, "Recorder")});
+    ASSERT_EQ(editor() != nullptr, GetParam().withEditor);
     QFile leftover(ZafTempStore::defaultStore()._srTempPath() + "Recorder_1.mp4");
     ASSERT_TRUE(leftover.open(QIODevice::WriteOnly));
     leftover.close();
@@ -192,7 +192,8 @@ TEST_P(ExtensionRemovalTest, TearsDownWithoutReportEmptiesTheDirectoryAndKeepsTh
         removeView();
     ASSERT_TRUE(waitUntil([&] { return finished; }, 5000));
     EXPECT_EQ(editor(), nullptr);
-    EXPECT_TRUE(tempEntries().isEmpty());
+    if (GetParam().withEditor)
+        EXPECT_TRUE(tempEntries().isEmpty());
     EXPECT_EQ(fileDigest(moviePath), movieBefore);
     if (hostDies)
         EXPECT_EQ(logs.count("channel closed: the host closed the connection"), 1);
@@ -200,7 +201,8 @@ TEST_P(ExtensionRemovalTest, TearsDownWithoutReportEmptiesTheDirectoryAndKeepsTh
         EXPECT_FALSE(reportedTypes(300).has_value());
 }
 
-INSTANTIATE_TEST_SUITE_P(RemovedOrHostGone, ExtensionRemovalTest, ::testing::Bool());
+INSTANTIATE_TEST_SUITE_P(Endings, ExtensionRemovalTest, ::testing::Values(Removal{"Removed", false, true},
+    Removal{"HostGone", true, true}, Removal{"RemovedWithoutEditor", false, false}), caseName);
 
 // The host's items made no editor: the window must still close. Closing it, or Escape, is Cancel:
 // one empty report, so that the host removes the view.
@@ -225,16 +227,6 @@ TEST_P(ExtensionWithoutEditorTest, ClosingTheWindowOrEscapeReportsAnEmptyArrayOn
 }
 
 INSTANTIATE_TEST_SUITE_P(CloseOrEscape, ExtensionWithoutEditorTest, ::testing::Bool());
-
-TEST_F(ExtensionTest, RemovalWithNoEditorOnlyLogs)
-{
-    LogCapture logs;
-    beginWith({text(ZafVideoEditorExtensionAppNameKey, "Recorder")});
-    ASSERT_EQ(editor(), nullptr);
-    removeView();
-    ASSERT_TRUE(waitUntil([&] { return finished; }, 5000));
-    EXPECT_EQ(logs.count("ZafVideoEditorExtensionViewController -viewDidDisappear:"), 1);
-}
 
 } // namespace
 } // namespace zaf::test
