@@ -2,9 +2,7 @@
 // a replaced item, and nothing else is left in its directory, whatever fails and wherever.
 #include "platform/files/atomic_file.h"
 #include "tests/platform/file_faults.h"
-#include "tests/support/log_capture.h"
 #include "tests/support/named_cases.h"
-#include "tests/support/private_mounts.h"
 #include "tests/support/temp_dir.h"
 
 #include <QDir>
@@ -14,7 +12,6 @@
 
 #include <cerrno>
 #include <functional>
-#include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -40,15 +37,17 @@ void danglingLink(const QString &destination)
     ASSERT_TRUE(QFile::link(QStringLiteral("nowhere"), destination));
 }
 
-// Every way an atomic write of "new" to "movie.mp4" can end.
+// Every way an atomic write of "new" can end.
 struct EndingCase {
     const char *name;
-    Faults faults;
-    std::function<void(const QString &destination)> before;    // before create()
-    std::function<void(const QString &destination)> meanwhile; // between writing and commit()
-    int createError;
-    int commitError;     // -1: dropped without commit()
-    QByteArray expected; // at the destination afterwards; empty: nothing there
+    Faults faults = {};
+    std::function<void(const QString &destination)> before = {};    // before create()
+    std::function<void(const QString &destination)> meanwhile = {}; // between writing and commit()
+    int createError = 0;
+    int commitError = 0;                   // -1: dropped without commit()
+    QByteArray expected = {};              // at the destination afterwards; empty: nothing there
+    const char *destination = "movie.mp4"; // inside the scratch directory; "" for the empty name
+    const char *named = nullptr;           // what a create error names there; null: the destination
 };
 
 class AtomicFileEnding : public ::testing::TestWithParam<EndingCase> {};
@@ -57,7 +56,7 @@ TEST_P(AtomicFileEnding, LeavesTheWholeFileOrWhatWasThere)
 {
     const EndingCase &c = GetParam();
     test::ScratchDir scratch;
-    const QString destination = scratch.file(QStringLiteral("movie.mp4"));
+    const QString destination = *c.destination ? scratch.file(c.destination) : QString();
     if (c.before)
         c.before(destination);
     const QStringList initially = entryNames(scratch.path());
@@ -66,7 +65,7 @@ TEST_P(AtomicFileEnding, LeavesTheWholeFileOrWhatWasThere)
     if (c.createError) {
         ASSERT_FALSE(file.ok());
         EXPECT_EQ(file.error->code, c.createError);
-        EXPECT_TRUE(file.error->message.contains(destination)) << qPrintable(file.error->message);
+        EXPECT_TRUE(file.error->message.contains(c.named ? scratch.file(c.named) : destination)) << qPrintable(file.error->message);
     } else {
         ASSERT_TRUE(file.ok()) << qPrintable(file.error->message);
         AtomicFile &f = **file.value;
@@ -86,19 +85,25 @@ TEST_P(AtomicFileEnding, LeavesTheWholeFileOrWhatWasThere)
 
 INSTANTIATE_TEST_SUITE_P(
     Cases, AtomicFileEnding,
-    ::testing::Values(EndingCase{"WrittenFlushedPutInPlace", {}, {}, {}, 0, 0, "new"},
-                      EndingCase{"DestinationExists", {}, putOld, {}, EEXIST, 0, "old"},
-                      EndingCase{"DanglingLinkAtTheDestination", {}, danglingLink, {}, EEXIST, 0, {}},
-                      EndingCase{"DestinationAppearsWhileWriting", {}, {}, putOld, 0, EEXIST, "old"},
-                      EndingCase{"Abandoned", {}, {}, {}, 0, -1, {}},
-                      EndingCase{"FlushFails", {.fileSync = EIO}, {}, {}, 0, EIO, {}},
-                      EndingCase{"DiskFullAtTheFlush", {.fileSync = ENOSPC}, {}, {}, 0, ENOSPC, {}},
-                      EndingCase{"RenameFails", {.renameat2 = EIO}, {}, {}, 0, EIO, {}},
-                      EndingCase{"NoRenameNoReplaceLinkedIntoPlace", {.renameat2 = EINVAL}, {}, {}, 0, 0, "new"},
-                      EndingCase{"NoRenameNoReplaceLinkRefuses", {.renameat2 = EINVAL}, {}, putOld, 0, EEXIST, "old"},
-                      EndingCase{"NoHardLinksCheckedRename", {.renameat2 = ENOSYS, .link = EPERM}, {}, {}, 0, 0, "new"},
-                      EndingCase{"NoHardLinksCheckRefuses", {.renameat2 = EINVAL, .link = EPERM}, {}, putOld, 0, EEXIST, "old"},
-                      EndingCase{"LinkFailsOtherwise", {.renameat2 = EINVAL, .link = EIO}, {}, {}, 0, EIO, {}}),
+    ::testing::Values(EndingCase{.name = "WrittenFlushedPutInPlace", .expected = "new"},
+                      EndingCase{.name = "DestinationExists", .before = putOld, .createError = EEXIST, .expected = "old"},
+                      EndingCase{.name = "DanglingLinkAtTheDestination", .before = danglingLink, .createError = EEXIST},
+                      EndingCase{.name = "EmptyName", .createError = ENOENT, .destination = ""},
+                      EndingCase{.name = "MissingDirectory", .createError = ENOENT, .destination = "none/movie.mp4", .named = "none"},
+                      EndingCase{.name = "DestinationAppearsWhileWriting", .meanwhile = putOld, .commitError = EEXIST, .expected = "old"},
+                      EndingCase{.name = "Abandoned", .commitError = -1},
+                      EndingCase{.name = "FlushFails", .faults = {.fileSync = EIO}, .commitError = EIO},
+                      EndingCase{.name = "DiskFullAtTheFlush", .faults = {.fileSync = ENOSPC}, .commitError = ENOSPC},
+                      // The file is in place before its directory is flushed; that failure is only logged.
+                      EndingCase{.name = "DirectoryFlushFails", .faults = {.directorySync = EIO}, .expected = "new"},
+                      EndingCase{.name = "RenameFails", .faults = {.renameat2 = EIO}, .commitError = EIO},
+                      EndingCase{.name = "NoRenameNoReplaceLinkedIntoPlace", .faults = {.renameat2 = EINVAL}, .expected = "new"},
+                      EndingCase{.name = "NoRenameNoReplaceLinkRefuses", .faults = {.renameat2 = EINVAL}, .meanwhile = putOld,
+                                 .commitError = EEXIST, .expected = "old"},
+                      EndingCase{.name = "NoHardLinksCheckedRename", .faults = {.renameat2 = ENOSYS, .link = EPERM}, .expected = "new"},
+                      EndingCase{.name = "NoHardLinksCheckRefuses", .faults = {.renameat2 = EINVAL, .link = EPERM}, .meanwhile = putOld,
+                                 .commitError = EEXIST, .expected = "old"},
+                      EndingCase{.name = "LinkFailsOtherwise", .faults = {.renameat2 = EINVAL, .link = EIO}, .commitError = EIO}),
     test::caseName);
 
 // The finished file gets the permissions any new file of the user gets: 0666 less the umask.
@@ -165,47 +170,6 @@ TEST(AtomicFile, LongDestinationNameKeepsTheTemporaryWithinNameMax)
     EXPECT_EQ(entryNames(scratch.path()), QStringList{name});
 }
 
-// The file is in place when the flush of its directory fails; the failure is only logged.
-TEST(AtomicFile, DirectoryFlushFailureIsOnlyLogged)
-{
-    test::ScratchDir scratch;
-    Result<std::unique_ptr<AtomicFile>> file = AtomicFile::create(scratch.file("movie.mp4"));
-    ASSERT_TRUE(file.ok());
-    test::LogCapture logs;
-    const FaultScope scope({.directorySync = EIO});
-    EXPECT_FALSE((*file.value)->commit().has_value());
-    EXPECT_EQ(entryNames(scratch.path()), QStringList{"movie.mp4"});
-    EXPECT_TRUE(logs.messages("zaf.files").join('\n').contains("cannot flush the directory " + scratch.path()));
-}
-
-// Where a destination cannot be reserved, the error names it or its directory.
-struct CreateErrorCase {
-    const char *name;
-    const char *destination; // inside the scratch directory; "" for the empty name
-    int error;
-    const char *named; // what the message names, inside the scratch directory; null: nothing to name
-};
-
-class AtomicFileCreateError : public ::testing::TestWithParam<CreateErrorCase> {};
-
-TEST_P(AtomicFileCreateError, NamesThePath)
-{
-    test::ScratchDir scratch;
-    const QString destination = *GetParam().destination ? scratch.file(GetParam().destination) : QString();
-    const Result<std::unique_ptr<AtomicFile>> file = AtomicFile::create(destination);
-    ASSERT_FALSE(file.ok());
-    EXPECT_EQ(file.error->code, GetParam().error);
-    if (GetParam().named) {
-        EXPECT_TRUE(file.error->message.contains(scratch.file(GetParam().named))) << qPrintable(file.error->message);
-    }
-    EXPECT_EQ(entryNames(scratch.path()), QStringList());
-}
-
-INSTANTIATE_TEST_SUITE_P(Cases, AtomicFileCreateError,
-                         ::testing::Values(CreateErrorCase{"EmptyName", "", ENOENT, nullptr},
-                                           CreateErrorCase{"MissingDirectory", "none/movie.mp4", ENOENT, "none"}),
-                         test::caseName);
-
 // moveWithoutReplacing() for files and directories, with each step of its chain.
 struct MoveCase {
     const char *name;
@@ -250,59 +214,6 @@ INSTANTIATE_TEST_SUITE_P(Cases, MoveWithoutReplacing,
                                            MoveCase{"DirectoryWithoutRenameNoReplaceOntoAFile", true, {.renameat2 = EINVAL}, true, EEXIST},
                                            MoveCase{"RenameFails", false, {.renameat2 = EIO}, false, EIO}),
                          test::caseName);
-
-// On a file system of its own that fails the write: a full one, where the caller's write stops with
-// ENOSPC, and a read-only one, where nothing can be reserved. The other file there stays as it was,
-// and no temporary is left.
-struct VolumeCase {
-    const char *name;
-    bool readOnly;
-    int createError; // 0: the write runs into the full disk instead
-};
-
-class AtomicFileOnItsOwnVolume : public ::testing::TestWithParam<VolumeCase> {};
-
-TEST_P(AtomicFileOnItsOwnVolume, FailsKeepingTheOtherFile)
-{
-    if (!test::insidePrivateMounts())
-        return test::runThisTestInPrivateMounts();
-    test::ScratchDir scratch;
-    const QString volumePath = scratch.file("volume");
-    ASSERT_TRUE(QDir().mkpath(volumePath));
-    const test::ScopedTmpfs volume(volumePath, 256 * 1024);
-    if (!volume.mounted())
-        return;
-    const QString other = volumePath + "/old.mp4";
-    {
-        QFile f(other);
-        ASSERT_TRUE(f.open(QIODevice::WriteOnly));
-        ASSERT_EQ(f.write(QByteArray(64 * 1024, 'o')), 64 * 1024);
-    }
-    if (GetParam().readOnly) {
-        ASSERT_EQ(::mount(nullptr, QFile::encodeName(volumePath).constData(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
-    }
-
-    Result<std::unique_ptr<AtomicFile>> file = AtomicFile::create(volumePath + "/new.mp4");
-    if (GetParam().createError) {
-        ASSERT_FALSE(file.ok());
-        EXPECT_EQ(file.error->code, GetParam().createError);
-        EXPECT_TRUE(file.error->message.contains(volumePath)) << qPrintable(file.error->message);
-    } else {
-        ASSERT_TRUE(file.ok()) << qPrintable(file.error->message);
-        const QByteArray chunk(64 * 1024, 'n');
-        ssize_t written = 0;
-        for (int i = 0; i < 16 && written >= 0; ++i)
-            written = ::write((*file.value)->descriptor(), chunk.constData(), size_t(chunk.size()));
-        EXPECT_EQ(written, -1);
-        EXPECT_EQ(errno, ENOSPC);
-        file.value->reset();
-    }
-    EXPECT_EQ(entryNames(volumePath), QStringList{"old.mp4"});
-    EXPECT_EQ(fileContents(other), QByteArray(64 * 1024, 'o'));
-}
-
-INSTANTIATE_TEST_SUITE_P(Cases, AtomicFileOnItsOwnVolume,
-                         ::testing::Values(VolumeCase{"FullDisk", false, 0}, VolumeCase{"ReadOnly", true, EROFS}), test::caseName);
 
 } // namespace
 } // namespace zaf
