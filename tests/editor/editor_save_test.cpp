@@ -1,5 +1,4 @@
-// Save and done: the mixed movie reaches the video library, the report holds the save (after any
-// completed share), and no file is lost when the library fails.
+// Save and done: the mixed movie reaches the video library, the report, and no file lost on a fault.
 #include "tests/editor/editor_test_support.h"
 #include "tests/support/private_mounts.h"
 
