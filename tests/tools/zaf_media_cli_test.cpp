@@ -1,6 +1,7 @@
 // zaf-media, run as a user runs it: its probe agrees with ffprobe, its jobs write what they say,
 // and failures exit non-zero with a message.
 #include "tests/support/media/fixture_movies.h"
+#include "tests/support/named_cases.h"
 #include "tests/support/temp_dir.h"
 
 #include <QDir>
@@ -11,10 +12,10 @@
 
 #include <gtest/gtest.h>
 
-#include <cmath>
-
 namespace zaf::test {
 namespace {
+
+ZAF_PRINT_CASES_AS_NAMES
 
 ToolRun zafMedia(const QStringList &args)
 {
@@ -77,7 +78,6 @@ protected:
     const QString source = sharedFixtureMovie({.seconds = 4, .audioTracks = 2});
 };
 
-// trim keeps exactly its frames.
 TEST_F(ZafMediaJobs, TrimWritesTheFramesOfItsRange)
 {
     const QString trimmed = scratch.file(QStringLiteral("trim.mp4"));
@@ -89,7 +89,6 @@ TEST_F(ZafMediaJobs, TrimWritesTheFramesOfItsRange)
     EXPECT_EQ(readFrameNumbers(trimmed), expected);
 }
 
-// mix leaves one audio track and prints the output path.
 TEST_F(ZafMediaJobs, MixWritesOneAudioTrackAndPrintsItsPath)
 {
     const QString mixed = scratch.file(QStringLiteral("mix.mp4"));
@@ -115,43 +114,11 @@ TEST_F(ZafMediaJobs, ThumbnailsWriteEvenlySpacedPictures)
     }
 }
 
-// thumbnails of movies with tiny and odd sizes, at heights down to one pixel, write every picture
-// at the height asked (never above the movie's own) with the movie's aspect.
-class ZafMediaTinyThumbnails : public ::testing::TestWithParam<std::tuple<QSize, int>> {};
-
-TEST_P(ZafMediaTinyThumbnails, WriteEveryPictureAtBoundedHeight)
-{
-    const auto [size, height] = GetParam();
-    ScratchDir scratch;
-    const QDir thumbs(scratch.path());
-    const ToolRun r = zafMedia(QStringList{QStringLiteral("thumbnails"), sharedFlatColourMovie(size), QStringLiteral("--count"), QStringLiteral("3"),
-                                           QStringLiteral("--height"), QString::number(height), QStringLiteral("--out"), thumbs.path()});
-    ASSERT_TRUE(r.ok()) << "exit " << r.exitCode << ": " << r.err.toStdString();
-    const QStringList pngs = thumbs.entryList({QStringLiteral("*.png")}, QDir::Files, QDir::Name);
-    ASSERT_EQ(pngs.size(), 3);
-    const int expectedHeight = std::min(height, size.height());
-    for (const QString &png : pngs) {
-        const QImage image(thumbs.filePath(png));
-        EXPECT_EQ(image.height(), expectedHeight);
-        EXPECT_EQ(image.width(), std::max(1, int(std::lround(double(size.width()) * expectedHeight / size.height()))));
-    }
-}
-
-INSTANTIATE_TEST_SUITE_P(Sizes, ZafMediaTinyThumbnails,
-                         ::testing::Combine(::testing::Values(QSize(2, 2), QSize(3, 3), QSize(4, 4), QSize(6, 4), QSize(15, 15), QSize(16, 16),
-                                                              QSize(641, 361)),
-                                            ::testing::Values(38, 2, 1)),
-                         [](const auto &info) {
-                             const QSize size = std::get<0>(info.param);
-                             return std::to_string(size.width()) + "x" + std::to_string(size.height()) + "At" + std::to_string(std::get<1>(info.param));
-                         });
-
 // A failed command exits non-zero with a message and leaves no output.
 struct FailingCommand {
     const char *name;
     const char *arguments; // GARBAGE, MISSING and OUT stand for files in the scratch directory
 };
-void PrintTo(const FailingCommand &c, std::ostream *os) { *os << c.name; }
 
 class ZafMediaFailure : public ::testing::TestWithParam<FailingCommand> {};
 
@@ -177,7 +144,7 @@ INSTANTIATE_TEST_SUITE_P(Commands, ZafMediaFailure,
                                            FailingCommand{"MixOfGarbage", "mix GARBAGE OUT"},
                                            FailingCommand{"ThumbnailsOfGarbage", "thumbnails GARBAGE --count 2 --height 50 --out OUT"},
                                            FailingCommand{"UnknownCommand", "unknown"}),
-                         [](const auto &info) { return std::string(info.param.name); });
+                         caseName);
 
 } // namespace
 } // namespace zaf::test
