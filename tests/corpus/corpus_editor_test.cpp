@@ -1,6 +1,5 @@
-// Every corpus movie through the editor's open path: the player item ends ready or failed, a ready
-// movie with video shows its first picture and fills the timeline with thumbnails, and garbage
-// fails with a logged error while the editor stays usable. Every wait is bounded.
+// Every corpus movie through the editor's open path: ready with a first picture and thumbnails, or
+// failed with a logged error and the editor saying so. Every wait is bounded.
 #include "tests/corpus/hostile_movies.h"
 #include "tests/editor/editor_test_support.h"
 
@@ -13,14 +12,11 @@ using zaf::media::PlayerItem;
 
 constexpr int kHangMs = 60000;
 
-class CorpusEditorTest : public EditorTest, public ::testing::WithParamInterface<std::string> {
-protected:
-    const HostileMovie &kind() const { return hostileMovie(QString::fromStdString(GetParam())); }
-};
+class CorpusEditorTest : public EditorTest, public ::testing::WithParamInterface<HostileMovie> {};
 
 TEST_P(CorpusEditorTest, OpenPathEndsCleanly)
 {
-    const HostileMovie &k = kind();
+    const HostileMovie &k = GetParam();
     if (const QString why = unavailableReason(k); !why.isEmpty())
         GTEST_SKIP() << qPrintable(why);
     const QString path = hostileMoviePath(k);
@@ -73,8 +69,7 @@ TEST_P(CorpusEditorTest, OpenPathEndsCleanly)
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(Corpus, CorpusEditorTest, ::testing::ValuesIn(hostileMovieNames()),
-                         [](const auto &info) { return info.param; });
+INSTANTIATE_TEST_SUITE_P(Corpus, CorpusEditorTest, ::testing::ValuesIn(hostileMovies()), caseName);
 
 } // namespace
 } // namespace zaf::test::corpus

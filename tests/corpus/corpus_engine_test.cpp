@@ -1,7 +1,5 @@
-// Every corpus movie through every command of the media engine, as the zaf-media tool and the
-// editor's save run them: probe (MediaAsset), trim (an export with a time range), mix (the save's
-// audio-mix export) and thumbnails (ImageGenerator). Garbage fails with an error and leaves no file,
-// valid movies give correct results, and nothing crashes or hangs: every wait is bounded.
+// Every corpus movie through probe, trim, the save's mix and thumbnails: garbage fails with an error
+// and leaves no file, valid movies give correct results, and every wait is bounded.
 #include "media/audio_mix_utility.h"
 #include "platform/media/export_session.h"
 #include "platform/media/image_generator.h"
@@ -44,17 +42,16 @@ void expectMediaError(const OptionalError &error)
     EXPECT_GT(error->code, 0) << describe(error);
 }
 
-class CorpusEngineTest : public ::testing::TestWithParam<std::string> {
+class CorpusEngineTest : public ::testing::TestWithParam<HostileMovie> {
 protected:
     void SetUp() override
     {
-        if (const QString why = unavailableReason(kind()); !why.isEmpty())
+        if (const QString why = unavailableReason(GetParam()); !why.isEmpty())
             GTEST_SKIP() << qPrintable(why);
-        m_path = hostileMoviePath(kind());
+        m_path = hostileMoviePath(GetParam());
         ASSERT_FALSE(m_path.isEmpty());
     }
 
-    const HostileMovie &kind() const { return hostileMovie(QString::fromStdString(GetParam())); }
     std::shared_ptr<MediaAsset> asset() const { return MediaAsset::assetWithURL(QUrl::fromLocalFile(m_path)); }
 
     // Runs the export to its end (bounded); false, with a failure, when it hangs.
@@ -71,34 +68,42 @@ protected:
         std::unique_lock lock(mutex);
         if (done.wait_for(lock, std::chrono::seconds(kHangSeconds), [&] { return finished; }))
             return true;
-        ADD_FAILURE() << "HANG: the export of " << kind().name << " did not finish within " << kHangSeconds << " s";
+        ADD_FAILURE() << "HANG: the export of " << GetParam().name << " did not finish within " << kHangSeconds << " s";
         session.cancelExportAndWait();
         done.wait_for(lock, std::chrono::seconds(kHangSeconds), [&] { return finished; });
         return false;
     }
 
-    // A failed export: an engine error, logged, and no output left behind.
-    void expectCleanFailure(const ExportSession &session, const QString &output)
+    // Runs the export; true when it made a movie to check further (its streams in m_video and
+    // m_audio). A failure must be clean: an engine error, logged, and no output left behind; it is
+    // a wrong success when `mustFail`. A damaged movie may fail, and its success must hold a stream.
+    bool exportedMovie(ExportSession &session, const QString &output, bool mustFail)
     {
-        EXPECT_EQ(session.status(), ExportStatus::Failed) << "WRONG SUCCESS: " << kind().name;
-        expectMediaError(session.error());
-        EXPECT_FALSE(QFileInfo::exists(output)) << "a failed export left " << qPrintable(output);
-        EXPECT_TRUE(loggedWarning(m_log)) << "the failure was not logged";
-    }
-
-    void expectCompleted(const ExportSession &session)
-    {
-        ASSERT_EQ(session.status(), ExportStatus::Completed) << kind().name << ": " << describe(session.error());
+        if (!run(session))
+            return false;
+        if (mustFail || (GetParam().nature == Nature::Damaged && session.status() != ExportStatus::Completed)) {
+            EXPECT_EQ(session.status(), ExportStatus::Failed) << "WRONG SUCCESS: " << GetParam().name;
+            expectMediaError(session.error());
+            EXPECT_FALSE(QFileInfo::exists(output)) << "a failed export left " << qPrintable(output);
+            EXPECT_TRUE(loggedWarning(m_log)) << "the failure was not logged";
+            return false;
+        }
+        EXPECT_EQ(session.status(), ExportStatus::Completed) << describe(session.error());
+        m_video = probeStreams(output, QStringLiteral("video"));
+        m_audio = probeStreams(output, QStringLiteral("audio"));
+        EXPECT_FALSE(m_video.isEmpty() && m_audio.isEmpty()) << "a successful export holds nothing";
+        return session.status() == ExportStatus::Completed && GetParam().nature != Nature::Damaged;
     }
 
     QString m_path;
+    QList<QJsonObject> m_video, m_audio;
     ScratchDir m_scratch;
     LogCapture m_log;
 };
 
-double seconds(const QJsonObject &stream, const char *key = "duration")
+double seconds(const QJsonObject &stream)
 {
-    return stream.value(QLatin1String(key)).toString().toDouble();
+    return stream.value(QLatin1String("duration")).toString().toDouble();
 }
 
 // The longest stream of a movie as ffprobe reads it (edit lists applied).
@@ -114,7 +119,7 @@ double longestStream(const QString &path)
 
 TEST_P(CorpusEngineTest, ProbeEndsCleanlyWithTheRightTracks)
 {
-    const HostileMovie &k = kind();
+    const HostileMovie &k = GetParam();
     auto a = asset();
     const bool loaded = a->load();
     if (k.nature == Nature::Garbage || (k.nature == Nature::Damaged && !loaded)) {
@@ -154,30 +159,21 @@ int picturesShownIn(const QList<double> &times, double start, double end)
 
 TEST_P(CorpusEngineTest, TrimEndsCleanlyWithTheRange)
 {
-    const HostileMovie &k = kind();
+    const HostileMovie &k = GetParam();
     auto a = asset();
+    const QString output = m_scratch.file(QStringLiteral("trim.mp4"));
     auto session = ExportSession::exportSessionWithAsset(a, QLatin1String(kExportPresetHighestQuality));
     ASSERT_TRUE(session);
-    const QString output = m_scratch.file(QStringLiteral("trim.mp4"));
     session->setOutputURL(QUrl::fromLocalFile(output));
     session->setOutputFileType(QLatin1String(kFileTypeMPEG4));
-    // The middle half of the movie, in the editor's timescale; garbage has no duration, so it
-    // gets a range of one second.
+    // The middle half, in the editor's timescale; garbage has no duration, so it gets one second.
     const double duration = a->load() ? a->duration().seconds() : 1;
     const double start = duration / 4, end = duration * 3 / 4;
     constexpr std::int32_t kTimescale = 1000000000;
     session->setTimeRange(MediaTimeRange::fromStartEnd(MediaTime::fromSeconds(start, kTimescale), MediaTime::fromSeconds(end, kTimescale)));
-    if (!run(*session))
+    if (!exportedMovie(*session, output, k.nature == Nature::Garbage || k.nature == Nature::TooLarge))
         return;
-    if (k.nature == Nature::Garbage || k.nature == Nature::TooLarge || (k.nature == Nature::Damaged && session->status() != ExportStatus::Completed))
-        return expectCleanFailure(*session, output);
-    expectCompleted(*session);
-    const QList<QJsonObject> video = probeStreams(output, QStringLiteral("video"));
-    const QList<QJsonObject> audio = probeStreams(output, QStringLiteral("audio"));
-    if (k.nature == Nature::Damaged) {
-        EXPECT_FALSE(video.isEmpty() && audio.isEmpty()) << "a successful cut of a damaged movie holds nothing";
-        return;
-    }
+    const QList<QJsonObject> &video = m_video, &audio = m_audio;
     ASSERT_EQ(video.size(), k.hasVideo() ? 1 : 0);
     EXPECT_EQ(audio.size(), k.audioTracks) << "a cut keeps every audio track";
     if (k.hasVideo()) {
@@ -194,7 +190,7 @@ TEST_P(CorpusEngineTest, TrimEndsCleanlyWithTheRange)
 
 TEST_P(CorpusEngineTest, MixEndsCleanlyWithOneAudioTrack)
 {
-    const HostileMovie &k = kind();
+    const HostileMovie &k = GetParam();
     const QString output = m_scratch.file(QStringLiteral("mix.mp4"));
     auto session = ZafAudioMixUtility::exportSessionForMixingAudio(QUrl::fromLocalFile(m_path), QUrl::fromLocalFile(output));
     if (k.nature == Nature::Garbage && !session) {
@@ -202,18 +198,10 @@ TEST_P(CorpusEngineTest, MixEndsCleanlyWithOneAudioTrack)
         return;
     }
     ASSERT_TRUE(session);
-    if (!run(*session))
-        return;
     // A mix copies the video as it is, so a movie too large to decode mixes like any other.
-    if (k.nature == Nature::Garbage || (k.nature == Nature::Damaged && session->status() != ExportStatus::Completed))
-        return expectCleanFailure(*session, output);
-    expectCompleted(*session);
-    const QList<QJsonObject> video = probeStreams(output, QStringLiteral("video"));
-    const QList<QJsonObject> audio = probeStreams(output, QStringLiteral("audio"));
-    if (k.nature == Nature::Damaged) {
-        EXPECT_FALSE(video.isEmpty() && audio.isEmpty()) << "a successful mix of a damaged movie holds nothing";
+    if (!exportedMovie(*session, output, k.nature == Nature::Garbage))
         return;
-    }
+    const QList<QJsonObject> &video = m_video, &audio = m_audio;
     ASSERT_EQ(video.size(), k.hasVideo() ? 1 : 0);
     if (k.hasVideo()) {
         EXPECT_EQ(streamMD5(output, QStringLiteral("0:v:0")), streamMD5(m_path, QStringLiteral("0:v:0"))) << "the video is copied";
@@ -232,7 +220,7 @@ TEST_P(CorpusEngineTest, MixEndsCleanlyWithOneAudioTrack)
 
 TEST_P(CorpusEngineTest, ThumbnailsEndCleanlyWithUprightPictures)
 {
-    const HostileMovie &k = kind();
+    const HostileMovie &k = GetParam();
     auto a = asset();
     auto generator = ImageGenerator::imageGeneratorWithAsset(a);
     constexpr int kHeight = 76, kCount = 5;
@@ -274,7 +262,7 @@ TEST_P(CorpusEngineTest, ThumbnailsEndCleanlyWithUprightPictures)
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(Corpus, CorpusEngineTest, ::testing::ValuesIn(hostileMovieNames()), [](const auto &info) { return info.param; });
+INSTANTIATE_TEST_SUITE_P(Corpus, CorpusEngineTest, ::testing::ValuesIn(hostileMovies()), caseName);
 
 } // namespace
 } // namespace zaf::test::corpus

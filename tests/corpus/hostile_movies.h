@@ -1,16 +1,13 @@
 #pragma once
 
-// A corpus of hostile and unusual movies, generated at test time: garbage that only looks like a
-// movie, damaged movies, extreme shapes, other codecs, and odd timing and track layouts. Each kind
-// says how it is made and what the engine has to make of it.
-//
-// Files are made once and kept in the fixture cache (see sharedGeneratedFile), under names that
-// carry the digest of this generator's source, so every test process of one build, and the
-// sanitizer build of the same tree, makes each file once.
+// Hostile and unusual movies, generated at test time into the fixture cache (see sharedGeneratedFile)
+// under the digest of this generator: garbage, damaged movies, extreme shapes, other codecs, odd
+// timing and track layouts, each with what the engine has to make of it.
+
+#include "tests/support/named_cases.h"
 
 #include <QSize>
 #include <QString>
-#include <QStringList>
 
 #include <functional>
 #include <vector>
@@ -21,7 +18,6 @@ class LogCapture;
 
 namespace zaf::test::corpus {
 
-// What a kind is, and so what every command must make of it.
 enum class Nature {
     Garbage,   // not a movie at all: every command fails with an error, nothing is written
     Damaged,   // a readable header over damaged data: any clean outcome, a success must be a movie
@@ -42,21 +38,17 @@ struct HostileMovie {
     // The ffmpeg encoder the kind is made with, when it may be missing from an ffmpeg build.
     const char *encoder = nullptr;
 
-    // The upright (displayed) picture size.
     QSize displaySize() const { return rotation % 180 ? videoSize.transposed() : videoSize; }
     bool hasVideo() const { return !videoSize.isEmpty(); }
 };
 
-const std::vector<HostileMovie> &hostileMovies();
-const HostileMovie &hostileMovie(const QString &name);
-// The names of every kind, in table order (for test parameters).
-std::vector<std::string> hostileMovieNames();
+ZAF_PRINT_CASES_AS_NAMES
 
+const std::vector<HostileMovie> &hostileMovies();
 // The kind's file, made on first use ("" with a test failure when it cannot be made).
 QString hostileMoviePath(const HostileMovie &movie);
 // Why the kind cannot be made with the installed ffmpeg (its encoder is missing), or "".
 QString unavailableReason(const HostileMovie &movie);
-
 // Whether one of our own categories ("zaf.") logged a warning or worse: how a failure is reported.
 bool loggedWarning(const LogCapture &log);
 

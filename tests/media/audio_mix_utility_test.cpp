@@ -1,4 +1,4 @@
-// The audio mix utility on generated movies: its output file, its single mixed track and its errors.
+// The audio mix utility on generated movies: its output file, the tracks it mixes and its errors.
 #include "identity/user_error.h"
 #include "media/audio_mix_utility.h"
 #include "platform/media/export_session.h"
@@ -44,11 +44,6 @@ MixResult mix(const QUrl &movie)
     return future.get();
 }
 
-qsizetype audioStreamCount(const QString &path)
-{
-    return probeStreams(path, "audio").size();
-}
-
 // Without a movie the completion runs at once, on the calling thread, with the no-movie error.
 TEST(AudioMixUtility, AbsentMovieFailsAtOnceWithNoMovieCode)
 {
@@ -60,9 +55,9 @@ TEST(AudioMixUtility, AbsentMovieFailsAtOnceWithNoMovieCode)
     EXPECT_TRUE(r.onCallingThread);
 }
 
-// Two tracks become one carrying both tones, in the temporary file named at the start, with the
-// video copied packet for packet.
-TEST(AudioMixUtility, TwoTrackMovieBecomesOneTrackCarryingBothTonesWithTheVideoCopied)
+// Two tracks become one, in the temporary file named at the start (what the mix sounds like is the
+// export's, checked in media_export_tests).
+TEST(AudioMixUtility, TwoTrackMovieBecomesOneTrackInTheTemporaryFile)
 {
     const QString source = sharedFixtureMovie({.seconds = 3, .audioTracks = 2});
     ASSERT_FALSE(source.isEmpty());
@@ -74,10 +69,8 @@ TEST(AudioMixUtility, TwoTrackMovieBecomesOneTrackCarryingBothTonesWithTheVideoC
     EXPECT_TRUE(r.url == expected || r.url.toLocalFile().startsWith(ZafTempStore::defaultStore()._srTempPath()));
     const QString out = r.url.toLocalFile();
     EXPECT_TRUE(QFileInfo(out).fileName().startsWith(QStringLiteral("ZafReplay_Final")));
-    EXPECT_EQ(audioStreamCount(out), 1);
-    EXPECT_GT(toneLevel(out, 0, fixture::toneFrequency(0)), 0.3);
-    EXPECT_GT(toneLevel(out, 0, fixture::toneFrequency(1)), 0.3);
-    EXPECT_EQ(streamMD5(out, QStringLiteral("0:v")), streamMD5(source, QStringLiteral("0:v")));
+    EXPECT_EQ(probeStreams(out, "audio").size(), 1);
+    EXPECT_EQ(probeStreams(out, "video").size(), 1);
 }
 
 // The mix lists every audio track in order and nothing else (the video is track 1), without reading
@@ -100,14 +93,6 @@ TEST_P(AudioMixTracks, MixListsEveryAudioTrackInOrder)
 
 INSTANTIATE_TEST_SUITE_P(Movies, AudioMixTracks, ::testing::Values(std::pair{0, QList<std::int32_t>{}}, std::pair{3, QList<std::int32_t>{2, 3, 4}}),
                          [](const auto &info) { return std::to_string(info.param.first) + "AudioTracks"; });
-
-// A movie without audio gets an empty mix and exports without an audio track.
-TEST(AudioMixUtility, MovieWithoutAudioMixesIntoOneWithoutAudio)
-{
-    const MixResult r = mix(QUrl::fromLocalFile(sharedFixtureMovie({.audioTracks = 0})));
-    ASSERT_FALSE(r.error.has_value());
-    EXPECT_EQ(audioStreamCount(r.url.toLocalFile()), 0);
-}
 
 class AudioMixUnreadable : public ::testing::TestWithParam<UnusableMovie> {};
 

@@ -1,6 +1,4 @@
-// ImageGenerator on fixture movies whose frames show their own numbers: exact and fast modes,
-// maximum sizes, upright pictures of rotated movies, completions, cancellation, and files that
-// are no usable movies.
+// ImageGenerator on fixture movies whose frames show their own numbers.
 
 #include "platform/media/image_generator.h"
 #include "platform/media/media_asset.h"
@@ -227,12 +225,24 @@ TEST_P(ImageGeneratorRotationTest, PicturesStandUprightUnlessTransformIsSwitched
 
 INSTANTIATE_TEST_SUITE_P(Rotations, ImageGeneratorRotationTest, ::testing::Values(0, 90, 180, 270));
 
-// Files that are no usable movie fail every request, asynchronous or not, with an error and no
-// picture, and the failure is logged.
-void expectEveryRequestFails(const QString &path)
+// Files that are no usable movie, and a movie without video, fail every request, asynchronous or
+// not, with an error and no picture, and the failure is logged.
+std::vector<zaf::test::UnusableMovie> noPictures()
 {
+    std::vector<zaf::test::UnusableMovie> files = zaf::test::unusableMovies();
+    files.push_back({"AudioOnly", [](const zaf::test::ScratchDir &) {
+        return zaf::test::sharedFfmpegOutput(zaf::test::words("-f lavfi -i sine=frequency=440:duration=1 -c:a aac"), "m4a");
+    }});
+    return files;
+}
+
+class ImageGeneratorFailureTest : public ::testing::TestWithParam<zaf::test::UnusableMovie> {};
+
+TEST_P(ImageGeneratorFailureTest, FileWithoutPicturesFailsEveryRequest)
+{
+    zaf::test::ScratchDir dir;
     zaf::test::LogCapture log;
-    auto generator = generatorFor(path);
+    auto generator = generatorFor(GetParam().make(dir));
     const QList<MediaTime> times = {MediaTime::zero(), MediaTime::make(1, 2), MediaTime::make(5, 1)};
     zaf::test::ImageCompletions completions;
     generator->generateImagesAsynchronouslyForTimes(times, completions.handler());
@@ -256,19 +266,6 @@ void expectEveryRequestFails(const QString &path)
     EXPECT_FALSE(actual.isValid());
 }
 
-class ImageGeneratorFailureTest : public ::testing::TestWithParam<zaf::test::UnusableMovie> {};
-
-TEST_P(ImageGeneratorFailureTest, UnusableFileFailsEveryRequest)
-{
-    zaf::test::ScratchDir dir;
-    expectEveryRequestFails(GetParam().make(dir));
-}
-
-INSTANTIATE_TEST_SUITE_P(Files, ImageGeneratorFailureTest, ::testing::ValuesIn(zaf::test::unusableMovies()), zaf::test::caseName);
-
-TEST(ImageGeneratorFailureTest, AudioOnlyFileFailsEveryRequest)
-{
-    expectEveryRequestFails(zaf::test::sharedFfmpegOutput(zaf::test::words("-f lavfi -i sine=frequency=440:duration=1 -c:a aac"), "m4a"));
-}
+INSTANTIATE_TEST_SUITE_P(Files, ImageGeneratorFailureTest, ::testing::ValuesIn(noPictures()), zaf::test::caseName);
 
 } // namespace

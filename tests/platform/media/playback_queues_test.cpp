@@ -1,7 +1,4 @@
-// The two hand-overs between the player's threads: the audio ring (bytes in order, wrapping, a full
-// ring holding its writer back until room, a give-up or a clear) and the frame queue (its bound, the
-// pictures that are due, the generations a seek leaves behind). The thread tests join real threads
-// and never sleep.
+// The player's hand-overs between threads, the audio ring and the frame queue; thread tests never sleep.
 #include "platform/media/playback/playback_audio_ring.h"
 #include "platform/media/playback/playback_frame_queue.h"
 #include "tests/support/named_cases.h"
@@ -21,17 +18,12 @@ namespace {
 
 constexpr qsizetype kRing = 64; // the smallest ring there is
 
-// The bytes of a stream whose n-th byte is n modulo 251 (a prime, so no chunk size lines up with it).
-char streamByte(qsizetype n)
-{
-    return char(n % 251);
-}
-
+// Bytes of a stream whose n-th byte is n modulo 251 (a prime, so no chunk size lines up with it).
 std::vector<char> streamBytes(qsizetype from, qsizetype count)
 {
     std::vector<char> bytes(static_cast<size_t>(count));
     for (qsizetype i = 0; i < count; ++i)
-        bytes[size_t(i)] = streamByte(from + i);
+        bytes[size_t(i)] = char((from + i) % 251);
     return bytes;
 }
 
@@ -42,8 +34,6 @@ std::function<bool()> giveUpAfter(int falseCalls)
 }
 
 ZAF_PRINT_CASES_AS_NAMES
-
-// --- AudioRing: writes and reads on one thread, against a model of the bytes held -------------------
 
 struct RingStep {
     qsizetype write = 0; // bytes written first (never more than the room left)
@@ -57,7 +47,8 @@ struct RingCase {
 
 class AudioRingSequence : public ::testing::TestWithParam<RingCase> {};
 
-// Every read returns what the model holds, up to the size asked for, in the order written.
+// Writes and reads on one thread, against a model of the bytes held: every read returns what the
+// model holds, up to the size asked for, in the order written.
 TEST_P(AudioRingSequence, ReadsReturnTheWrittenBytesInOrder)
 {
     AudioRing ring(kRing);
@@ -103,32 +94,23 @@ TEST(AudioRing, WriterGivingUpOnAFullRingKeepsWhatFitted)
     EXPECT_EQ(out, streamBytes(0, kRing));
 }
 
-TEST(AudioRing, EndMarkLeavesTheDataReadable)
+// The end mark leaves the data readable; a clear empties the ring and forgets the end.
+TEST(AudioRing, EndMarkKeepsTheDataAndClearForgetsBoth)
 {
     AudioRing ring(kRing);
     EXPECT_FALSE(ring.ended());
     ring.write("abc", 3, {});
     ring.setEnded();
     EXPECT_TRUE(ring.ended());
-    char out[3];
-    EXPECT_EQ(ring.read(out, 3), 3);
-}
-
-TEST(AudioRing, ClearEmptiesTheRingAndForgetsTheEnd)
-{
-    AudioRing ring(kRing);
-    ring.write("abc", 3, {});
-    ring.setEnded();
+    char out[4] = {};
+    EXPECT_EQ(ring.read(out, 2), 2);
     ring.clear();
     EXPECT_EQ(ring.available(), 0);
     EXPECT_FALSE(ring.ended());
     ring.write("xy", 2, {});
-    char out[4] = {};
     ASSERT_EQ(ring.read(out, 4), 2);
     EXPECT_EQ(QByteArray(out, 2), "xy");
 }
-
-// --- AudioRing: a writer held back by a full ring, and what lets it go -----------------------------
 
 struct ReleaseCase {
     const char *name;
@@ -161,19 +143,9 @@ TEST_P(AudioRingBlockedWriter, WaitsForRoomUntilReleased)
 
 INSTANTIATE_TEST_SUITE_P(
     Cases, AudioRingBlockedWriter,
-    ::testing::Values(ReleaseCase{"GiveUpAndWake",
-                                  [](AudioRing &ring, std::atomic<bool> &stop) {
-                                      stop = true;
-                                      ring.wake();
-                                  },
-                                  false, kRing},
+    ::testing::Values(ReleaseCase{"GiveUpAndWake", [](AudioRing &ring, std::atomic<bool> &stop) { stop = true; ring.wake(); }, false, kRing},
                       ReleaseCase{"ClearMakesRoom", [](AudioRing &ring, std::atomic<bool> &) { ring.clear(); }, true, 100 - kRing},
-                      ReleaseCase{"ReadMakesRoom",
-                                  [](AudioRing &ring, std::atomic<bool> &) {
-                                      char out[kRing];
-                                      ring.read(out, kRing);
-                                  },
-                                  true, 100 - kRing}),
+                      ReleaseCase{"ReadMakesRoom", [](AudioRing &ring, std::atomic<bool> &) { ring.read(std::vector<char>(kRing).data(), kRing); }, true, 100 - kRing}),
     test::caseName);
 
 // One producer and one consumer on their own threads, in chunk sizes that never line up with the
@@ -203,8 +175,6 @@ TEST(AudioRing, ProducerAndConsumerThreadsKeepTheOrder)
     ASSERT_EQ(qsizetype(received.size()), kTotal);
     EXPECT_TRUE(received == sent);
 }
-
-// --- FrameQueue ------------------------------------------------------------------------------------
 
 VideoFrame frame(std::int64_t ptsNs, std::uint64_t generation = 1, bool seekResult = false)
 {
@@ -301,15 +271,9 @@ TEST_P(FrameQueueBlockedProducer, WaitsForRoomUntilReleased)
 
 INSTANTIATE_TEST_SUITE_P(
     Cases, FrameQueueBlockedProducer,
-    ::testing::Values(FrameReleaseCase{"GiveUpAndWake",
-                                       [](FrameQueue &queue, std::atomic<bool> &stop) {
-                                           stop = true;
-                                           queue.wake();
-                                       },
-                                       false, 2},
+    ::testing::Values(FrameReleaseCase{"GiveUpAndWake", [](FrameQueue &queue, std::atomic<bool> &stop) { stop = true; queue.wake(); }, false, 2},
                       FrameReleaseCase{"ClearMakesRoom", [](FrameQueue &queue, std::atomic<bool> &) { queue.clear(); }, true, 1},
-                      FrameReleaseCase{"TakeMakesRoom",
-                                       [](FrameQueue &queue, std::atomic<bool> &) { queue.takeDue(1, 100); }, true, 2}),
+                      FrameReleaseCase{"TakeMakesRoom", [](FrameQueue &queue, std::atomic<bool> &) { queue.takeDue(1, 100); }, true, 2}),
     test::caseName);
 
 // A decoder thread pushing into a small queue while the consumer takes whatever is due: the queue

@@ -1,5 +1,4 @@
-// The decoders' steps that stand on their own: which pictures answer an exact seek, how the audio
-// streams are mixed and lined up with a seek's target, and the request hand-over to a decoder thread.
+// The decoders' steps on their own: exact seeks, the audio mix and lead-in, the request hand-over.
 #include "platform/media/playback/playback_audio_mix.h"
 #include "platform/media/playback/playback_decoder_thread.h"
 #include "platform/media/playback/playback_exact_seek.h"

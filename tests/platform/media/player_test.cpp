@@ -1,5 +1,4 @@
-// The Player on a manual clock (loading, observers, the item's end, seeks and pictures checked by the
-// numbers fixture frames show), its layer and audio stage; the tests wait only for loading and decoding.
+// The Player on a manual clock, its layer and audio stage; the tests wait only for loading and decoding.
 #include "platform/media/playback/playback_audio_decoder.h"
 #include "platform/media/player.h"
 #include "platform/media/player_layer.h"
@@ -264,13 +263,16 @@ TEST_F(PlayerTest, ObserversStaySilentWhenASeekJumpsOverThemOrOnceRemoved)
     EXPECT_EQ(player->currentTime(), seconds(4));
 }
 
-TEST_F(PlayerTest, ObserversOfInvalidTimesAreRefused)
+// Observers of invalid times are refused, an unknown one's removal and an invalid seek are ignored.
+TEST_F(PlayerTest, InvalidTimesAreRefused)
 {
     auto player = readyPlayer(kShort);
     EXPECT_EQ(player->addPeriodicTimeObserver(MediaTime::invalid(), [](const MediaTime &) {}), 0u);
     EXPECT_EQ(player->addPeriodicTimeObserver(MediaTime::zero(), [](const MediaTime &) {}), 0u);
     EXPECT_EQ(player->addBoundaryTimeObserver({MediaTime::invalid()}, [] {}), 0u);
-    player->removeTimeObserver(12345); // unknown: ignored
+    player->removeTimeObserver(12345);
+    player->seekToTime(MediaTime::invalid());
+    EXPECT_EQ(player->currentTime(), MediaTime::zero());
 }
 
 // The end pauses at the duration and signals once per arrival; with ActionAtItemEnd::None it keeps
@@ -364,18 +366,7 @@ TEST_F(PlayerTest, DestroyingPlayerWhilePlayingOnRealClockIsSafe)
     }
 }
 
-TEST_F(PlayerTest, NewPlayerShowsTheFirstFrame)
-{
-    auto player = readyPlayer(kMovie);
-    ASSERT_TRUE(waitUntil([&] { return !player->currentVideoFrame().isNull(); }));
-    EXPECT_EQ(shownNumber(*player), 0);
-    EXPECT_EQ(player->currentVideoFrame().size(), QSize(320, 240));
-    player->seekToTime(MediaTime::invalid());
-    EXPECT_EQ(player->currentTime(), MediaTime::zero()) << "an invalid seek is ignored";
-}
-
-// A seek shows the frame at its target (between keyframes, on one, between frame times), limited
-// to the item.
+// A new player shows the first frame; a seek shows the frame at its target, limited to the item.
 struct SeekCase {
     const char *name;
     double target;
@@ -390,6 +381,8 @@ TEST_P(PlayerSeekTest, ShowsTheFrameAtItsTarget)
     const SeekCase &c = GetParam();
     auto player = readyPlayer(kMovie);
     ASSERT_TRUE(waitUntil([&] { return !player->currentVideoFrame().isNull(); }));
+    EXPECT_EQ(shownNumber(*player), 0);
+    EXPECT_EQ(player->currentVideoFrame().size(), QSize(320, 240));
     player->seekToTime(seconds(c.target));
     EXPECT_EQ(player->currentTime(), c.time < 0 ? player->currentItem()->duration() : seconds(c.time));
     EXPECT_TRUE(waitUntil([&] { return shownNumber(*player) == c.frame; })) << "shows " << shownNumber(*player);

@@ -1,6 +1,4 @@
-// MovieWriter and the fixture movies built on it, checked from the outside: ffprobe describes what
-// was written, ffmpeg decodes the frames (their drawn numbers must come back in order) and the
-// tones of every audio track. Also the frame-number pattern the other media tests rely on.
+// MovieWriter, the fixture movies built on it and their frame-number pattern, checked with ffprobe and ffmpeg.
 
 #include "platform/media/media_asset.h"
 #include "platform/media/movie_writer.h"
@@ -59,29 +57,28 @@ void appendNumberedFrames(MovieWriter &writer, int frames)
     }
 }
 
-// The drawn number reads back at any picture size.
-class FramePatternSize : public ::testing::TestWithParam<QSize> {};
+// The drawn number reads back, and the picture is upright, at any size, and drawn large then smoothly
+// scaled to a thumbnail.
+class FramePatternSize : public ::testing::TestWithParam<std::pair<QSize, QSize>> {};
 
 TEST_P(FramePatternSize, ReadsBackTheDrawnNumber)
 {
-    const QSize size = GetParam();
-    for (int n : {0, 1, 2, 255, 256, 4097, 30000, 43690, 65535})
-        EXPECT_EQ(fx::readFrameNumber(fx::frameNumberImage(n, size.width(), size.height())), n) << n;
+    const auto [drawn, shown] = GetParam();
+    for (int n : {0, 1, 2, 7, 255, 256, 4097, 12345, 30000, 43690, 54321, 65535}) {
+        const QImage image = fx::frameNumberImage(n, drawn.width(), drawn.height()).scaled(shown, Qt::IgnoreAspectRatio, Qt::SmoothTransformation);
+        EXPECT_EQ(fx::readFrameNumber(image), n) << n;
+        EXPECT_TRUE(fx::isUpright(image)) << n;
+    }
 }
 
 INSTANTIATE_TEST_SUITE_P(Sizes, FramePatternSize,
-                         ::testing::Values(QSize(1920, 1080), QSize(320, 240), QSize(64, 36), QSize(28, 38), QSize(1080, 1920)),
-                         [](const auto &info) { return "Size" + std::to_string(info.param.width()) + "x" + std::to_string(info.param.height()); });
-
-// The number survives smooth scaling down to thumbnail size, and the picture stays upright.
-TEST(FramePatternTest, NumberSurvivesScalingToAThumbnail)
-{
-    for (int n : {12345, 54321, 7}) {
-        const QImage thumb = fx::frameNumberImage(n, 1920, 1080).scaled(68, 38, Qt::IgnoreAspectRatio, Qt::SmoothTransformation);
-        EXPECT_EQ(fx::readFrameNumber(thumb), n);
-        EXPECT_TRUE(fx::isUpright(thumb));
-    }
-}
+                         ::testing::Values(std::pair{QSize(1920, 1080), QSize(1920, 1080)}, std::pair{QSize(320, 240), QSize(320, 240)},
+                                           std::pair{QSize(64, 36), QSize(64, 36)}, std::pair{QSize(28, 38), QSize(28, 38)},
+                                           std::pair{QSize(1080, 1920), QSize(1080, 1920)}, std::pair{QSize(1920, 1080), QSize(68, 38)}),
+                         [](const auto &info) {
+                             const QSize drawn = info.param.first;
+                             return "Size" + std::to_string(drawn.width()) + "x" + std::to_string(drawn.height()) + "Shown" + std::to_string(info.param.second.width());
+                         });
 
 // Turned, mirrored, blank or washed-out pictures are not upright or read no number.
 struct PatternLessPicture {
@@ -137,8 +134,7 @@ TEST(FixtureMovieTest, ToneFrequenciesAreDistinctAndNoHarmonicsOfEachOther)
     EXPECT_NE(fx::toneFrequency(6), fx::toneFrequency(7));
 }
 
-// A fixture movie numbers its frames, keeps its GOP, gives each track its own tone, and every call
-// writes its own file.
+// A fixture movie follows its shape (frame rate, GOP, a tone per track), and every call writes its own file.
 TEST(FixtureMovieTest, WriteFixtureMovieNumbersFramesAndTonesTracks)
 {
     zaf::test::ScratchDir dir;
@@ -232,6 +228,7 @@ TEST(MovieWriterTest, AppendVideoFrameScalesAndConvertsPicturesOfAnyFormat)
 // only when finished; an abandoned writer leaves nothing, and a file that takes the name meanwhile
 // is kept while the movie goes.
 enum class Ending { Finished, Abandoned, NameTakenMeanwhile };
+const char *const kEndingNames[] = {"Finished", "Abandoned", "NameTakenMeanwhile"};
 
 class MovieWriterEnding : public ::testing::TestWithParam<Ending> {};
 
@@ -261,9 +258,7 @@ TEST_P(MovieWriterEnding, LeavesTheWholeMovieOrNothing)
 }
 
 INSTANTIATE_TEST_SUITE_P(Endings, MovieWriterEnding, ::testing::Values(Ending::Finished, Ending::Abandoned, Ending::NameTakenMeanwhile),
-                         [](const auto &info) {
-                             return info.param == Ending::Finished ? "Finished" : info.param == Ending::Abandoned ? "Abandoned" : "NameTakenMeanwhile";
-                         });
+                         [](const auto &info) { return kEndingNames[int(info.param)]; });
 
 // Creation fails, leaving no file and an existing one untouched, for an existing path, an
 // unwritable directory (logged with the path) and unsupported settings.
@@ -302,21 +297,14 @@ INSTANTIATE_TEST_SUITE_P(
                       CreateFailure{"NoFrameRate", "bad.mp4", {.frameRate = 0}, zaf::media::kMediaErrorInvalidArgument}),
     zaf::test::caseName);
 
-TEST(MovieWriterTest, AppendToAnUnknownAudioTrackIsRefused)
-{
-    zaf::test::ScratchDir dir;
-    auto writer = createWriter(dir.file(QStringLiteral("out.mp4")), {.videoSize = QSize(128, 96), .audioTracks = 1});
-    ASSERT_TRUE(writer);
-    const float samples[4] = {0, 0, 0, 0};
-    EXPECT_EQ(writer->appendAudio(1, samples, 2).value_or(zaf::Error{}).code, zaf::media::kMediaErrorInvalidArgument);
-}
-
-TEST(MovieWriterTest, NothingIsAcceptedAfterFinish)
+// Audio for a track it does not have, and anything after the finish, is refused.
+TEST(MovieWriterTest, AppendsToAnUnknownTrackOrAfterFinishAreRefused)
 {
     zaf::test::ScratchDir dir;
     auto writer = createWriter(dir.file(QStringLiteral("closed.mp4")), {.videoSize = QSize(128, 96), .audioTracks = 1});
     ASSERT_TRUE(writer);
     const float samples[4] = {0, 0, 0, 0};
+    EXPECT_EQ(writer->appendAudio(1, samples, 2).value_or(zaf::Error{}).code, zaf::media::kMediaErrorInvalidArgument);
     ASSERT_FALSE(writer->appendVideoFrame(fx::frameNumberImage(0, 128, 96)));
     ASSERT_FALSE(writer->appendAudio(0, samples, 2));
     ASSERT_FALSE(writer->finish());
