@@ -62,7 +62,6 @@ TEST_P(CapabilityFileFault, LeavesTheDefaults)
 
 INSTANTIATE_TEST_SUITE_P(Files, CapabilityFileFault, ::testing::Bool(), [](const auto &info) { return info.param ? "Malformed" : "Missing"; });
 
-
 TEST_F(CapabilityServiceTest, FileOverridesTheDefaults)
 {
     useFile(R"({"home-button-type": 2, "not-green-tea": false, "graphics-quality-level": 20, "device-idiom": 1})");

@@ -1,8 +1,8 @@
 #include "platform/dispatch.h"
+#include "tests/support/wait_until.h"
 
 #include <QCoreApplication>
 #include <QThread>
-#include <QThreadPool>
 #include <gtest/gtest.h>
 
 #include <atomic>
@@ -33,8 +33,7 @@ TEST(Dispatch, MainSyncFromAWorkerRunsOnTheMainThread)
         mainSync([&] { onMain = isMainThread(); });
         workerDone = true;
     });
-    while (!workerDone)
-        QCoreApplication::processEvents(QEventLoop::AllEvents, 10);
+    ASSERT_TRUE(test::waitUntil([&] { return workerDone.load(); }));
     EXPECT_TRUE(onMain);
 }
 
@@ -63,8 +62,7 @@ TEST(Dispatch, MainGateRunsHopsUntilClosedAndReleasesAWaitingWorker)
         result = gate->runSync([&] { ranOnMain += isMainThread(); }) ? 1 : 0;
         workerDone = true;
     });
-    while (!workerDone)
-        QCoreApplication::processEvents(QEventLoop::AllEvents, 10);
+    ASSERT_TRUE(test::waitUntil([&] { return workerDone.load(); }));
     EXPECT_EQ(result.load(), 1);
     EXPECT_EQ(ranOnMain.load(), 1);
 

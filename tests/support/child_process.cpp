@@ -76,9 +76,6 @@ ChildRun runChild(const QString &program, const QStringList &args, const ChildOp
         posix_spawn_file_actions_adddup2(&actions, out.write, STDOUT_FILENO);
         posix_spawn_file_actions_adddup2(&actions, options.mergeErrorIntoOutput ? out.write : err.write, STDERR_FILENO);
     }
-    const QByteArray directory = QFile::encodeName(options.workingDirectory);
-    if (!directory.isEmpty())
-        posix_spawn_file_actions_addchdir_np(&actions, directory.constData());
     const CStrings argv(QStringList{program} + args, true);
     std::optional<CStrings> envp;
     if (options.environment)

@@ -20,7 +20,6 @@ struct ChildOptions {
     bool mergeErrorIntoOutput = false;      // standard error goes to `out` too
     bool forwardOutput = false;             // both streams go to the test's own instead of being kept
     std::optional<QStringList> environment; // KEY=VALUE entries; none: the test's own environment
-    QString workingDirectory;               // empty: the test's own
     // Takes standard output as it arrives (the whole output so far); called on the test's thread.
     std::function<void(QByteArray &out)> sink;
 };

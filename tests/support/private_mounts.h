@@ -1,22 +1,10 @@
 #pragma once
 
 // File systems of a test's own: a small tmpfs that fills up part-way through a write, or a
-// read-only one. Mounting needs a private mount namespace, so such a test runs itself again in a
-// child process made by `unshare --mount --propagation private`, where its mounts touch nothing of
-// the machine's and vanish with the child:
-//
-//   TEST(Suite, Name)
-//   {
-//       if (!test::insidePrivateMounts())
-//           return test::runThisTestInPrivateMounts();
-//       const test::ScopedTmpfs volume(path, 256 * 1024);
-//       if (!volume.mounted())
-//           return; // skipped, with the reason
-//       ...
-//   }
-//
-// Where the namespace cannot be made (not root, no unshare, a container that forbids it) the test
-// is skipped with the reason; the fault-seam tests beside it still run.
+// read-only one. Mounting needs a private mount namespace, so such a test first runs itself again
+// in a child made by `unshare --mount --propagation private` (where its mounts touch nothing of the
+// machine's): `if (!insidePrivateMounts()) return runThisTestInPrivateMounts();`, then returns
+// when its ScopedTmpfs is not mounted. Where the namespace cannot be made the test is skipped.
 
 #include <QString>
 #include <QtGlobal>
