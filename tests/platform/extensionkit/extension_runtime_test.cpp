@@ -1,7 +1,5 @@
-// The runtime driven over a socket pair as a host would drive it: the request, the principal's view
-// coming on screen with the items already in its context, the removal (by message or by the end of
-// the channel), refusals of bad requests, and the one-way proxy back to the host. Last, the extension
-// main routine's refusal of a missing or unusable channel descriptor.
+// The runtime driven over a socket pair as a host would drive it, and the extension main routine's
+// check of its channel descriptor.
 
 #include "platform/extensionkit/channel.h"
 #include "platform/extensionkit/extension_runtime.h"
@@ -20,10 +18,8 @@
 
 #include <cerrno>
 #include <fcntl.h>
-#include <functional>
 #include <optional>
 #include <thread>
-#include <unistd.h>
 
 using namespace zaf::extensionkit;
 using zaf::test::SocketPair;
@@ -104,7 +100,14 @@ protected:
         ASSERT_TRUE(waitUntil([&] { return recorder->calls.contains("viewDidAppear"); }));
     }
 
+    // A proxy to the host whose errors go to `errors`.
+    auto recordingProxy()
+    {
+        return runtime->context()->remoteObjectProxyWithErrorHandler([this](const zaf::Error &error) { errors.append(error); });
+    }
+
     SocketPair pair;
+    QList<zaf::Error> errors;
     RecordingPrincipal *recorder = nullptr;
     zaf::ui::ViewController *closedWith = nullptr;
     int finishedCount = 0;
@@ -214,9 +217,9 @@ TEST_F(RuntimeTest, ChannelClosingAfterTheRemovalChangesNothing)
     EXPECT_EQ(recorder->calls.count("viewDidDisappear"), 1);
 }
 
-// A bad or unknown message before the request: answered as JSON-RPC asks (frames whose id cannot
-// be read with a null id, notifications never) or logged, and the request that follows still goes
-// through.
+// A bad or unknown message before the request: answered as JSON-RPC asks (notifications never)
+// or logged, and the request that follows still goes through. Frames that are no JSON-RPC at all
+// are channel_test.cpp's.
 struct BadMessage {
     const char *name;
     QByteArray payload;
@@ -237,25 +240,14 @@ TEST_P(RuntimeBadMessageTest, IsRefusedWhileTheRuntimeCarriesOn)
     begin();
 }
 
-QByteArray serialized(const QJsonObject &message)
-{
-    return rpc::serialize(message);
-}
-
 INSTANTIATE_TEST_SUITE_P(Messages, RuntimeBadMessageTest, ::testing::Values(
-    BadMessage{"NotUtf8", "\xff\xfe garbage", {{QJsonValue::Null, rpc::ParseError}}},
-    BadMessage{"CutOffJson", R"({"jsonrpc":"2.0","id":1,"method":"beginExtensionRequest","params":)", {{QJsonValue::Null, rpc::ParseError}}},
-    BadMessage{"IdAnObject", R"({"jsonrpc":"2.0","id":{"x":1},"method":"beginExtensionRequest","params":{"inputItems":[]}})",
-               {{QJsonValue::Null, rpc::InvalidRequest}}},
-    BadMessage{"ParamsAnArray", serialized(rpc::makeRequest(1, "beginExtensionRequest", QJsonArray{})), {{1, rpc::InvalidParams}}},
-    BadMessage{"ItemsNotAnArray", serialized(rpc::makeRequest(2, "beginExtensionRequest", QJsonObject{{"inputItems", "nope"}})),
-               {{2, rpc::InvalidParams}}},
-    BadMessage{"NoParams", serialized(rpc::makeRequest(3, "beginExtensionRequest")), {{3, rpc::InvalidParams}}},
-    BadMessage{"UnknownMethod", serialized(rpc::makeRequest(4, "doSomethingElse", QJsonObject{})), {{4, rpc::MethodNotFound}}},
-    BadMessage{"RemovalAsARequest", serialized(rpc::makeRequest(5, "removeExtensionView")), {{5, rpc::InvalidRequest}}},
-    BadMessage{"UnknownNotification", serialized(rpc::makeNotification("unknownNotification")), std::nullopt},
-    BadMessage{"RequestAsANotification", serialized(rpc::makeNotification("beginExtensionRequest", QJsonObject{{"inputItems", QJsonArray{}}})),
-               std::nullopt}),
+    BadMessage{"ParamsAnArray", rpc::serialize(rpc::makeRequest(1, "beginExtensionRequest", QJsonArray{})), {{1, rpc::InvalidParams}}},
+    BadMessage{"ItemsNotAnArray", rpc::serialize(rpc::makeRequest(2, "beginExtensionRequest", QJsonObject{{"inputItems", "nope"}})), {{2, rpc::InvalidParams}}},
+    BadMessage{"NoParams", rpc::serialize(rpc::makeRequest(3, "beginExtensionRequest")), {{3, rpc::InvalidParams}}},
+    BadMessage{"UnknownMethod", rpc::serialize(rpc::makeRequest(4, "doSomethingElse", QJsonObject{})), {{4, rpc::MethodNotFound}}},
+    BadMessage{"RemovalAsARequest", rpc::serialize(rpc::makeRequest(5, "removeExtensionView")), {{5, rpc::InvalidRequest}}},
+    BadMessage{"UnknownNotification", rpc::serialize(rpc::makeNotification("unknownNotification")), std::nullopt},
+    BadMessage{"RequestAsANotification", rpc::serialize(rpc::makeNotification("beginExtensionRequest", QJsonObject{{"inputItems", QJsonArray{}}})), std::nullopt}),
     caseName);
 
 TEST_F(RuntimeTest, SecondRequestIsRefused)
@@ -270,8 +262,7 @@ TEST_F(RuntimeTest, SecondRequestIsRefused)
 TEST_F(RuntimeTest, ProxyDeliversOneWayMessagesFromAnyThread)
 {
     begin();
-    QList<zaf::Error> errors;
-    const auto proxy = runtime->context()->remoteObjectProxyWithErrorHandler([&](const zaf::Error &error) { errors.append(error); });
+    const auto proxy = recordingProxy();
     proxy->sendOneWay(kReportMethod, QJsonArray{QJsonArray{"save", "save"}});
     std::thread worker([proxy] { proxy->sendOneWay(kReportMethod, QJsonArray{QJsonArray{}}); });
     worker.join();
@@ -285,8 +276,7 @@ TEST_F(RuntimeTest, ProxyDeliversOneWayMessagesFromAnyThread)
 TEST_F(RuntimeTest, ProxyRefusesAMethodTheHostDoesNotDeclare)
 {
     begin();
-    QList<zaf::Error> errors;
-    runtime->context()->remoteObjectProxyWithErrorHandler([&](const zaf::Error &error) { errors.append(error); })->sendOneWay("somethingUndeclared", QJsonArray{});
+    recordingProxy()->sendOneWay("somethingUndeclared", QJsonArray{});
     ASSERT_EQ(errors.size(), 1);
     EXPECT_EQ(errors[0].code, EINVAL);
     EXPECT_TRUE(pair.nothingToRead());
@@ -295,8 +285,7 @@ TEST_F(RuntimeTest, ProxyRefusesAMethodTheHostDoesNotDeclare)
 TEST_F(RuntimeTest, ProxyReportsTheWriteErrorOnceTheHostHasGone)
 {
     begin();
-    QList<zaf::Error> errors;
-    const auto proxy = runtime->context()->remoteObjectProxyWithErrorHandler([&](const zaf::Error &error) { errors.append(error); });
+    const auto proxy = recordingProxy();
     pair.closeHost();
     proxy->sendOneWay(kReportMethod, QJsonArray{QJsonArray{"late"}});
     ASSERT_EQ(errors.size(), 1);
@@ -325,14 +314,14 @@ TEST(RuntimeStart, FailsWithoutADescriptor)
 
 // The extension main routine refuses a missing or unusable channel descriptor: it returns before
 // any application object is made, so it runs inside this test program.
-struct ChannelVariable { const char *name; std::function<std::optional<QByteArray>()> value; const char *reason; };
+struct ChannelVariable { const char *name; std::optional<QByteArray> value; const char *reason; };
 
 class ExtensionMainTest : public ::testing::TestWithParam<ChannelVariable> {};
 
 TEST_P(ExtensionMainTest, ExitsWithCodeTwoWhenTheDescriptorIsUnusable)
 {
     const auto unset = qScopeGuard([] { qunsetenv(kChannelFdEnvironmentVariable); });
-    const std::optional<QByteArray> value = GetParam().value();
+    const std::optional<QByteArray> &value = GetParam().value;
     value ? qputenv(kChannelFdEnvironmentVariable, *value) : qunsetenv(kChannelFdEnvironmentVariable);
     QString error;
     EXPECT_EQ(channelFdFromEnvironment(&error), -1);
@@ -350,13 +339,13 @@ QByteArray devNull()
 }
 
 INSTANTIATE_TEST_SUITE_P(Values, ExtensionMainTest, ::testing::Values(
-    ChannelVariable{"Unset", [] { return std::optional<QByteArray>(); }, "is not set"},
-    ChannelVariable{"Empty", [] { return std::optional<QByteArray>(""); }, "is not set"},
-    ChannelVariable{"AWord", [] { return std::optional<QByteArray>("three"); }, "not a descriptor number"},
-    ChannelVariable{"Negative", [] { return std::optional<QByteArray>("-1"); }, "not a descriptor number"},
-    ChannelVariable{"TrailingLetter", [] { return std::optional<QByteArray>("3x"); }, "not a descriptor number"},
-    ChannelVariable{"NoOpenDescriptor", [] { return std::optional<QByteArray>("1048576"); }, "names no open descriptor"},
-    ChannelVariable{"NotASocket", [] { return std::optional<QByteArray>(devNull()); }, "is not a socket"}), caseName);
+    ChannelVariable{"Unset", std::nullopt, "is not set"},
+    ChannelVariable{"Empty", "", "is not set"},
+    ChannelVariable{"AWord", "three", "not a descriptor number"},
+    ChannelVariable{"Negative", "-1", "not a descriptor number"},
+    ChannelVariable{"TrailingLetter", "3x", "not a descriptor number"},
+    ChannelVariable{"NoOpenDescriptor", "1048576", "names no open descriptor"},
+    ChannelVariable{"NotASocket", devNull(), "is not a socket"}), caseName);
 
 TEST(ExtensionMain, ChannelDescriptorNamingASocketIsTaken)
 {
