@@ -137,19 +137,18 @@ TEST(InputItems, NothingOptionalGivenMakesOnlyTheThreeRequiredItems)
 
 TEST(ExtensionSessionReports, EveryReportArrivesWholeInOrderBeforeFinished)
 {
-    // Reports written one byte at a time and just under the size cap (9000 types of 100 characters,
-    // about 930 KB) arrive whole; everything written before the exit comes before finished().
+    // A report just under the size cap (9000 types of 100 characters, about 930 KB) arrives whole;
+    // everything written before the exit comes before finished(). Frames split across reads are
+    // framed_socket_test.cpp's.
     RecordedSession s;
-    ASSERT_TRUE(s.run("accept report com.zafrel.activity.SaveToPhotoLibrary,ZafPublishToYouTube report-slowly slow.type "
-                      "report-big 9000 report - exit 0"));
-    ASSERT_EQ(s.reports.size(), 4);
+    ASSERT_TRUE(s.run("accept report com.zafrel.activity.SaveToPhotoLibrary,ZafPublishToYouTube report-big 9000 report - exit 0"));
+    ASSERT_EQ(s.reports.size(), 3);
     EXPECT_EQ(s.reports[0], (QStringList{"com.zafrel.activity.SaveToPhotoLibrary", "ZafPublishToYouTube"}));
-    EXPECT_EQ(s.reports[1], QStringList{"slow.type"});
-    EXPECT_EQ(s.reports[2].size(), 9000);
-    EXPECT_EQ(s.reports[2].last(), QString("%1").arg(8999, 100, 10, QLatin1Char('0')));
-    EXPECT_TRUE(s.reports[3].isEmpty());
-    EXPECT_EQ(s.events.filter("report:").size(), 4);
-    EXPECT_EQ(s.events.mid(5), (QStringList{"closed", "finished"}));
+    EXPECT_EQ(s.reports[1].size(), 9000);
+    EXPECT_EQ(s.reports[1].last(), QString("%1").arg(8999, 100, 10, QLatin1Char('0')));
+    EXPECT_TRUE(s.reports[2].isEmpty());
+    EXPECT_EQ(s.events.filter("report:").size(), 3);
+    EXPECT_EQ(s.events.mid(4), (QStringList{"closed", "finished"}));
     EXPECT_FALSE(s.crashed);
     EXPECT_TRUE(s.protocolErrors.isEmpty());
     EXPECT_TRUE(isReaped(s.session.processId()));

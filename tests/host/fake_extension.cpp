@@ -5,7 +5,6 @@
 //   take              read beginExtensionRequest and leave it unanswered
 //   accept / reject   take, then answer {"accepted": true} / a JSON-RPC error
 //   report A,B,...    send extensionDidFinishWithActivityTypes with these types ("-": none)
-//   report-slowly A   the same, written one byte at a time
 //   report-big N      a report of N activity types of 100 characters each
 //   send PAYLOAD      a frame carrying PAYLOAD as it is (JSON or not)
 //   oversized         a length prefix of 1 MiB + 1 followed by a few bytes
@@ -24,7 +23,6 @@
 #include <QJsonDocument>
 #include <QJsonObject>
 #include <QStringList>
-#include <QtEndian>
 
 #include <cerrno>
 #include <cstdio>
@@ -72,12 +70,6 @@ QByteArray frame(QJsonObject message)
 QByteArray report(const QStringList &types)
 {
     return frame({{"method", "extensionDidFinishWithActivityTypes"}, {"params", QJsonArray{QJsonArray::fromStringList(types)}}});
-}
-
-QByteArray lengthPrefix(quint32 length)
-{
-    const quint32 le = qToLittleEndian(length);
-    return QByteArray(reinterpret_cast<const char *>(&le), 4);
 }
 
 // The next message from the host, or nullopt at the end of the channel.
@@ -137,11 +129,6 @@ int main()
         } else if (step == "report") {
             const QString types = argument();
             writeAll(report(types == "-" ? QStringList{} : types.split(',')));
-        } else if (step == "report-slowly") {
-            for (char byte : report({argument()})) {
-                writeAll(QByteArray(1, byte));
-                ::usleep(2000);
-            }
         } else if (step == "report-big") {
             QStringList types;
             for (int n = 0, count = argument().toInt(); n < count; ++n)
@@ -150,10 +137,10 @@ int main()
         } else if (step == "send") {
             writeAll(zaf::extensionkit::encodeFrame(argument().toUtf8()));
         } else if (step == "oversized") {
-            writeAll(lengthPrefix(1024 * 1024 + 1) + QByteArray(64, 'x'));
+            writeAll(zaf::extensionkit::encodeFrame(QByteArray(1024 * 1024 + 1, 'x')).left(68));
         } else if (step == "partial" || step == "close") {
             if (step == "partial")
-                writeAll(lengthPrefix(100) + QByteArray(10, '{'));
+                writeAll(zaf::extensionkit::encodeFrame(QByteArray(100, '{')).left(14));
             ::close(std::exchange(g_fd, -1));
         } else if (step == "expect-error") {
             const std::optional<QJsonObject> answer = readMessage();

@@ -116,18 +116,6 @@ protected:
 
 } // namespace
 
-TEST_F(RuntimeTest, StartWiresTheContextToThePrincipalShowingNothing)
-{
-    ASSERT_NE(runtime->context(), nullptr);
-    EXPECT_EQ(runtime->principal(), recorder);
-    EXPECT_EQ(runtime->context()->principalObject(), recorder);
-    EXPECT_EQ(ExtensionContext::contextOfPrincipal(recorder), runtime->context());
-    EXPECT_TRUE(runtime->context()->inputItems().isEmpty());
-    EXPECT_FALSE(runtime->hasRequest());
-    EXPECT_FALSE(recorder->isViewLoaded());
-    EXPECT_EQ(runtime->window(), nullptr);
-}
-
 TEST_F(RuntimeTest, ChannelClosingBeforeTheRequestFinishesWithoutLoadingTheView)
 {
     pair.closeHost();

@@ -1,5 +1,4 @@
-// The frame codec: length-prefixed payloads split and joined in every way a stream can deliver them,
-// and the cap on the announced length.
+// The frame codec: payloads however a stream splits them, and the cap on the announced length.
 
 #include "platform/extensionkit/frame_codec.h"
 

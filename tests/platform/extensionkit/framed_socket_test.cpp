@@ -1,7 +1,5 @@
-// The framed socket over a real socket pair: frames however the stream splits them, bad frames,
-// the peer going away, whole frames from concurrent writers, and both answers to a full socket
-// buffer. SIGPIPE stays at its default here: a write to a closed peer that raised it would kill
-// this test program.
+// The framed socket over a real socket pair. SIGPIPE stays at its default here: a write to a closed
+// peer that raised it would kill this test program.
 
 #include "platform/extensionkit/framed_socket.h"
 #include "tests/platform/extensionkit/socket_pair.h"

@@ -1,4 +1,4 @@
-// Attachments: which types they conform to, what their loads deliver and on which thread, and the
+// Attachments: the types they conform to, what their loads deliver and on which thread, and the
 // colour strings (alpha last).
 
 #include "platform/dispatch.h"
@@ -15,8 +15,6 @@
 #include <condition_variable>
 #include <mutex>
 
-#include <atomic>
-
 using namespace zaf::extensionkit;
 using zaf::test::caseName;
 
@@ -24,32 +22,29 @@ ZAF_PRINT_CASES_AS_NAMES
 
 namespace {
 
-struct LoadOutcome {
-    QVariant value;
-    zaf::OptionalError error;
-    bool onMainThread = true;
-    // Standard locking rather than QSemaphore, whose hand-over ThreadSanitizer cannot see.
+// The outcomes of loads, which may end on any thread. Standard locking rather than QSemaphore,
+// whose hand-over ThreadSanitizer cannot see.
+struct Loads {
     std::mutex mutex;
     std::condition_variable arrived;
-    bool done = false;
-};
+    QList<std::pair<QVariant, zaf::OptionalError>> outcomes;
+    bool offMainThread = true;
 
-// Loads from the main thread and waits (bounded) for the handler.
-std::shared_ptr<LoadOutcome> load(const ItemAttachment &attachment, const QString &type)
-{
-    auto outcome = std::make_shared<LoadOutcome>();
-    attachment.loadItemForTypeIdentifier(type, {}, [outcome](const QVariant &value, const zaf::OptionalError &error) {
-        std::lock_guard lock(outcome->mutex);
-        outcome->value = value;
-        outcome->error = error;
-        outcome->onMainThread = QThread::currentThread() == QCoreApplication::instance()->thread();
-        outcome->done = true;
-        outcome->arrived.notify_all();
-    });
-    std::unique_lock lock(outcome->mutex);
-    EXPECT_TRUE(outcome->arrived.wait_for(lock, std::chrono::seconds(5), [&] { return outcome->done; })) << "the load handler never ran";
-    return outcome;
-}
+    void load(const ItemAttachment &attachment, const QString &type, const std::shared_ptr<Loads> &self)
+    {
+        attachment.loadItemForTypeIdentifier(type, {}, [self](const QVariant &value, const zaf::OptionalError &error) {
+            std::lock_guard lock(self->mutex);
+            self->outcomes.append({value, error});
+            self->offMainThread &= QThread::currentThread() != QCoreApplication::instance()->thread();
+            self->arrived.notify_all();
+        });
+    }
+    bool waitFor(int count)
+    {
+        std::unique_lock lock(mutex);
+        return arrived.wait_for(lock, std::chrono::seconds(10), [&] { return outcomes.size() == count; });
+    }
+};
 
 } // namespace
 
@@ -120,12 +115,15 @@ class ItemAttachmentLoadTest : public ::testing::TestWithParam<Load> {};
 
 TEST_P(ItemAttachmentLoadTest, EndsOnAGlobalQueueThread)
 {
-    const auto outcome = load(GetParam().attachment, GetParam().type);
-    EXPECT_FALSE(outcome->onMainThread);
-    EXPECT_EQ(outcome->value.metaType(), GetParam().expected.metaType());
-    EXPECT_EQ(outcome->value, GetParam().expected);
-    EXPECT_EQ(outcome->error.value_or(zaf::Error{}).code, GetParam().code);
-    EXPECT_EQ(outcome->error.value_or(zaf::Error{kItemAttachmentErrorDomain, 0, {}}).domain, QString::fromLatin1(kItemAttachmentErrorDomain));
+    const auto loads = std::make_shared<Loads>();
+    loads->load(GetParam().attachment, GetParam().type, loads);
+    ASSERT_TRUE(loads->waitFor(1)) << "the load handler never ran";
+    EXPECT_TRUE(loads->offMainThread);
+    const auto &[value, error] = loads->outcomes[0];
+    EXPECT_EQ(value.metaType(), GetParam().expected.metaType());
+    EXPECT_EQ(value, GetParam().expected);
+    EXPECT_EQ(error.value_or(zaf::Error{}).code, GetParam().code);
+    EXPECT_EQ(error.value_or(zaf::Error{kItemAttachmentErrorDomain, 0, {}}).domain, QString::fromLatin1(kItemAttachmentErrorDomain));
 }
 
 const ItemAttachment kColour(kTypeIdentifierColor, "#11223380");
@@ -148,26 +146,13 @@ INSTANTIATE_TEST_SUITE_P(Values, ItemAttachmentLoadTest, ::testing::Values(
 
 TEST(ItemAttachment, ManyConcurrentLoadsFromWorkerThreadsAllComplete)
 {
-    struct Shared {
-        std::mutex mutex;
-        std::condition_variable arrived;
-        int done = 0;
-        int good = 0;
-    };
-    const auto shared = std::make_shared<Shared>();
+    const auto loads = std::make_shared<Loads>();
     const auto attachment = std::make_shared<ItemAttachment>("text/plain", "value");
     constexpr int kLoads = 64;
-    for (int i = 0; i < kLoads; ++i) {
-        zaf::dispatch::async(zaf::dispatch::Priority::Background, [shared, attachment] {
-            attachment->loadItemForTypeIdentifier(kTypeIdentifierData, {}, [shared](const QVariant &value, const zaf::OptionalError &error) {
-                std::lock_guard lock(shared->mutex);
-                shared->good += !error && value.toString() == "value";
-                ++shared->done;
-                shared->arrived.notify_all();
-            });
-        });
-    }
-    std::unique_lock lock(shared->mutex);
-    ASSERT_TRUE(shared->arrived.wait_for(lock, std::chrono::seconds(10), [&] { return shared->done == kLoads; }));
-    EXPECT_EQ(shared->good, kLoads);
+    for (int i = 0; i < kLoads; ++i)
+        zaf::dispatch::async(zaf::dispatch::Priority::Background, [loads, attachment] { loads->load(*attachment, kTypeIdentifierData, loads); });
+    ASSERT_TRUE(loads->waitFor(kLoads));
+    std::lock_guard lock(loads->mutex);
+    for (const auto &[value, error] : loads->outcomes)
+        EXPECT_TRUE(!error && value.toString() == "value");
 }

@@ -1,5 +1,4 @@
-// JSON-RPC 2.0 parsing and validation: what is accepted, what is refused with which code, and with
-// which id each refusal is answered (a request's own, null, or none for notifications and responses).
+// JSON-RPC 2.0 parsing and validation: what is accepted, and each refusal's code and answer id.
 
 #include "platform/extensionkit/json_rpc.h"
 
@@ -124,13 +123,11 @@ INSTANTIATE_TEST_SUITE_P(Payloads, JsonRpcRefusalTest, ::testing::Values(
     Refusal{"AString", R"("hello")", rpc::InvalidRequest, null},
     Refusal{"ABatch", R"([{"jsonrpc":"2.0","id":1,"method":"m"}])", rpc::InvalidRequest, null},
     Refusal{"EmptyBatch", "[]", rpc::InvalidRequest, null},
-    Refusal{"RequestNestedOneLevelTooDeep", R"({"jsonrpc":"2.0","id":"d","method":"m","params":)" + nested(rpc::kMaxNestingDepth) + "}",
-        rpc::ParseError, QJsonValue("d")},
+    Refusal{"RequestNestedOneLevelTooDeep", R"({"jsonrpc":"2.0","id":"d","method":"m","params":)" + nested(rpc::kMaxNestingDepth) + "}", rpc::ParseError, QJsonValue("d")},
     Refusal{"DeepRequestWithABadId", R"({"jsonrpc":"2.0","id":[],"method":"m","params":)" + nested(500) + "}", rpc::ParseError, null},
     Refusal{"NotificationNestedTooDeep", R"({"jsonrpc":"2.0","method":"m","params":)" + nested(100000) + "}", rpc::ParseError, std::nullopt},
     Refusal{"BatchNestedTooDeep", nested(100000), rpc::ParseError, null},
-    Refusal{"DeepAndInvalidUtf8", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":2,\"method\":\"\xff\",\"params\":") + nested(70) + "}",
-        rpc::ParseError, QJsonValue(2)},
+    Refusal{"DeepAndInvalidUtf8", QByteArray("{\"jsonrpc\":\"2.0\",\"id\":2,\"method\":\"\xff\",\"params\":") + nested(70) + "}", rpc::ParseError, QJsonValue(2)},
     Refusal{"MissingVersion", R"({"id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
     Refusal{"Version1", R"({"jsonrpc":"1.0","id":1,"method":"m"})", rpc::InvalidRequest, QJsonValue(1)},
     Refusal{"NumericVersion", R"({"jsonrpc":2.0,"id":"x","method":"m"})", rpc::InvalidRequest, QJsonValue("x")},
