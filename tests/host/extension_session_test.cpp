@@ -209,38 +209,35 @@ INSTANTIATE_TEST_SUITE_P(Runs, ExtensionSessionRunTest, ::testing::Values(
     Run{"NotAccepted", R"(take send {"jsonrpc":"2.0","id":1,"result":{"accepted":false}} exit 0)", "did not accept", "rejected closed finished"},
     Run{"AbortWithoutAReport", "accept crash", "", "accepted closed finished", 128 + SIGABRT, true}), caseName);
 
-TEST(ExtensionSessionStart, ProgramThatCannotRunFailsWithAReasonAndNoSignal)
+// A start that fails says why, in the log too, and leaves no process, channel or signal; a session
+// that ran is not started again.
+struct StartFailure { const char *name; bool ranBefore; const char *program; QList<host::InputItem> items; const char *reason; };
+
+class ExtensionSessionStartFailureTest : public ::testing::TestWithParam<StartFailure> {};
+
+TEST_P(ExtensionSessionStartFailureTest, GivesAReasonAndNoSignal)
 {
-    ScratchDir scratch;
     LogCapture log;
     RecordedSession s;
+    if (GetParam().ranBefore) {
+        ASSERT_TRUE(s.run("accept exit 0"));
+        s.events.clear();
+    }
     QString error;
-    EXPECT_FALSE(s.session.start(scratch.file("missing"), requiredItems(), &error));
-    EXPECT_TRUE(error.contains(scratch.file("missing"))) << error.toStdString();
+    EXPECT_FALSE(s.session.start(GetParam().program, GetParam().items, &error));
+    EXPECT_TRUE(error.contains(GetParam().reason)) << error.toStdString();
     EXPECT_TRUE(log.messages("zaf.host").contains(error));
+    EXPECT_EQ(s.session.processId() == 0, !GetParam().ranBefore);
     EXPECT_FALSE(s.session.isRunning());
     EXPECT_FALSE(s.session.isChannelOpen());
     QCoreApplication::processEvents();
     EXPECT_TRUE(s.events.isEmpty());
 }
 
-TEST(ExtensionSessionStart, RequestAboveTheCapFailsWithoutAProcess)
-{
-    host::ExtensionSession big;
-    QString error;
-    EXPECT_FALSE(big.start(ZAF_FAKE_EXTENSION_BIN, {host::makeShareMessageItem(QString(host::kMaxMessageLength, 'm'))}, &error));
-    EXPECT_TRUE(error.contains("too large")) << error.toStdString();
-    EXPECT_EQ(big.processId(), 0);
-}
-
-TEST(ExtensionSessionStart, SecondStartIsRefused)
-{
-    RecordedSession s;
-    ASSERT_TRUE(s.run("accept exit 0"));
-    QString error;
-    EXPECT_FALSE(s.session.start(ZAF_FAKE_EXTENSION_BIN, requiredItems(), &error));
-    EXPECT_TRUE(error.contains("already started")) << error.toStdString();
-}
+INSTANTIATE_TEST_SUITE_P(Starts, ExtensionSessionStartFailureTest, ::testing::Values(
+    StartFailure{"ProgramCannotRun", false, "/nonexistent/zaf-extension", requiredItems(), "/nonexistent/zaf-extension"},
+    StartFailure{"RequestAboveTheCap", false, ZAF_FAKE_EXTENSION_BIN, {host::makeShareMessageItem(QString(host::kMaxMessageLength, 'm'))}, "too large"},
+    StartFailure{"SecondStart", true, ZAF_FAKE_EXTENSION_BIN, requiredItems(), "already started"}), caseName);
 
 TEST(ExtensionSessionExit, ClosedChannelIsReportedWhileTheProcessRuns)
 {

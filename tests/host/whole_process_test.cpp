@@ -1,6 +1,6 @@
-// The whole process under Xvfb: zaf-host starts the real extension on a fixture recording, the
-// editor is driven with the keyboard, and the host prints the report and exits cleanly, with the
-// extension gone and its temporary directory left empty.
+// The whole process under Xvfb: zaf-host starts the real extension on a fixture recording and the
+// editor is driven with the keyboard.
+#include "tests/host/process_state.h"
 #include "tests/support/child_process.h"
 #include "tests/support/temp_dir.h"
 
@@ -9,9 +9,6 @@
 #include <QStandardPaths>
 
 #include <gtest/gtest.h>
-
-#include <cerrno>
-#include <csignal>
 
 namespace zaf::test {
 namespace {
@@ -30,9 +27,8 @@ protected:
         QFile file(scratch.file(name));
         return file.open(QIODevice::ReadOnly) ? QString::fromUtf8(file.readAll()) : QString();
     }
-    // Runs the whole-process script for a scenario and checks what every run must end with: the
-    // script ran through, zaf-host printed `report` and exited with `hostStatus`, and the temporary
-    // directory is empty.
+    // Runs the script's scenario: it runs through, zaf-host prints `report` and exits with
+    // `hostStatus`, and the extension's temporary directory is left empty.
     void run(const char *scenario, const char *report, const char *movie = "fixture", const char *hostStatus = "0")
     {
         zaf::test::ChildOptions options;
@@ -50,8 +46,7 @@ protected:
         ASSERT_TRUE(temp.exists()) << "the extension made its temporary directory ready";
         EXPECT_EQ(temp.entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot), QStringList());
     }
-    // A run that saved nothing: the recording as it was and the library without any file, not
-    // even a hidden partial one.
+    // A run that saved nothing: the recording as it was and no file, not even a hidden partial one.
     void expectTheRecordingKeptAndNothingInTheLibrary()
     {
         const QString digest = QString::fromLatin1(fileDigest(scratch.file("movie.mp4")).toHex());
@@ -59,14 +54,10 @@ protected:
         EXPECT_EQ(QDir(scratch.file("Videos")).entryList(QDir::AllEntries | QDir::Hidden | QDir::System | QDir::NoDotAndDotDot),
                   QStringList());
     }
-    // Whether the process has ended.
-    static bool gone(int pid) { return ::kill(pid, 0) != 0 && errno == ESRCH; }
-    int extensionPid()
+    void expectTheExtensionGone()
     {
-        bool ok = false;
-        const int pid = read("extension.pid").trimmed().toInt(&ok);
-        EXPECT_TRUE(ok && pid > 0) << "the editor window's process is unknown";
-        return ok ? pid : 0;
+        const int pid = read("extension.pid").trimmed().toInt();
+        EXPECT_TRUE(pid > 0 && !processExists(pid)) << "the extension " << pid << " is unknown or still running";
     }
 
     // The library holds one movie: the range 1 s to 2.5 s, its two audio tracks mixed into one.
@@ -95,8 +86,7 @@ class ZafHostWholeProcessCancel : public ZafHostWholeProcess, public ::testing::
 TEST_P(ZafHostWholeProcessCancel, EscapeReportsNothingEndsTheExtensionAndLeavesNoTrace)
 {
     ASSERT_NO_FATAL_FAILURE(run("cancel", "[]\n", GetParam()));
-    const int pid = extensionPid();
-    EXPECT_TRUE(pid && gone(pid)) << "the extension " << pid << " is still running";
+    expectTheExtensionGone();
 }
 
 INSTANTIATE_TEST_SUITE_P(Movies, ZafHostWholeProcessCancel, ::testing::Values("fixture", "tiny", "garbage"));
@@ -136,8 +126,7 @@ TEST_F(ZafHostWholeProcess, AnExtensionKilledMidTrimLeavesNothingOnceTheNextEdit
 TEST_F(ZafHostWholeProcess, AHostThatDiesLeavesTheExtensionToEmptyItsDirectoryAndExit)
 {
     ASSERT_NO_FATAL_FAILURE(run("host-dies", "", "fixture", "137"));
-    const int pid = extensionPid();
-    EXPECT_TRUE(pid && gone(pid)) << "the extension " << pid << " is still running";
+    expectTheExtensionGone();
     expectTheRecordingKeptAndNothingInTheLibrary();
 }
 
