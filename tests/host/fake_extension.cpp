@@ -8,7 +8,6 @@
 //   report-big N      a report of N activity types of 100 characters each
 //   send PAYLOAD      a frame carrying PAYLOAD as it is (JSON or not)
 //   oversized         a length prefix of 1 MiB + 1 followed by a few bytes
-//   partial           a length prefix of 100 followed by 10 bytes, then the channel is closed
 //   expect-error      read one message; exit 4 unless it is a JSON-RPC error answer with id 7
 //   await-remove      read until the removeExtensionView notification (exit 0); exit 3 at end of channel
 //   await-eof         read until the end of the channel
@@ -138,9 +137,7 @@ int main()
             writeAll(zaf::extensionkit::encodeFrame(argument().toUtf8()));
         } else if (step == "oversized") {
             writeAll(zaf::extensionkit::encodeFrame(QByteArray(1024 * 1024 + 1, 'x')).left(68));
-        } else if (step == "partial" || step == "close") {
-            if (step == "partial")
-                writeAll(zaf::extensionkit::encodeFrame(QByteArray(100, '{')).left(14));
+        } else if (step == "close") {
             ::close(std::exchange(g_fd, -1));
         } else if (step == "expect-error") {
             const std::optional<QJsonObject> answer = readMessage();
