@@ -1,3 +1,4 @@
+// MediaAsset: its tracks, duration and transform as ffprobe sees them, its failures and threads.
 #include "platform/media/media_asset.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/fixture_movies.h"

@@ -1,5 +1,4 @@
-// ExportSession without a range or a mix: every stream copied bit-exact, the progress it reports on
-// the way.
+// ExportSession without a range or a mix, and the progress it reports on the way.
 #include "tests/platform/media/export_test_support.h"
 
 #include <QFile>

@@ -1,5 +1,4 @@
-// ExportSession when it cannot or must not finish: refused sessions, bad settings or inputs,
-// unwritable outputs and cancellation end with one completion, an error and no output file.
+// ExportSession when it cannot or must not finish: one completion, an error and no output file.
 #include "tests/platform/media/export_test_support.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/media/unusable_movies.h"
@@ -31,10 +30,9 @@ protected:
         EXPECT_FALSE(QFile::exists(output));
         expectNoPartialFiles();
     }
-    void expectNoPartialFiles() { expectNoPartialFilesIn(scratch.path()); }
-    static void expectNoPartialFilesIn(const QString &directory)
+    void expectNoPartialFiles()
     {
-        for (const QString &name : entryNames(directory))
+        for (const QString &name : entryNames(scratch.path()))
             EXPECT_FALSE(name.contains(QStringLiteral("partial"))) << name.toStdString();
     }
     ScratchDir scratch;

@@ -1,7 +1,6 @@
 #pragma once
 
-// What the ExportSession tests share: sessions on fixture movies, a waiter for their one completion,
-// re-encoded fixtures kept in the fixture cache, and a fixture that exports into a scratch directory.
+// What the ExportSession tests share: sessions, a waiter for their one completion, re-encoded fixtures.
 
 #include "platform/media/export_session.h"
 #include "tests/support/media/fixture_movies.h"

@@ -1,6 +1,4 @@
-// ExportSession with a time range, checked by the pictures: a trim keeps exactly the frames shown
-// during its range, whatever the keyframes, B-frames, frame rate, rotation or codec, and its audio
-// tracks are cut to the same range.
+// ExportSession with a time range: exactly the frames shown during it, and every audio track cut alike.
 #include "tests/platform/media/export_test_support.h"
 #include "tests/support/media/decoded_pictures.h"
 #include "tests/support/media/second_decoder.h"

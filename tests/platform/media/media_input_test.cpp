@@ -1,5 +1,4 @@
-// The input layer every media stage opens files through: the cancel token, openInput and the
-// decoder set-up.
+// The input layer every media stage opens files through: cancel token, openInput, decoder set-up.
 
 #include "platform/media/core/cancel_token.h"
 #include "platform/media/core/decoder_setup.h"
@@ -66,24 +65,20 @@ QString movieCopy(const ScratchDir &dir, const QString &name)
     return path;
 }
 
+QString movie(const ScratchDir &d)
+{
+    return movieCopy(d, QStringLiteral("movie.mp4"));
+}
+
 const OpenCase kOpenCases[] = {
-    {"Movie", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("movie.mp4")); }, Token::Fresh, true, ""},
-    {"NonAsciiName", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("Aufnahme é 日本 10:43.mp4")); },
-     Token::Fresh, true, ""},
+    {"Movie", movie, Token::Fresh, true, ""},
+    {"NonAsciiName", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("Aufnahme é 日本 10:43.mp4")); }, Token::Fresh, true, ""},
     // Relative, with what looks like a protocol in front: still the local file of that name.
-    {"NameLikeAProtocol", [](const ScratchDir &d) {
-         movieCopy(d, QStringLiteral("clip:1.mp4"));
-         return QDir::setCurrent(d.path()) ? QStringLiteral("clip:1.mp4") : QString();
-     },
-     Token::Fresh, true, ""},
-    {"CancelledBefore", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("movie.mp4")); }, Token::Cancelled, false,
-     "cancelled"},
-    {"DeadlinePassed", [](const ScratchDir &d) { return movieCopy(d, QStringLiteral("movie.mp4")); }, Token::DeadlinePassed,
-     false, "movie.mp4"},
-    {"Missing", [](const ScratchDir &d) { return d.file(QStringLiteral("nothing-here.mp4")); }, Token::Fresh, false,
-     "cannot open"},
-    {"Garbage", [](const ScratchDir &d) { return d.write(QStringLiteral("garbage.mp4"), 5000); }, Token::Fresh, false,
-     "garbage.mp4"},
+    {"NameLikeAProtocol", [](const ScratchDir &d) { movieCopy(d, QStringLiteral("clip:1.mp4")); return QDir::setCurrent(d.path()) ? QStringLiteral("clip:1.mp4") : QString(); }, Token::Fresh, true, ""},
+    {"CancelledBefore", movie, Token::Cancelled, false, "cancelled"},
+    {"DeadlinePassed", movie, Token::DeadlinePassed, false, "movie.mp4"},
+    {"Missing", [](const ScratchDir &d) { return d.file(QStringLiteral("nothing-here.mp4")); }, Token::Fresh, false, "cannot open"},
+    {"Garbage", [](const ScratchDir &d) { return d.write(QStringLiteral("garbage.mp4"), 5000); }, Token::Fresh, false, "garbage.mp4"},
 };
 
 class OpenInputTest : public testing::TestWithParam<OpenCase> {

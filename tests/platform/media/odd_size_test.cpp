@@ -1,6 +1,5 @@
-// Movies with tiny and odd picture sizes through every place that converts or scales pictures:
-// thumbnails at any height (rotation included), the player's first picture and its layer, and trim
-// and mix exports. Each must keep the size and colour of the movie and never write past a picture.
+// Tiny and odd picture sizes through every place that converts or scales pictures: each keeps the
+// movie's size and colour and never writes past a picture.
 #include "platform/media/image_generator.h"
 #include "platform/media/player.h"
 #include "platform/media/player_layer.h"

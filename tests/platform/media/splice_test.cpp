@@ -1,6 +1,4 @@
-// The pieces a smart cut rests on: reading and writing H.264 parameter sets and sample
-// descriptions, and the check that decodes a written movie around its splice points.
-
+// What a smart cut rests on: H.264 parameter sets, sample descriptions, and the splice check.
 #include "platform/media/core/cancel_token.h"
 #include "platform/media/export/export_pipeline.h"
 #include "platform/media/export/h264_bitstream.h"
