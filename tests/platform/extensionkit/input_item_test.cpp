@@ -13,6 +13,7 @@
 #include <gtest/gtest.h>
 
 #include <condition_variable>
+#include <memory>
 #include <mutex>
 
 using namespace zaf::extensionkit;
@@ -24,15 +25,15 @@ namespace {
 
 // The outcomes of loads, which may end on any thread. Standard locking rather than QSemaphore,
 // whose hand-over ThreadSanitizer cannot see.
-struct Loads {
+struct Loads : std::enable_shared_from_this<Loads> {
     std::mutex mutex;
     std::condition_variable arrived;
     QList<std::pair<QVariant, zaf::OptionalError>> outcomes;
     bool offMainThread = true;
 
-    void load(const ItemAttachment &attachment, const QString &type, const std::shared_ptr<Loads> &self)
+    void load(const ItemAttachment &attachment, const QString &type)
     {
-        attachment.loadItemForTypeIdentifier(type, {}, [self](const QVariant &value, const zaf::OptionalError &error) {
+        attachment.loadItemForTypeIdentifier(type, {}, [self = shared_from_this()](const QVariant &value, const zaf::OptionalError &error) {
             std::lock_guard lock(self->mutex);
             self->outcomes.append({value, error});
             self->offMainThread &= QThread::currentThread() != QCoreApplication::instance()->thread();
@@ -116,7 +117,7 @@ class ItemAttachmentLoadTest : public ::testing::TestWithParam<Load> {};
 TEST_P(ItemAttachmentLoadTest, EndsOnAGlobalQueueThread)
 {
     const auto loads = std::make_shared<Loads>();
-    loads->load(GetParam().attachment, GetParam().type, loads);
+    loads->load(GetParam().attachment, GetParam().type);
     ASSERT_TRUE(loads->waitFor(1)) << "the load handler never ran";
     EXPECT_TRUE(loads->offMainThread);
     const auto &[value, error] = loads->outcomes[0];
@@ -150,7 +151,7 @@ TEST(ItemAttachment, ManyConcurrentLoadsFromWorkerThreadsAllComplete)
     const auto attachment = std::make_shared<ItemAttachment>("text/plain", "value");
     constexpr int kLoads = 64;
     for (int i = 0; i < kLoads; ++i)
-        zaf::dispatch::async(zaf::dispatch::Priority::Background, [loads, attachment] { loads->load(*attachment, kTypeIdentifierData, loads); });
+        zaf::dispatch::async(zaf::dispatch::Priority::Background, [loads, attachment] { loads->load(*attachment, kTypeIdentifierData); });
     ASSERT_TRUE(loads->waitFor(kLoads));
     std::lock_guard lock(loads->mutex);
     for (const auto &[value, error] : loads->outcomes)
