@@ -13,7 +13,6 @@
 #include <gtest/gtest.h>
 
 #include <optional>
-#include <random>
 #include <thread>
 
 using zaf::extensionkit::Channel;
@@ -86,6 +85,7 @@ TEST_P(ChannelMalformedTest, IsAnsweredAsJsonRpcAsks)
     }
     EXPECT_TRUE(pair.nothingToRead());
     EXPECT_TRUE(notifications.isEmpty());
+    EXPECT_TRUE(closes.isEmpty());
 }
 
 INSTANTIATE_TEST_SUITE_P(Frames, ChannelMalformedTest, ::testing::Values(
@@ -95,22 +95,6 @@ INSTANTIATE_TEST_SUITE_P(Frames, ChannelMalformedTest, ::testing::Values(
     Malformed{"InvalidUtf8InANotification", QByteArray("{\"jsonrpc\":\"2.0\",\"method\":\"\xff\"}"), std::nullopt},
     Malformed{"ResponseWithResultAndError", R"({"jsonrpc":"2.0","id":6,"result":1,"error":{"code":1,"message":"m"}})", std::nullopt}),
     zaf::test::caseName);
-
-TEST_F(ChannelTest, RandomFramesNeverStopTheReading)
-{
-    std::mt19937 random(4242);
-    for (int i = 0; i < 200; ++i) {
-        QByteArray payload(int(random() % 300), Qt::Uninitialized);
-        for (char &c : payload)
-            c = char(random());
-        pair.writeFrame(payload);
-    }
-    pair.writeMessage(rpc::makeNotification("end"));
-    ASSERT_TRUE(waitUntil([&] { return !notifications.isEmpty() && notifications.last().first == "end"; }, 5000));
-    EXPECT_TRUE(channel->isOpen());
-    EXPECT_GE(protocolErrors.size(), 190);
-    EXPECT_TRUE(closes.isEmpty());
-}
 
 TEST(ChannelLifetime, DroppedOnAWorkerIsDeletedOnItsOwnThread)
 {
