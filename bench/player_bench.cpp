@@ -64,8 +64,7 @@ constexpr int kDragIntervalMs = 16;
 constexpr int kPlaySeconds = 10;
 
 struct Movie {
-    QString label;
-    QString path;
+    QString label, path;
     int fps = 30;
 };
 
@@ -78,8 +77,7 @@ double percentile(std::vector<double> v, double p)
     if (v.empty())
         return NAN;
     std::sort(v.begin(), v.end());
-    const size_t rank = size_t(std::ceil(p * double(v.size())));
-    return v[std::min(v.size() - 1, rank > 0 ? rank - 1 : 0)];
+    return v[std::min(v.size(), size_t(std::max(1.0, std::ceil(p * double(v.size()))))) - 1]; // the nearest rank
 }
 
 // "12.3" or "timeout" / "-" for a figure the run did not produce.
@@ -95,16 +93,15 @@ double cpuSeconds(int who)
     return u.ru_utime.tv_sec + u.ru_utime.tv_usec / 1e6 + u.ru_stime.tv_sec + u.ru_stime.tv_usec / 1e6;
 }
 
-// The peak resident set (VmHWM) in MB, from /proc/self/status.
-double peakResidentMB()
+// A size field of /proc/self/status ("VmHWM:" the peak resident set, "VmRSS:" the current one) in MB.
+double statusMB(const QByteArray &field)
 {
     QFile status(QStringLiteral("/proc/self/status"));
     if (!status.open(QIODevice::ReadOnly))
         return NAN;
-    for (const QByteArray &line : status.readAll().split('\n')) {
-        if (line.startsWith("VmHWM:"))
-            return line.mid(6).trimmed().split(' ').first().toDouble() / 1024;
-    }
+    for (const QByteArray &line : status.readAll().split('\n'))
+        if (line.startsWith(field))
+            return line.mid(field.size()).trimmed().split(' ').first().toDouble() / 1024;
     return NAN;
 }
 
@@ -156,12 +153,10 @@ QString recording(const QString &work, int seconds, int width, int height, int f
     std::fflush(stdout);
     const QString partial = path + QStringLiteral(".part.mp4");
     const QString gop = QString::number(fps * gopSeconds);
-    const bool ok = ffmpeg({QStringLiteral("-i"), plain, QStringLiteral("-map"), QStringLiteral("0"), QStringLiteral("-vf"),
-                            QStringLiteral("noise=alls=6:allf=t+u"), QStringLiteral("-c:v"), QStringLiteral("libx264"),
-                            QStringLiteral("-preset"), QStringLiteral("veryfast"), QStringLiteral("-bf"), QStringLiteral("3"),
-                            QStringLiteral("-g"), gop, QStringLiteral("-keyint_min"), gop, QStringLiteral("-sc_threshold"),
-                            QStringLiteral("0"), QStringLiteral("-crf"), QStringLiteral("20"), QStringLiteral("-c:a"),
-                            QStringLiteral("copy"), partial});
+    const bool ok = ffmpeg(QStringList{QStringLiteral("-i"), plain}
+                           + QStringLiteral("-map 0 -vf noise=alls=6:allf=t+u -c:v libx264 -preset veryfast -bf 3 -g %1 "
+                                            "-keyint_min %1 -sc_threshold 0 -crf 20 -c:a copy").arg(gop).split(QLatin1Char(' '))
+                           + QStringList{partial});
     if (!ok || !QFile::rename(partial, path)) {
         QFile::remove(partial);
         std::exit(1);
@@ -172,10 +167,7 @@ QString recording(const QString &work, int seconds, int width, int height, int f
 // Every picture a Player shows, with the frame number it carries and when it came.
 class ShownPictures {
 public:
-    struct Picture {
-        qint64 atNs = 0;
-        int number = -1;
-    };
+    struct Picture { qint64 atNs = 0; int number = -1; }; // when it came; -1: no number read
 
     explicit ShownPictures(Player *player)
     {
@@ -193,7 +185,7 @@ public:
         if (done())
             return true;
         QEventLoop loop;
-        QTimer::singleShot(timeoutMs, &loop, &QEventLoop::quit);
+        QTimer::singleShot(timeoutMs, Qt::PreciseTimer, &loop, &QEventLoop::quit);
         m_check = [&] {
             if (done())
                 loop.quit();
@@ -224,7 +216,7 @@ private:
 void runFor(int msecs)
 {
     QEventLoop loop;
-    QTimer::singleShot(msecs, &loop, &QEventLoop::quit);
+    QTimer::singleShot(msecs, Qt::PreciseTimer, &loop, &QEventLoop::quit);
     loop.exec();
 }
 
@@ -339,9 +331,8 @@ std::vector<int> randomFrames(int count, int frames, unsigned seed)
 {
     std::mt19937 random(seed);
     std::uniform_int_distribution<int> pick(1, std::max(1, frames - 2));
-    std::vector<int> out;
-    for (int i = 0; i < count; ++i)
-        out.push_back(pick(random));
+    std::vector<int> out(size_t(std::max(0, count)));
+    std::generate(out.begin(), out.end(), [&] { return pick(random); });
     return out;
 }
 
@@ -379,8 +370,8 @@ void seekBench(const Movie &movie, int seekCount)
     std::vector<double> ff;
     for (int frame : targets) {
         const qint64 start = g_clock.nsecsElapsed();
-        if (ffmpeg({QStringLiteral("-ss"), QString::number((frame + 0.5) / movie.fps, 'f', 6), QStringLiteral("-i"), movie.path,
-                    QStringLiteral("-frames:v"), QStringLiteral("1"), QStringLiteral("-f"), QStringLiteral("null"), QStringLiteral("-")}))
+        if (ffmpeg(QStringList{QStringLiteral("-ss"), QString::number((frame + 0.5) / movie.fps, 'f', 6), QStringLiteral("-i"), movie.path}
+                   + QStringLiteral("-frames:v 1 -f null -").split(QLatin1Char(' '))))
             ff.push_back(ms(g_clock.nsecsElapsed() - start));
     }
     printSeekRow("random seek", random, &ff);
@@ -397,12 +388,13 @@ void seekBench(const Movie &movie, int seekCount)
     printSeekRow("back step", back);
 
     const Drag d = drag(p, movie);
-    std::vector<double> next = d.nextPicture;
-    std::printf("  %-14s %d seeks in %.0f ms over %.0f s of movie: %d picture(s) shown during the drag; %d of %d seeks "
-                "followed by one, seek -> next picture p50 %s  p90 %s  max %s ms\n"
+    const std::vector<double> &next = d.nextPicture;
+    std::printf("  %-14s %d seeks in %.0f ms over %.0f s of movie: %d picture%s shown during the drag\n"
+                "  %-14s seek -> next picture shown during the drag (%d of %d seeks had one): p50 %s  p90 %s  max %s ms\n"
                 "  %-14s last seek -> its exact frame %s ms\n",
-                "drag", d.seeks, d.wallMs, kDragSpan, d.pictures, d.answered, d.seeks - 1, qPrintable(fmt(percentile(next, 0.5))),
-                qPrintable(fmt(percentile(next, 0.9))), qPrintable(fmt(percentile(next, 1.0))), "",
+                "drag", d.seeks, d.wallMs, kDragSpan, d.pictures, d.pictures == 1 ? "" : "s", "", d.answered, d.seeks - 1,
+                qPrintable(fmt(percentile(next, 0.5), "none")), qPrintable(fmt(percentile(next, 0.9), "none")),
+                qPrintable(fmt(percentile(next, 1.0), "none")), "",
                 qPrintable(fmt(d.lastToExact, "timeout")));
     std::fflush(stdout);
 }
@@ -416,27 +408,29 @@ void playbackBench(const Movie &movie, bool audioDevice)
     }
     runFor(300); // the decoder fills its queue
     const bool peakReset = resetPeakResident();
+    const double before = statusMB("VmRSS:");
     const size_t from = p.shown->pictures.size();
     const double mediaStart = p.player->currentTime().seconds();
     const double cpuStart = cpuSeconds(RUSAGE_SELF);
+    const qint64 wallStart = g_clock.nsecsElapsed();
     p.player->play();
     runFor(kPlaySeconds * 1000);
     p.player->pause();
     const double cpu = cpuSeconds(RUSAGE_SELF) - cpuStart;
+    const double wall = (g_clock.nsecsElapsed() - wallStart) / 1e9;
     const double media = p.player->currentTime().seconds() - mediaStart;
-    const double peak = peakResidentMB();
+    const double peak = statusMB("VmHWM:");
     const int shown = int(p.shown->pictures.size() - from);
 
-    QStringList args{QStringLiteral("-i"), movie.path, QStringLiteral("-t"), QString::number(kPlaySeconds)};
-    if (!audioDevice)
-        args << QStringLiteral("-an");
-    args << QStringLiteral("-f") << QStringLiteral("null") << QStringLiteral("-");
+    const QStringList args = QStringList{QStringLiteral("-i"), movie.path, QStringLiteral("-t"), QString::number(kPlaySeconds)}
+                             + QStringLiteral("%1-f null -").arg(QLatin1String(audioDevice ? "" : "-an ")).split(QLatin1Char(' '));
     const double ffStart = cpuSeconds(RUSAGE_CHILDREN);
     const bool ffOk = ffmpeg(args);
     const double ffPerSecond = ffOk ? (cpuSeconds(RUSAGE_CHILDREN) - ffStart) / kPlaySeconds : NAN;
     const double ours = media > 0 ? cpu / media : NAN;
-    std::printf("%-28s %6.2f s  %4d of %4d shown  CPU %5.2f s/s  peak RSS %6.0f MB%s   ffmpeg CPU %5.2f s/s   ratio %5.2fx\n",
-                qPrintable(movie.label), media, shown, int(std::lround(media * movie.fps)), ours, peak,
+    std::printf("%-28s %5.2f s media in %5.2f s  %4d of %4d pictures shown  CPU %5.2f s/s  RSS %4.0f MB, peak %4.0f MB%s"
+                "   ffmpeg CPU %5.2f s/s   ratio %5.2fx\n",
+                qPrintable(movie.label), media, wall, shown, int(std::lround(media * movie.fps)), ours, before, peak,
                 peakReset ? "" : " (process peak)", ffPerSecond, ours / ffPerSecond);
     std::fflush(stdout);
 }
@@ -495,10 +489,10 @@ int main(int argc, char **argv)
         seekBench(movie, seeks);
 
     const QAudioDevice device = QMediaDevices::defaultAudioOutput();
-    std::printf("\n== playback for %d s: audio device %s; CPU = user + sys of the whole process per media second\n", kPlaySeconds,
-                device.isNull() ? "none found (the Player runs on the steady clock, no sound decoded; ffmpeg runs with -an)"
-                                : qPrintable(QStringLiteral("\"%1\" found (the Player runs on the audio clock and decodes sound)")
-                                                 .arg(device.description())));
+    const QString audio = device.isNull() ? QStringLiteral("none found (the Player runs on the steady clock; ffmpeg runs with -an)")
+                                          : QStringLiteral("\"%1\" (the Player plays on its clock)").arg(device.description());
+    std::printf("\n== playback for %d s (CPU: user + sys of the process per media second; RSS before play, peak while playing)\n"
+                "audio device: %s\n", kPlaySeconds, qPrintable(audio));
     for (const Movie &movie : playMovies)
         playbackBench(movie, !device.isNull());
     return 0;
