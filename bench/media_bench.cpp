@@ -17,6 +17,7 @@
 // - mix the two audio tracks into one with the video copied, against ffmpeg doing the same;
 // - the save's mix of a one-track movie, against ffmpeg's stream copy (nothing to mix);
 // - 16 thumbnails 90 px high, against 16 ffmpeg seeks.
+#include "bench/bench_recordings.h"
 #include "media/audio_mix_utility.h"
 #include "platform/log.h"
 #include "platform/media/export_session.h"
@@ -28,7 +29,6 @@
 #include <QElapsedTimer>
 #include <QFile>
 #include <QCoreApplication>
-#include <QProcess>
 #include <QUrl>
 
 #include <algorithm>
@@ -38,6 +38,7 @@
 #include <mutex>
 
 using namespace zaf::media;
+using zaf::bench::runFfmpeg;
 
 namespace {
 
@@ -74,17 +75,6 @@ double timeIt(int runs, const std::function<bool()> &job)
         times.push_back(t.nsecsElapsed() / 1e9);
     }
     return median(times);
-}
-
-bool ffmpeg(const QStringList &args)
-{
-    QProcess p;
-    p.start(QStringLiteral("ffmpeg"), QStringList{QStringLiteral("-v"), QStringLiteral("error"), QStringLiteral("-y")} + args);
-    if (!p.waitForFinished(-1) || p.exitCode() != 0) {
-        std::fprintf(stderr, "ffmpeg failed: %s\n", p.readAllStandardError().constData());
-        return false;
-    }
-    return true;
 }
 
 bool runExport(const std::shared_ptr<ExportSession> &session)
@@ -149,7 +139,7 @@ bool ourThumbnails(const QString &in)
 bool ffmpegThumbnails(const QString &in, const QString &dir, double duration)
 {
     for (int i = 0; i < kThumbnails; ++i) {
-        if (!ffmpeg({QStringLiteral("-ss"), QString::number(duration * i / kThumbnails), QStringLiteral("-i"), in,
+        if (!runFfmpeg({QStringLiteral("-ss"), QString::number(duration * i / kThumbnails), QStringLiteral("-i"), in,
                      QStringLiteral("-frames:v"), QStringLiteral("1"), QStringLiteral("-vf"),
                      QStringLiteral("scale=-2:%1").arg(kThumbnailHeight),
                      QDir(dir).filePath(QStringLiteral("ff-%1.png").arg(i))}))
@@ -166,8 +156,6 @@ QString recording(const QString &work, int seconds, int audioTracks)
     const QString path = QDir(work).filePath(QStringLiteral("recording-%1s-1080p30-%2audio-bframes-grain.mp4").arg(seconds).arg(audioTracks));
     if (QFile::exists(path))
         return path;
-    std::printf("generating %s ...\n", qPrintable(path));
-    std::fflush(stdout);
     const QString plain = path + QStringLiteral(".plain.mp4");
     QFile::remove(plain);
     zaf::fixture::FixtureSpec spec;
@@ -176,18 +164,9 @@ QString recording(const QString &work, int seconds, int audioTracks)
     spec.height = 1080;
     spec.fps = 30;
     spec.audioTracks = audioTracks;
-    if (const zaf::OptionalError e = zaf::fixture::writeFixtureMovie(plain, spec)) {
-        std::fprintf(stderr, "media_bench: %s\n", qPrintable(e->message));
-        std::exit(1);
-    }
-    const bool ok = ffmpeg({QStringLiteral("-i"), plain, QStringLiteral("-map"), QStringLiteral("0"),
-                            QStringLiteral("-vf"), QStringLiteral("noise=alls=6:allf=t+u"), QStringLiteral("-c:v"),
-                            QStringLiteral("libx264"), QStringLiteral("-preset"), QStringLiteral("veryfast"), QStringLiteral("-bf"),
-                            QStringLiteral("3"), QStringLiteral("-g"), QStringLiteral("60"), QStringLiteral("-crf"), QStringLiteral("20"),
-                            QStringLiteral("-c:a"), QStringLiteral("copy"), path});
+    zaf::bench::makeFixtureMovie(plain, spec);
+    zaf::bench::encodeRecording(plain, path, 60, false);
     QFile::remove(plain);
-    if (!ok)
-        std::exit(1);
     return path;
 }
 
@@ -224,7 +203,7 @@ int main(int argc, char **argv)
     const QString ffOut = QDir(work).filePath(QStringLiteral("ff-out.mp4"));
 
     auto ffmpegTrim = [&](const QStringList &codecs) {
-        return ffmpeg(QStringList{QStringLiteral("-ss"), QString::number(kTrimStart), QStringLiteral("-to"), QString::number(kTrimEnd),
+        return runFfmpeg(QStringList{QStringLiteral("-ss"), QString::number(kTrimStart), QStringLiteral("-to"), QString::number(kTrimEnd),
                                   QStringLiteral("-i"), movie, QStringLiteral("-map"), QStringLiteral("0")}
                       + codecs + QStringList{ffOut});
     };
@@ -246,7 +225,7 @@ int main(int argc, char **argv)
 
     const double mixOurs = timeIt(runs, [&] { return ourMix(movie, out); });
     const double mixFF = timeIt(runs, [&] {
-        return ffmpeg({QStringLiteral("-i"), movie, QStringLiteral("-filter_complex"), kMixFilter,
+        return runFfmpeg({QStringLiteral("-i"), movie, QStringLiteral("-filter_complex"), kMixFilter,
                        QStringLiteral("-map"), QStringLiteral("0:v"), QStringLiteral("-map"), QStringLiteral("[a]"),
                        QStringLiteral("-c:v"), QStringLiteral("copy"), QStringLiteral("-c:a"), QStringLiteral("aac"),
                        QStringLiteral("-b:a"), kAudioBitRate, QStringLiteral("-ar"), QStringLiteral("48000"), ffOut});
@@ -256,7 +235,7 @@ int main(int argc, char **argv)
     const QString oneTrack = recording(work, 60, 1);
     const double oneOurs = timeIt(runs, [&] { return ourMix(oneTrack, out); });
     const double oneFF = timeIt(runs, [&] {
-        return ffmpeg({QStringLiteral("-i"), oneTrack, QStringLiteral("-map"), QStringLiteral("0"), QStringLiteral("-c"),
+        return runFfmpeg({QStringLiteral("-i"), oneTrack, QStringLiteral("-map"), QStringLiteral("0"), QStringLiteral("-c"),
                        QStringLiteral("copy"), ffOut});
     });
     report("mix 1 track", oneOurs, oneFF, "vs stream copy; goal: about a copy");

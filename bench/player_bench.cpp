@@ -21,6 +21,7 @@
 // - single backward steps from a shown frame to the one before it;
 // - playback for 10 s of 1080p60 and 2160p30: CPU time (user + sys) per media second and the peak
 //   resident memory, against ffmpeg decoding the same 10 s as fast as it can.
+#include "bench/bench_recordings.h"
 #include "platform/log.h"
 #include "platform/media/media_asset.h"
 #include "platform/media/player.h"
@@ -34,7 +35,6 @@
 #include <QEventLoop>
 #include <QFile>
 #include <QMediaDevices>
-#include <QProcess>
 #include <QAudioDevice>
 #include <QTimer>
 #include <QUrl>
@@ -53,6 +53,7 @@
 #include <vector>
 
 using namespace zaf::media;
+using zaf::bench::runFfmpeg;
 
 namespace {
 
@@ -112,17 +113,6 @@ bool resetPeakResident()
     return f.open(QIODevice::WriteOnly) && f.write("5") == 1;
 }
 
-bool ffmpeg(const QStringList &args)
-{
-    QProcess p;
-    p.start(QStringLiteral("ffmpeg"), QStringList{QStringLiteral("-v"), QStringLiteral("error"), QStringLiteral("-y")} + args);
-    if (!p.waitForFinished(-1) || p.exitStatus() != QProcess::NormalExit || p.exitCode() != 0) {
-        std::fprintf(stderr, "ffmpeg failed: %s\n", p.readAllStandardError().constData());
-        return false;
-    }
-    return true;
-}
-
 // A recording as media_bench makes them: the fixture's numbered frames with a tone, grain added
 // and re-encoded with B-frames and `gopSeconds` groups of pictures. Made once; the plain fixture is
 // kept until the run ends, since the 2 s and 8 s recordings share it.
@@ -134,8 +124,6 @@ QString recording(const QString &work, int seconds, int width, int height, int f
         return path;
     const QString plain = QDir(work).filePath(stem + QStringLiteral("-plain.mp4"));
     if (!QFile::exists(plain)) {
-        std::printf("generating %s ...\n", qPrintable(plain));
-        std::fflush(stdout);
         zaf::fixture::FixtureSpec spec;
         spec.seconds = seconds;
         spec.width = width;
@@ -143,24 +131,10 @@ QString recording(const QString &work, int seconds, int width, int height, int f
         spec.fps = fps;
         spec.audioTracks = 1;
         spec.gop = fps * gopSeconds;
-        if (const zaf::OptionalError e = zaf::fixture::writeFixtureMovie(plain, spec)) {
-            std::fprintf(stderr, "player_bench: %s\n", qPrintable(e->message));
-            std::exit(1);
-        }
+        zaf::bench::makeFixtureMovie(plain, spec);
         plains->append(plain);
     }
-    std::printf("generating %s ...\n", qPrintable(path));
-    std::fflush(stdout);
-    const QString partial = path + QStringLiteral(".part.mp4");
-    const QString gop = QString::number(fps * gopSeconds);
-    const bool ok = ffmpeg(QStringList{QStringLiteral("-i"), plain}
-                           + QStringLiteral("-map 0 -vf noise=alls=6:allf=t+u -c:v libx264 -preset veryfast -bf 3 -g %1 "
-                                            "-keyint_min %1 -sc_threshold 0 -crf 20 -c:a copy").arg(gop).split(QLatin1Char(' '))
-                           + QStringList{partial});
-    if (!ok || !QFile::rename(partial, path)) {
-        QFile::remove(partial);
-        std::exit(1);
-    }
+    zaf::bench::encodeRecording(plain, path, fps * gopSeconds, true);
     return path;
 }
 
@@ -370,7 +344,7 @@ void seekBench(const Movie &movie, int seekCount)
     std::vector<double> ff;
     for (int frame : targets) {
         const qint64 start = g_clock.nsecsElapsed();
-        if (ffmpeg(QStringList{QStringLiteral("-ss"), QString::number((frame + 0.5) / movie.fps, 'f', 6), QStringLiteral("-i"), movie.path}
+        if (runFfmpeg(QStringList{QStringLiteral("-ss"), QString::number((frame + 0.5) / movie.fps, 'f', 6), QStringLiteral("-i"), movie.path}
                    + QStringLiteral("-frames:v 1 -f null -").split(QLatin1Char(' '))))
             ff.push_back(ms(g_clock.nsecsElapsed() - start));
     }
@@ -425,7 +399,7 @@ void playbackBench(const Movie &movie, bool audioDevice)
     const QStringList args = QStringList{QStringLiteral("-i"), movie.path, QStringLiteral("-t"), QString::number(kPlaySeconds)}
                              + QStringLiteral("%1-f null -").arg(QLatin1String(audioDevice ? "" : "-an ")).split(QLatin1Char(' '));
     const double ffStart = cpuSeconds(RUSAGE_CHILDREN);
-    const bool ffOk = ffmpeg(args);
+    const bool ffOk = runFfmpeg(args);
     const double ffPerSecond = ffOk ? (cpuSeconds(RUSAGE_CHILDREN) - ffStart) / kPlaySeconds : NAN;
     const double ours = media > 0 ? cpu / media : NAN;
     std::printf("%-28s %5.2f s media in %5.2f s  %4d of %4d pictures shown  CPU %5.2f s/s  RSS %4.0f MB, peak %4.0f MB%s"
