@@ -98,7 +98,7 @@ void Player::startPipeline()
         };
         auto failed = [](const QString &message) { zaf::log::error(lcPlayback(), message); };
         m_videoDecoder = std::make_unique<playback::VideoDecoder>(path, video.first().streamIndex, m_frames.get(),
-            std::move(framesReady), std::move(failed));
+            m_decodedPictureBudget, std::move(framesReady), std::move(failed));
         m_videoDecoder->seek(m_currentNs, ++m_generation);
     }
     if (!m_customTimeSource)
@@ -269,6 +269,19 @@ void Player::seekToTime(const MediaTime &time)
     if (wasRunning)
         startRunning();
     callPeriodicObservers(true);
+}
+
+void Player::setDecodedPictureBudget(std::int64_t bytes)
+{
+    ZAF_ASSERT_MAIN_THREAD();
+    m_decodedPictureBudget = std::max<std::int64_t>(bytes, 0);
+    if (m_videoDecoder)
+        m_videoDecoder->setWindowBudget(m_decodedPictureBudget);
+}
+
+playback::VideoDecoderStatistics Player::decodingStatistics() const
+{
+    return m_videoDecoder ? m_videoDecoder->statistics() : playback::VideoDecoderStatistics{};
 }
 
 MediaTime Player::currentTime() const

@@ -23,6 +23,7 @@
 
 #include "platform/media/media_time.h"
 #include "platform/media/playback/playback_clock.h"
+#include "platform/media/playback/playback_statistics.h"
 #include "platform/media/player_item.h"
 
 #include <QImage>
@@ -63,8 +64,12 @@ public:
     float rate() const { return m_rate; }
 
     // Exact seek: currentTime() becomes `time` (limited to 0 ... duration) at once, and the picture
-    // at that time becomes currentVideoFrame() as soon as it is decoded. Seeks issued while one is
-    // being decoded replace it: only the latest is carried out.
+    // at that time becomes currentVideoFrame() as soon as it is decoded; the seek never waits for
+    // it. Seeks issued while one is being decoded replace it: only the latest is carried out. While
+    // seeks come in a quick series (a drag), the best picture at hand for the latest time is shown on
+    // the way (a decoded picture of the same group of pictures, the nearest before it), and the
+    // exact picture of the last seek always ends up on screen. Pictures decoded near the playhead
+    // are kept (see setDecodedPictureBudget), so steps back and forth there cost no decoding.
     void seekToTime(const MediaTime &time);
     // Timescale 1000000000 (nanoseconds).
     MediaTime currentTime() const;
@@ -84,6 +89,13 @@ public:
 
     // The current picture, as coded (the track's transform is not applied); null before the first.
     QImage currentVideoFrame() const { return m_frame; }
+
+    // The memory the decoded pictures kept around the playhead may take, in bytes; the default is
+    // kDefaultDecodedPictureBudget. Takes effect with the next decoded picture.
+    void setDecodedPictureBudget(std::int64_t bytes);
+    static constexpr std::int64_t kDefaultDecodedPictureBudget = 160 * 1024 * 1024;
+    // What the video decoder has done so far; zeros before the item is ready.
+    playback::VideoDecoderStatistics decodingStatistics() const;
 
     // Replaces the time source (the default is chosen when the item becomes ready). While a source
     // other than the default one is installed, playback runs silently on it. Null restores the
@@ -133,6 +145,7 @@ private:
     bool m_inStep = false;            // inside advanceTo(): blocks may pause or seek
     std::uint64_t m_interruptions = 0; // counts pauses and seeks, to notice them inside a block
     std::uint64_t m_generation = 0;    // the latest video seek request
+    std::int64_t m_decodedPictureBudget = kDefaultDecodedPictureBudget;
 
     PlaybackClock m_clock;
     std::shared_ptr<TimeSource> m_timeSource;

@@ -28,11 +28,14 @@ std::optional<VideoFrame> FrameQueue::takeDue(std::uint64_t generation, std::int
         std::lock_guard lock(m_mutex);
         while (!m_frames.empty()) {
             VideoFrame &front = m_frames.front();
+            const bool answer = front.seekResult || front.preview;
             if (front.generation != generation) {
+                if (answer && front.generation < generation)
+                    due = std::move(front);
                 m_frames.pop_front();
                 continue;
             }
-            if (!front.seekResult && front.ptsNs > ptsNs)
+            if (!answer && front.ptsNs > ptsNs)
                 break;
             due = std::move(front);
             m_frames.pop_front();

@@ -19,6 +19,7 @@ struct VideoFrame {
     std::int64_t ptsNs = 0;       // media time of the picture, in nanoseconds
     std::uint64_t generation = 0; // the seek request the picture answers
     bool seekResult = false;      // the picture at the target of that seek
+    bool preview = false;         // a stand-in for it while it is being decoded (a drag)
 };
 
 class FrameQueue {
@@ -29,8 +30,10 @@ public:
     // true while waiting (it is re-checked whenever wake() is called, and at least every 50 ms).
     bool push(VideoFrame frame, const std::function<bool()> &giveUp);
 
-    // Consumer: drops frames of other generations; of the frames of `generation` that are due at
-    // `ptsNs` (their time has come, or they answer the seek), removes them all and returns the last.
+    // Consumer: of the frames of `generation` that are due at `ptsNs` (their time has come, or they
+    // answer the seek or stand in for its answer), and of the answers and stand-ins of earlier
+    // generations (a drag's earlier seeks, still the best picture there is), removes them all and
+    // returns the last. Other frames of other generations are dropped.
     std::optional<VideoFrame> takeDue(std::uint64_t generation, std::int64_t ptsNs);
 
     // Wakes a producer waiting in push() so that it re-checks its reason to give up.

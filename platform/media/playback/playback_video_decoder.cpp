@@ -5,47 +5,75 @@
 #include "platform/media/core/frame_converter.h"
 #include "platform/media/core/media_input.h"
 #include "platform/media/core/media_log.h"
-#include "platform/media/playback/playback_exact_seek.h"
+#include "platform/media/playback/playback_frame_window.h"
 
 #include <cmath>
+#include <limits>
 #include <utility>
 
 namespace zaf::media::playback {
 
 namespace {
 
+using Clock = std::chrono::steady_clock;
+
 // A stalled source (EAGAIN over and over) ends the stream after this many attempts in a row.
 constexpr int kMaxConsecutiveReadRetries = 1000;
 // A stream that keeps failing to decode is given up after this many errors in a row.
 constexpr int kMaxConsecutiveDecodeErrors = 200;
+// Requests closer together than this are a drag: stand-in pictures are shown on the way.
+constexpr auto kDragGap = std::chrono::milliseconds(150);
+// While a drag's exact picture is being decoded, the stand-in is refreshed at most this often
+// (about a display refresh of the eye, not of the screen: each costs a conversion).
+constexpr auto kStandInInterval = std::chrono::milliseconds(30);
+// Without an index, the stand-in may be this far before the target.
+constexpr std::int64_t kStandInReachNs = 1'000'000'000;
+// Seeks for one request beyond which the decoder gives up on it (each lands earlier than the last).
+constexpr int kMaxSeeksPerRequest = 12;
+// A seek that landed after its target tries again this much before the picture it landed on.
+constexpr std::int64_t kLateSeekMarginNs = 100'000'000;
+constexpr std::int64_t kNoTime = std::numeric_limits<std::int64_t>::min();
+
+std::int64_t pictureBytes(const AVFrame *picture)
+{
+    std::int64_t bytes = 0;
+    for (const AVBufferRef *buffer : picture->buf)
+        bytes += buffer ? std::int64_t(buffer->size) : 0;
+    return bytes;
+}
 
 } // namespace
 
-// One run of the decoder thread: the opened stream and its decoder, and where the request under way
-// stands. Every step runs on the decoder thread.
+// One run of the decoder thread: the opened stream and its decoder, the window of decoded pictures,
+// and where the request under way stands. Every step runs on the decoder thread.
 struct VideoDecoder::DecodeRun {
-    explicit DecodeRun(VideoDecoder &owner) : d(owner) {}
+    explicit DecodeRun(VideoDecoder &owner) : d(owner), window(owner.m_budget.load()) {}
 
     // Opens the input, its video stream and a decoder for it; says why not through `failed`.
     bool open();
-    // Takes a new request, if one came, and seeks to it; while there is nothing to decode, waits
-    // for one. False once the thread is to stop.
+    // Takes a new request, if one came, and begins it; while there is nothing to do, waits for one.
+    // False once the thread is to stop.
     bool takeRequest();
-    void seek(const Request &request);
-    // Reads the next packet into the decoder; at the end of the input, or when it fails or keeps
-    // stalling, starts draining the decoder. False when a stalled read is to be tried again first.
+    void begin(const Request &request);
+    // Hands on the next picture the request wants when the window holds it (or a stand-in while
+    // dragging). False when decoding has to come first.
+    bool handOnFromWindow();
+    // Seeks unless decoding on from where the decoder stands reaches the picture at `neededNs`
+    // soonest.
+    void positionFor(std::int64_t neededNs);
+    // Receives one picture into the window, or feeds the decoder one packet.
+    void decodeStep();
     bool readPacket();
-    // Receives the pictures the decoder has ready and hands them on, until it wants more input, the
-    // stream ends or the request is abandoned.
-    void receivePictures();
-    // One decoded picture: held back, dropped or handed on as the exact seek wants. False when it
-    // was abandoned for a newer request or a stop.
-    bool takePicture(AVFrame *picture);
+    void store(AVFrame *picture);
     void endOfStream();
     void decodeError(int rc);
-    // Converts a picture and queues it, waiting for room. False when abandoned while waiting.
-    bool handOn(const AVFrame *picture, std::int64_t ptsNs, bool seekResult);
+    // Converts the picture at `ptsNs` from the window and queues it, waiting for room. False when
+    // abandoned while waiting.
+    bool handOn(std::int64_t ptsNs, bool seekResult, bool preview);
+    void publishStatistics();
     std::int64_t ptsNsOf(const AVFrame *picture);
+    // The time of the keyframe at or before `timeNs` from the stream's index; kNoTime when unknown.
+    std::int64_t keyframeAtOrBefore(std::int64_t timeNs) const;
     bool abandoned() const { return d.m_thread.stopping() || d.m_thread.hasNewerRequest(); }
 
     VideoDecoder &d;
@@ -58,27 +86,52 @@ struct VideoDecoder::DecodeRun {
     double timeBase = 0;
     ff::AVPacketPtr packet;
     ff::AVFramePtr decoded;
-    ff::AVFramePtr held; // the last picture before the target of the seek under way
     FrameConverter converter;
     bool conversionFailed = false;
+    FrameWindow window;
 
-    // The request under way.
-    Request current{0, 0};
-    bool active = false;   // false: nothing to decode until the next request
+    // Where the decoder stands. `positioned`: its output runs on from `headNs` (the last picture it
+    // produced), or, with no picture yet since the seek, from the keyframe at `seekPointNs`.
+    bool positioned = false;
+    std::optional<std::int64_t> headNs;
+    std::optional<std::int64_t> beforeHeadNs; // the picture it produced before that one
+    std::int64_t seekPointNs = 0;
+    std::int64_t seekTargetNs = 0;
+    bool seekFromStart = false; // the last seek went to the stream's first keyframe
+    // Demuxers seek by decoding time: with reordered pictures a seek can land on a keyframe shown
+    // after the target. The next seek for the same picture then goes this much further back.
+    std::optional<std::int64_t> lateFor;
+    std::int64_t lateBackoffNs = 0;
+    std::int64_t streamStartNs = 0;
     bool draining = false; // the input is read to its end; the decoder gives up what it holds
-    ExactSeek exactSeek;
     int readRetries = 0;
     int decodeErrors = 0;
     std::int64_t lastPtsNs = 0; // the time given to a picture that carries none
+
+    // The request under way.
+    Request current{0, 0, {}};
+    Clock::time_point previousPostedAt{};
+    bool active = false;   // false: nothing to do until the next request
+    bool dragging = false; // the request came close after the one before it
+    bool answered = false; // its exact picture was handed on
+    int endsReached = 0;   // how often decoding hit the end of the stream for it
+    int seeksForRequest = 0;
+    std::optional<std::int64_t> delivered; // the last picture handed on for it, once answered
+
+    // The last picture handed on, whatever the request, and its conversion.
+    std::optional<std::int64_t> shownNs;
+    QImage shownImage;
+    Clock::time_point shownAt{};
 };
 
-VideoDecoder::VideoDecoder(QString path, int streamIndex, FrameQueue *queue, std::function<void()> framesReady,
-    std::function<void(const QString &)> failed)
+VideoDecoder::VideoDecoder(QString path, int streamIndex, FrameQueue *queue, std::int64_t windowBudgetBytes,
+    std::function<void()> framesReady, std::function<void(const QString &)> failed)
     : m_path(std::move(path))
     , m_streamIndex(streamIndex)
     , m_queue(queue)
     , m_framesReady(std::move(framesReady))
     , m_failed(std::move(failed))
+    , m_budget(windowBudgetBytes)
     , m_thread([this] { m_queue->wake(); })
 {
     m_thread.start([this] { run(); });
@@ -91,7 +144,12 @@ VideoDecoder::~VideoDecoder()
 
 void VideoDecoder::seek(std::int64_t targetNs, std::uint64_t generation)
 {
-    m_thread.post(Request{targetNs, generation});
+    m_thread.post(Request{targetNs, generation, Clock::now()});
+}
+
+VideoDecoderStatistics VideoDecoder::statistics() const
+{
+    return {m_decoded.load(), m_windowBytes.load(), m_windowPeakBytes.load(), m_budget.load(), m_windowPictures.load()};
 }
 
 void VideoDecoder::run()
@@ -100,8 +158,13 @@ void VideoDecoder::run()
     if (!run.open())
         return;
     while (run.takeRequest()) {
-        if (run.readPacket())
-            run.receivePictures();
+        if (!run.active || run.handOnFromWindow())
+            continue;
+        if (!run.active || run.abandoned())
+            continue;
+        run.positionFor(run.answered ? *run.delivered : run.current.targetNs);
+        if (run.active)
+            run.decodeStep();
     }
 }
 
@@ -131,10 +194,11 @@ bool VideoDecoder::DecodeRun::open()
     }
     startSeconds = containerStartSeconds(format.get());
     timeBase = av_q2d(stream->time_base);
+    if (stream->start_time != AV_NOPTS_VALUE)
+        streamStartNs = std::llround((double(stream->start_time) * timeBase - startSeconds) * 1e9);
     packet = ff::makePacket();
     decoded = ff::makeFrame();
-    held = ff::makeFrame();
-    if (!packet || !decoded || !held) {
+    if (!packet || !decoded) {
         d.m_failed(QStringLiteral("out of memory"));
         return false;
     }
@@ -147,15 +211,77 @@ bool VideoDecoder::DecodeRun::takeRequest()
     if (d.m_thread.stopping())
         return false;
     if (next)
-        seek(next->request);
+        begin(next->request);
     return true;
 }
 
-// Exact: the demuxer goes to the keyframe before the target, and exactSeek picks the pictures.
-void VideoDecoder::DecodeRun::seek(const Request &request)
+void VideoDecoder::DecodeRun::begin(const Request &request)
 {
+    dragging = previousPostedAt != Clock::time_point{} && request.postedAt - previousPostedAt < kDragGap;
+    previousPostedAt = request.postedAt;
     current = request;
-    const double targetSeconds = double(current.targetNs) / 1e9 + startSeconds;
+    active = true;
+    answered = false;
+    endsReached = 0;
+    seeksForRequest = 0;
+    delivered.reset();
+}
+
+bool VideoDecoder::DecodeRun::handOnFromWindow()
+{
+    if (answered) {
+        if (window.isLast(*delivered)) {
+            active = false; // the stream is played out
+            return true;
+        }
+        const std::optional<std::int64_t> next = window.successorOf(*delivered);
+        if (!next)
+            return false;
+        if (handOn(*next, false, false))
+            delivered = next;
+        return true;
+    }
+    if (const std::optional<std::int64_t> exact = window.exactAt(current.targetNs)) {
+        if (handOn(*exact, true, false)) {
+            answered = true;
+            delivered = exact;
+        }
+        return true;
+    }
+    if (!dragging || (shownNs && Clock::now() - shownAt < kStandInInterval))
+        return false;
+    const std::int64_t keyframe = keyframeAtOrBefore(current.targetNs);
+    const std::optional<std::int64_t> standIn = window.latestAt(current.targetNs,
+        keyframe != kNoTime ? keyframe : current.targetNs - kStandInReachNs);
+    if (!standIn || standIn == shownNs)
+        return false;
+    handOn(*standIn, false, true);
+    return true;
+}
+
+void VideoDecoder::DecodeRun::positionFor(std::int64_t neededNs)
+{
+    const std::int64_t from = headNs ? *headNs : seekPointNs;
+    const std::int64_t keyframe = keyframeAtOrBefore(neededNs);
+    // Decoding on reaches the picture when the decoder stands before it, and is the cheaper way
+    // unless a keyframe lies between the two.
+    if (positioned && from <= neededNs && (keyframe == kNoTime || keyframe <= from))
+        return;
+    if (++seeksForRequest > kMaxSeeksPerRequest) {
+        // A stream whose times the window cannot make sense of: show what there is and stop.
+        zaf::log::error(lcPlayback(), QStringLiteral("%1: no picture found for %2 s after %3 seeks")
+                                          .arg(d.m_path).arg(double(neededNs) / 1e9).arg(kMaxSeeksPerRequest));
+        if (!answered) {
+            if (const std::optional<std::int64_t> latest = window.latestAt(current.targetNs, kNoTime))
+                handOn(*latest, true, false);
+        }
+        active = false;
+        return;
+    }
+    const std::int64_t backoffNs = lateFor == neededNs ? lateBackoffNs : 0;
+    if (lateFor != neededNs)
+        lateFor.reset();
+    const double targetSeconds = double(neededNs - backoffNs) / 1e9 + startSeconds;
     const std::int64_t ts = std::llround(targetSeconds / timeBase);
     int rc = av_seek_frame(format.get(), d.m_streamIndex, ts, AVSEEK_FLAG_BACKWARD);
     if (rc < 0)
@@ -163,11 +289,30 @@ void VideoDecoder::DecodeRun::seek(const Request &request)
     if (rc < 0 && !d.m_thread.stopping())
         zaf::log::error(lcPlayback(), QStringLiteral("cannot seek in %1: %2").arg(d.m_path, ff::errorString(rc)));
     avcodec_flush_buffers(codec.get());
-    av_frame_unref(held.get());
-    exactSeek.begin(current.targetNs);
-    active = true;
+    positioned = true;
+    headNs.reset();
+    beforeHeadNs.reset();
+    seekPointNs = keyframe != kNoTime ? std::min(keyframe, neededNs) : neededNs;
+    seekTargetNs = neededNs;
+    seekFromStart = neededNs - backoffNs <= streamStartNs || rc < 0;
     draining = false;
     readRetries = 0;
+}
+
+void VideoDecoder::DecodeRun::decodeStep()
+{
+    const int rc = avcodec_receive_frame(codec.get(), decoded.get());
+    if (rc == 0) {
+        decodeErrors = 0;
+        store(decoded.get());
+        av_frame_unref(decoded.get());
+    } else if (rc == AVERROR(EAGAIN)) {
+        readPacket();
+    } else if (rc == AVERROR_EOF) {
+        endOfStream();
+    } else {
+        decodeError(rc);
+    }
 }
 
 bool VideoDecoder::DecodeRun::readPacket()
@@ -194,51 +339,48 @@ bool VideoDecoder::DecodeRun::readPacket()
     return true;
 }
 
-void VideoDecoder::DecodeRun::receivePictures()
+void VideoDecoder::DecodeRun::store(AVFrame *picture)
 {
-    for (;;) {
-        const int rc = avcodec_receive_frame(codec.get(), decoded.get());
-        if (rc == AVERROR(EAGAIN))
-            return;
-        if (rc == AVERROR_EOF) {
-            endOfStream();
-            return;
-        }
-        if (rc < 0) {
-            decodeError(rc);
-            return;
-        }
-        decodeErrors = 0;
-        const bool kept = takePicture(decoded.get());
-        av_frame_unref(decoded.get());
-        if (!kept || abandoned())
-            return;
+    AVFrame *kept = av_frame_alloc();
+    if (!kept)
+        return;
+    av_frame_move_ref(kept, picture);
+    const std::int64_t ptsNs = ptsNsOf(kept);
+    const std::int64_t bytes = pictureBytes(kept);
+    // The first picture after a seek that starts after the target: when the seek went to the
+    // stream's start, nothing comes before it, so it is what is shown at the target; otherwise the
+    // seek landed late, and the next one goes further back.
+    const bool late = !headNs && ptsNs > seekTargetNs;
+    const bool first = late && seekFromStart;
+    if (late && !first) {
+        lateBackoffNs = lateFor == seekTargetNs ? 2 * lateBackoffNs : ptsNs - seekTargetNs + kLateSeekMarginNs;
+        lateFor = seekTargetNs;
     }
+    window.insert(ptsNs, FrameWindow::Picture(kept, [](const AVFrame *f) {
+        AVFrame *owned = const_cast<AVFrame *>(f);
+        av_frame_free(&owned);
+    }), bytes, headNs, first);
+    beforeHeadNs = std::exchange(headNs, ptsNs);
+    d.m_decoded.fetch_add(1);
+    window.setBudget(d.m_budget.load());
+    window.trim(answered ? *delivered : current.targetNs, {headNs, beforeHeadNs, shownNs});
+    publishStatistics();
 }
 
-bool VideoDecoder::DecodeRun::takePicture(AVFrame *picture)
-{
-    const std::int64_t pts = ptsNsOf(picture);
-    const ExactSeek::Choice choice = exactSeek.next(pts);
-    if (choice.hold) {
-        av_frame_unref(held.get());
-        av_frame_move_ref(held.get(), picture);
-        return true;
-    }
-    if (choice.handOnHeld) {
-        if (!handOn(held.get(), ptsNsOf(held.get()), true))
-            return false;
-        av_frame_unref(held.get());
-    }
-    return handOn(picture, pts, choice.seekResult);
-}
-
-// A seek past the last picture is answered by the last picture.
+// The decoder gave up everything it held: the last picture is shown at every later time. A request
+// that the window still cannot answer is answered with the last picture at or before its target.
 void VideoDecoder::DecodeRun::endOfStream()
 {
-    if (exactSeek.end()) {
-        handOn(held.get(), ptsNsOf(held.get()), true);
-        av_frame_unref(held.get());
+    if (headNs)
+        window.markLast(*headNs);
+    positioned = false;
+    headNs.reset();
+    if (++endsReached < 2 || d.m_thread.stopping())
+        return;
+    if (!answered) {
+        if (const std::optional<std::int64_t> last = window.latestAt(current.targetNs, kNoTime)) {
+            handOn(*last, true, false);
+        }
     }
     active = false;
 }
@@ -248,27 +390,44 @@ void VideoDecoder::DecodeRun::decodeError(int rc)
     if (++decodeErrors < kMaxConsecutiveDecodeErrors)
         return;
     d.m_failed(QStringLiteral("cannot decode the video of %1: %2").arg(d.m_path, ff::errorString(rc)));
-    exactSeek.end();
     active = false;
-    draining = true;
+    positioned = false;
+    headNs.reset();
+    decodeErrors = 0;
 }
 
-bool VideoDecoder::DecodeRun::handOn(const AVFrame *picture, std::int64_t ptsNs, bool seekResult)
+bool VideoDecoder::DecodeRun::handOn(std::int64_t ptsNs, bool seekResult, bool preview)
 {
-    QImage image = converter.toImage(picture, QSize(picture->width, picture->height), SWS_BILINEAR);
-    if (image.isNull()) {
-        // Skipped; said once, not for every frame of a stream that cannot be shown.
-        if (!std::exchange(conversionFailed, true))
-            zaf::log::error(lcPlayback(), QStringLiteral("cannot convert a %1x%2 picture of %3 for display")
-                                              .arg(picture->width).arg(picture->height).arg(d.m_path));
-        return true;
+    if (ptsNs != shownNs || shownImage.isNull()) {
+        const FrameWindow::Picture picture = window.picture(ptsNs);
+        if (!picture)
+            return true;
+        QImage image = converter.toImage(picture.get(), QSize(picture->width, picture->height), SWS_BILINEAR);
+        if (image.isNull()) {
+            // Skipped; said once, not for every frame of a stream that cannot be shown.
+            if (!std::exchange(conversionFailed, true))
+                zaf::log::error(lcPlayback(), QStringLiteral("cannot convert a %1x%2 picture of %3 for display")
+                                                  .arg(picture->width).arg(picture->height).arg(d.m_path));
+            return true;
+        }
+        shownImage = std::move(image);
+        shownNs = ptsNs;
     }
-    VideoFrame out{std::move(image), ptsNs, current.generation, seekResult};
+    shownAt = Clock::now();
+    VideoFrame out{shownImage, ptsNs, current.generation, seekResult, preview};
     if (!d.m_queue->push(std::move(out), [this] { return abandoned(); }))
         return false;
     if (d.m_framesReady)
         d.m_framesReady();
     return true;
+}
+
+void VideoDecoder::DecodeRun::publishStatistics()
+{
+    d.m_windowBytes.store(window.bytes());
+    d.m_windowPictures.store(std::int64_t(window.size()));
+    if (window.bytes() > d.m_windowPeakBytes.load())
+        d.m_windowPeakBytes.store(window.bytes());
 }
 
 std::int64_t VideoDecoder::DecodeRun::ptsNsOf(const AVFrame *picture)
@@ -280,6 +439,15 @@ std::int64_t VideoDecoder::DecodeRun::ptsNsOf(const AVFrame *picture)
         return lastPtsNs;
     lastPtsNs = std::llround((double(ts) * timeBase - startSeconds) * 1e9);
     return lastPtsNs;
+}
+
+std::int64_t VideoDecoder::DecodeRun::keyframeAtOrBefore(std::int64_t timeNs) const
+{
+    const std::int64_t ts = std::llround((double(timeNs) / 1e9 + startSeconds) / timeBase);
+    const AVIndexEntry *entry = avformat_index_get_entry_from_timestamp(stream, ts, AVSEEK_FLAG_BACKWARD);
+    if (!entry)
+        return kNoTime;
+    return std::llround((double(entry->timestamp) * timeBase - startSeconds) * 1e9);
 }
 
 } // namespace zaf::media::playback

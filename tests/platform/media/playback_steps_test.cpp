@@ -1,12 +1,13 @@
-// The decoders' steps on their own: exact seeks, the audio mix and lead-in, the request hand-over.
+// The decoders' steps on their own: the decoded-frame window, the audio mix and lead-in, the request hand-over.
 #include "platform/media/playback/playback_audio_mix.h"
 #include "platform/media/playback/playback_decoder_thread.h"
-#include "platform/media/playback/playback_exact_seek.h"
+#include "platform/media/playback/playback_frame_window.h"
 #include "tests/support/named_cases.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <functional>
 #include <optional>
 #include <vector>
@@ -16,52 +17,103 @@ namespace {
 
 ZAF_PRINT_CASES_AS_NAMES
 
-struct HandedOn {
-    std::int64_t ptsNs;
-    bool seekResult;
-    bool operator==(const HandedOn &) const = default;
+// A run of decoding into a window: the pictures of one run (no seek within it), `bytes` each.
+struct DecodedRun {
+    std::vector<std::int64_t> pts; // in the order the decoder produced them
+    bool first = false;            // the run starts at the stream's first picture, after an earlier target
+    bool reachesTheEnd = false;    // its last picture is the stream's last
 };
 
-struct SeekCase {
-    const char *name;
-    std::int64_t targetNs;
-    std::vector<std::int64_t> decoded; // presentation times, in decoding order
-    std::vector<HandedOn> handedOn;
-};
-
-class ExactSeekPictures : public ::testing::TestWithParam<SeekCase> {};
-
-// Plays the decoder's part: holds, hands on and, at the end of the stream, hands on the held one.
-TEST_P(ExactSeekPictures, AnswerTheSeekWithThePictureShownAtTheTarget)
+void decodeInto(FrameWindow &window, const DecodedRun &run, std::int64_t bytes = 1)
 {
-    const SeekCase &c = GetParam();
-    ExactSeek seek;
-    seek.begin(c.targetNs);
-    std::optional<std::int64_t> held;
-    std::vector<HandedOn> handedOn;
-    for (std::int64_t pts : c.decoded) {
-        const ExactSeek::Choice choice = seek.next(pts);
-        if (choice.hold) {
-            held = pts;
-            continue;
-        }
-        if (choice.handOnHeld)
-            handedOn.push_back({held.value(), true});
-        handedOn.push_back({pts, choice.seekResult});
+    std::optional<std::int64_t> previous;
+    for (std::int64_t pts : run.pts) {
+        window.insert(pts, nullptr, bytes, previous, run.first && !previous);
+        previous = pts;
     }
-    if (seek.end())
-        handedOn.push_back({held.value(), true});
-    EXPECT_EQ(handedOn, c.handedOn);
-    EXPECT_FALSE(seek.seeking());
+    if (run.reachesTheEnd && previous)
+        window.markLast(*previous);
+}
+
+struct WindowCase {
+    const char *name;
+    std::vector<DecodedRun> runs;
+    std::int64_t timeNs;
+    std::optional<std::int64_t> exact;
+};
+
+class FrameWindowExact : public ::testing::TestWithParam<WindowCase> {};
+
+// The window knows the picture shown at a time only when it holds the latest picture at or before
+// it and the one after, from the same run.
+TEST_P(FrameWindowExact, AnswersWithThePictureShownAtTheTimeOnlyWhenItKnows)
+{
+    const WindowCase &c = GetParam();
+    FrameWindow window(1 << 20);
+    for (const DecodedRun &run : c.runs)
+        decodeInto(window, run);
+    EXPECT_EQ(window.exactAt(c.timeNs), c.exact);
 }
 
 INSTANTIATE_TEST_SUITE_P(
-    Cases, ExactSeekPictures,
-    ::testing::Values(SeekCase{"PictureAtTheTarget", 80, {0, 40, 80, 120}, {{80, true}, {120, false}}},
-                      SeekCase{"BetweenPicturesTheEarlierOne", 100, {0, 40, 80, 120, 160}, {{80, true}, {120, false}, {160, false}}},
-                      SeekCase{"BeforeTheFirstPicture", 0, {40, 80}, {{40, true}, {80, false}}},
-                      SeekCase{"PastTheLastPictureTheLastOne", 500, {0, 40, 80}, {{80, true}}},
-                      SeekCase{"NoPictures", 100, {}, {}}),
+    Cases, FrameWindowExact,
+    ::testing::Values(WindowCase{"PictureAtTheTime", {{{0, 40, 80, 120}}}, 80, 80},
+                      WindowCase{"BetweenPicturesTheEarlierOne", {{{0, 40, 80, 120}}}, 100, 80},
+                      WindowCase{"LastPictureOfARunIsNotKnownYet", {{{0, 40, 80}}}, 100, std::nullopt},
+                      WindowCase{"PastTheStreamsLastPicture", {{{0, 40, 80}, false, true}}, 500, 80},
+                      WindowCase{"BeforeTheStreamsFirstPicture", {{{40, 80}, true}}, 0, 40},
+                      WindowCase{"BeforeARunThatIsNotTheFirst", {{{40, 80}}}, 0, std::nullopt},
+                      // Two runs with a gap: 120 and 160 were never decoded between them.
+                      WindowCase{"GapBetweenRuns", {{{0, 40, 80}}, {{200, 240}}}, 150, std::nullopt},
+                      WindowCase{"SecondRunAnswersItsOwnTimes", {{{0, 40, 80}}, {{200, 240}}}, 210, 200},
+                      // A run that reached a picture again continues the links of the first.
+                      WindowCase{"RunsThatMeet", {{{0, 40, 80}}, {{80, 120, 160}}}, 90, 80},
+                      WindowCase{"TimesGoingBackwardLinkNothing", {{{0, 80, 40}}}, 50, std::nullopt},
+                      WindowCase{"EmptyWindow", {}, 0, std::nullopt}),
+    test::caseName);
+
+struct TrimCase {
+    const char *name;
+    std::int64_t budget;
+    std::int64_t focusNs;
+    FrameWindow::Kept keep;
+    std::vector<std::int64_t> left;
+};
+
+class FrameWindowTrim : public ::testing::TestWithParam<TrimCase> {};
+
+// Over its budget the window drops the pictures farthest from the focus, never the kept ones, and
+// forgets what it dropped: a successor that is gone is no successor.
+TEST_P(FrameWindowTrim, DropsTheFarthestPicturesFirst)
+{
+    const TrimCase &c = GetParam();
+    FrameWindow window(1 << 20);
+    decodeInto(window, DecodedRun{{0, 40, 80, 120, 160, 200}}, 10);
+    window.setBudget(c.budget);
+    window.trim(c.focusNs, c.keep);
+    std::vector<std::int64_t> left;
+    for (std::int64_t pts : {0, 40, 80, 120, 160, 200}) {
+        if (window.latestAt(pts, pts))
+            left.push_back(pts);
+    }
+    EXPECT_EQ(left, c.left);
+    EXPECT_EQ(window.bytes(), std::int64_t(c.left.size()) * 10);
+    EXPECT_EQ(window.size(), c.left.size());
+    for (std::int64_t pts : left) {
+        if (const auto next = window.successorOf(pts)) {
+            EXPECT_NE(std::find(left.begin(), left.end(), *next), left.end());
+        }
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Cases, FrameWindowTrim,
+    ::testing::Values(TrimCase{"WithinTheBudget", 60, 0, {}, {0, 40, 80, 120, 160, 200}},
+                      TrimCase{"FocusInTheMiddle", 30, 100, {}, {80, 120, 160}},
+                      TrimCase{"FocusAtTheStart", 20, 0, {}, {0, 40}},
+                      TrimCase{"FocusPastTheEnd", 20, 900, {}, {160, 200}},
+                      TrimCase{"KeptPicturesStayBeyondTheBudget", 10, 200, {{0, 40, std::nullopt}}, {0, 40}},
+                      TrimCase{"NothingButKeptPictures", 0, 100, {{0, 200, 120}}, {0, 120, 200}}),
     test::caseName);
 
 struct MixCase {

@@ -395,18 +395,105 @@ INSTANTIATE_TEST_SUITE_P(Targets, PlayerSeekTest,
                                            SeekCase{"BeforeTheStart", -3, 0, 0}),
                          zaf::test::caseName);
 
-// Of rapid seeks only the latest target is ever shown, even after late pictures could arrive.
-TEST_F(PlayerTest, RapidSeeksShowOnlyTheLatestTarget)
+MediaTime frameTime(int frame)
+{
+    return MediaTime::make(2 * std::int64_t(frame) + 1, 60); // the middle of the frame, at 30 fps
+}
+
+// A drag: each seek follows the picture the one before it brought. Every picture shown on the way
+// stands in for its target from the same group of pictures, never from after it, and the exact
+// picture of the last seek ends up on screen.
+TEST_F(PlayerTest, DragShowsStandInsFromTheTargetsGroupAndEndsOnTheExactFrame)
 {
     auto player = readyPlayer(kMovie);
     ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == 0; }));
-    QList<int> shown;
-    QObject::connect(player.get(), &Player::videoFrameChanged, [&] { shown.append(shownNumber(*player)); });
-    for (double target : {0.5, 1.2, 2.9, 1.7, 3.3})
-        player->seekToTime(seconds(target));
-    ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == 99; }));
-    settle(300);
-    EXPECT_EQ(shown, QList<int>{99});
+    int target = 0;
+    QList<QPair<int, int>> wrong; // (target, shown)
+    QObject::connect(player.get(), &Player::videoFrameChanged, [&] {
+        const int shown = shownNumber(*player);
+        if (shown > target || shown < target / 30 * 30)
+            wrong.append({target, shown});
+    });
+    for (target = 40; target <= 100; target += 3) {
+        int pictures = 0;
+        const auto counting = QObject::connect(player.get(), &Player::videoFrameChanged, [&] { ++pictures; });
+        player->seekToTime(frameTime(target));
+        EXPECT_TRUE(waitUntil([&] { return pictures > 0; })) << "no picture for the seek to frame " << target;
+        QObject::disconnect(counting);
+    }
+    target = 100;
+    EXPECT_TRUE(waitUntil([&] { return shownNumber(*player) == 100; })) << shownNumber(*player);
+    EXPECT_TRUE(wrong.isEmpty()) << wrong.size() << " stand-ins from elsewhere, the first for frame "
+                                 << wrong.value(0).first << ": " << wrong.value(0).second;
+}
+
+// The decoder waits for the main thread to take its pictures; seeks must not wait for the decoder,
+// or this would never end. The last one's picture comes once the main thread takes pictures again.
+TEST_F(PlayerTest, SeeksNeverWaitForTheDecoder)
+{
+    auto player = readyPlayer(kMovie);
+    ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == 0; }));
+    settle(100); // the decoder fills the queue with the pictures after the first and waits for room
+    for (int frame = 10; frame < 110; ++frame) {
+        player->seekToTime(frameTime(frame));
+        EXPECT_NEAR(player->currentTime().seconds(), frameTime(frame).seconds(), 1e-9);
+    }
+    EXPECT_TRUE(waitUntil([&] { return shownNumber(*player) == 109; })) << shownNumber(*player);
+}
+
+struct StepCase {
+    const char *name;
+    int from, to;        // steps back one frame at a time from `from` to `to`
+    int firstStepDecodes; // at most, for the first step back
+};
+
+class PlayerStepBackTest : public PlayerTest, public ::testing::WithParamInterface<StepCase> {};
+
+// Stepping back one frame at a time shows each exact frame. Within the pictures kept around the
+// playhead it decodes nothing; across a group boundary the first step decodes the group before once.
+TEST_P(PlayerStepBackTest, DecodesAtMostTheGroupBeforeOnce)
+{
+    const StepCase &c = GetParam();
+    auto player = readyPlayer(kMovie);
+    player->seekToTime(frameTime(c.from));
+    ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == c.from; })) << shownNumber(*player);
+    std::uint64_t decoded = player->decodingStatistics().picturesDecoded;
+    for (int frame = c.from - 1; frame >= c.to; --frame) {
+        player->seekToTime(frameTime(frame));
+        ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == frame; })) << frame << ": " << shownNumber(*player);
+        const std::uint64_t now = player->decodingStatistics().picturesDecoded;
+        EXPECT_LE(now - decoded, frame == c.from - 1 ? std::uint64_t(c.firstStepDecodes) : 0u) << "stepping back to " << frame;
+        decoded = now;
+    }
+}
+
+// kMovie has a keyframe every 30 frames. A group ahead of the decoder may be decoded in part while
+// it fills its queue, and frame-threaded decoding reads a picture or two ahead.
+INSTANTIATE_TEST_SUITE_P(Steps, PlayerStepBackTest,
+                         ::testing::Values(StepCase{"WithinTheGroup", 50, 38, 0},
+                                           StepCase{"AcrossAGroupBoundary", 60, 45, 30 + 4}),
+                         zaf::test::caseName);
+
+// With a small budget the kept pictures stay within it, while playing and seeking back and forth,
+// and every exact frame still comes.
+TEST_F(PlayerTest, KeptPicturesStayWithinTheBudget)
+{
+    auto player = readyPlayer(kMovie);
+    constexpr std::int64_t kBudget = 1 << 20; // about eight 320 x 240 pictures
+    player->setDecodedPictureBudget(kBudget);
+    player->play();
+    for (int i = 0; i < 60; ++i)
+        m_clock->advance(1.0 / 30);
+    ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == 60; })) << shownNumber(*player);
+    player->pause();
+    for (int frame : {20, 59, 58, 31, 30, 29, 90, 12}) {
+        player->seekToTime(frameTime(frame));
+        ASSERT_TRUE(waitUntil([&] { return shownNumber(*player) == frame; })) << frame << ": " << shownNumber(*player);
+    }
+    const playback::VideoDecoderStatistics statistics = player->decodingStatistics();
+    EXPECT_EQ(statistics.windowBudgetBytes, kBudget);
+    EXPECT_GT(statistics.windowPeakBytes, kBudget / 2);
+    EXPECT_LE(statistics.windowPeakBytes, kBudget);
 }
 
 // While playing, the picture is the one due at the clock's time once the decoder catches up, and
