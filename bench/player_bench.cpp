@@ -16,10 +16,11 @@
 // - first picture: from creating the asset, PlayerItem and Player to the first picture, p50;
 // - random seeks, one at a time: from seekToTime() to the first picture shown within one frame of
 //   the target, against `ffmpeg -ss T -i MOVIE -frames:v 1 -f null -` for the same times;
-// - a drag: a seek every 16 ms across 2 s of movie time during 3 s: the pictures shown during it,
-//   the time from each seek to the next picture shown, and from the last seek to its exact frame;
+// - drags: a seek every 16 ms across 2 s of movie time during 3 s, forward and backward at six
+//   places: the pictures shown during them, the time from each seek to the next picture shown, and
+//   from each drag's last seek to its exact frame;
 // - single backward steps from a shown frame to the one before it;
-// - playback for 10 s of 1080p60 and 2160p30: CPU time (user + sys) per media second and the peak
+// - playback for 10 s of 1080p30, 1080p60 and 2160p30: CPU time (user + sys) per media second and the peak
 //   resident memory, against ffmpeg decoding the same 10 s as fast as it can.
 #include "bench/bench_recordings.h"
 #include "platform/log.h"
@@ -58,8 +59,9 @@ using zaf::bench::runFfmpeg;
 namespace {
 
 constexpr int kPictureTimeoutMs = 8000;
-constexpr double kDragStart = 21.0;   // movie seconds
-constexpr double kDragSpan = 2.0;     // movie seconds covered by the drag
+// Drags start at these movie seconds, forward and backward in turn.
+constexpr double kDragStarts[] = {21.0, 9.0, 33.5, 47.0, 14.2, 52.5};
+constexpr double kDragSpan = 2.0;     // movie seconds covered by each drag
 constexpr int kDragWallMs = 3000;
 constexpr int kDragIntervalMs = 16;
 constexpr int kPlaySeconds = 10;
@@ -257,7 +259,7 @@ struct Drag {
     double lastToExact = NAN;        // ms; NaN on timeout
 };
 
-Drag drag(OpenPlayer &p, const Movie &movie)
+Drag drag(OpenPlayer &p, const Movie &movie, double startSeconds, int direction)
 {
     Drag d;
     std::vector<qint64> seekTimes;
@@ -270,7 +272,7 @@ Drag drag(OpenPlayer &p, const Movie &movie)
     auto tick = [&] {
         const qint64 now = g_clock.nsecsElapsed();
         const double progress = std::min(1.0, double(now - start) / (kDragWallMs * 1e6));
-        lastFrame = int((kDragStart + kDragSpan * progress) * movie.fps);
+        lastFrame = int((startSeconds + direction * kDragSpan * progress) * movie.fps);
         seekTimes.push_back(now);
         p.player->seekToTime(frameTime(lastFrame, movie.fps));
         if (progress >= 1.0)
@@ -361,15 +363,37 @@ void seekBench(const Movie &movie, int seekCount)
     }
     printSeekRow("back step", back);
 
-    const Drag d = drag(p, movie);
-    const std::vector<double> &next = d.nextPicture;
-    std::printf("  %-14s %d seeks in %.0f ms over %.0f s of movie: %d picture%s shown during the drag\n"
+    Drag all;
+    std::vector<double> toExact;
+    int timeouts = 0, direction = 1;
+    for (double start : kDragStarts) {
+        const Drag d = drag(p, movie, start, direction);
+        direction = -direction;
+        all.seeks += d.seeks;
+        all.pictures += d.pictures;
+        all.answered += d.answered;
+        all.wallMs += d.wallMs;
+        all.nextPicture.insert(all.nextPicture.end(), d.nextPicture.begin(), d.nextPicture.end());
+        if (std::isnan(d.lastToExact))
+            ++timeouts;
+        else
+            toExact.push_back(d.lastToExact);
+    }
+    const int drags = int(std::size(kDragStarts));
+    const std::vector<double> &next = all.nextPicture;
+    std::printf("  %-14s %d drags (forward and backward in turn), each a seek every %d ms over %.0f s of movie for %d ms: "
+                "%d seeks, %d pictures shown during them\n"
                 "  %-14s seek -> next picture shown during the drag (%d of %d seeks had one): p50 %s  p90 %s  max %s ms\n"
-                "  %-14s last seek -> its exact frame %s ms\n",
-                "drag", d.seeks, d.wallMs, kDragSpan, d.pictures, d.pictures == 1 ? "" : "s", "", d.answered, d.seeks - 1,
+                "  %-14s last seek -> its exact frame: p50 %s  p90 %s  max %s ms%s\n",
+                "drag", drags, kDragIntervalMs, kDragSpan, kDragWallMs, all.seeks, all.pictures, "", all.answered, all.seeks - drags,
                 qPrintable(fmt(percentile(next, 0.5), "none")), qPrintable(fmt(percentile(next, 0.9), "none")),
-                qPrintable(fmt(percentile(next, 1.0), "none")), "",
-                qPrintable(fmt(d.lastToExact, "timeout")));
+                qPrintable(fmt(percentile(next, 1.0), "none")), "", qPrintable(fmt(percentile(toExact, 0.5), "timeout")),
+                qPrintable(fmt(percentile(toExact, 0.9), "timeout")), qPrintable(fmt(percentile(toExact, 1.0), "timeout")),
+                timeouts ? qPrintable(QStringLiteral("  (%1 timeout)").arg(timeouts)) : "");
+    const playback::VideoDecoderStatistics stats = p.player->decodingStatistics();
+    std::printf("  %-14s decoded pictures kept: %.0f MB now, at most %.0f MB (budget %.0f MB); %llu pictures decoded in all\n", "",
+                stats.windowBytes / 1048576.0, stats.windowPeakBytes / 1048576.0, stats.windowBudgetBytes / 1048576.0,
+                static_cast<unsigned long long>(stats.picturesDecoded));
     std::fflush(stdout);
 }
 
@@ -395,6 +419,7 @@ void playbackBench(const Movie &movie, bool audioDevice)
     const double media = p.player->currentTime().seconds() - mediaStart;
     const double peak = statusMB("VmHWM:");
     const int shown = int(p.shown->pictures.size() - from);
+    const double windowPeak = p.player->decodingStatistics().windowPeakBytes / 1048576.0;
 
     const QStringList args = QStringList{QStringLiteral("-i"), movie.path, QStringLiteral("-t"), QString::number(kPlaySeconds)}
                              + QStringLiteral("%1-f null -").arg(QLatin1String(audioDevice ? "" : "-an ")).split(QLatin1Char(' '));
@@ -403,9 +428,9 @@ void playbackBench(const Movie &movie, bool audioDevice)
     const double ffPerSecond = ffOk ? (cpuSeconds(RUSAGE_CHILDREN) - ffStart) / kPlaySeconds : NAN;
     const double ours = media > 0 ? cpu / media : NAN;
     std::printf("%-28s %5.2f s media in %5.2f s  %4d of %4d pictures shown  CPU %5.2f s/s  RSS %4.0f MB, peak %4.0f MB%s"
-                "   ffmpeg CPU %5.2f s/s   ratio %5.2fx\n",
+                " (decoded pictures kept: at most %.0f MB)   ffmpeg CPU %5.2f s/s   ratio %5.2fx\n",
                 qPrintable(movie.label), media, wall, shown, int(std::lround(media * movie.fps)), ours, before, peak,
-                peakReset ? "" : " (process peak)", ffPerSecond, ours / ffPerSecond);
+                peakReset ? "" : " (process peak)", windowPeak, ffPerSecond, ours / ffPerSecond);
     std::fflush(stdout);
 }
 
@@ -440,6 +465,7 @@ int main(int argc, char **argv)
         {QStringLiteral("1080p30 60 s, 2 s groups"), recording(work, 60, 1920, 1080, 30, 2, &plains), 30},
         {QStringLiteral("1080p30 60 s, 8 s groups"), recording(work, 60, 1920, 1080, 30, 8, &plains), 30}};
     const std::vector<Movie> playMovies{
+        {QStringLiteral("1080p30 60 s, 2 s groups"), seekMovies[0].path, 30},
         {QStringLiteral("1080p60 12 s, 2 s groups"), recording(work, 12, 1920, 1080, 60, 2, &plains), 60},
         {QStringLiteral("2160p30 12 s, 2 s groups"), recording(work, 12, 3840, 2160, 30, 2, &plains), 30}};
     for (const QString &plain : plains)
@@ -448,6 +474,8 @@ int main(int argc, char **argv)
     std::printf("\n== first picture: creating the item and player -> first picture shown, %d run(s)\n", runs);
     for (const std::vector<Movie> *set : {&seekMovies, &playMovies}) {
         for (const Movie &movie : *set) {
+            if (set == &playMovies && &movie == &playMovies.front())
+                continue; // the first seek movie again
             int timeouts = 0;
             const std::vector<double> t = firstPicture(movie, runs, &timeouts);
             std::printf("%-28s p50 %7s ms  max %7s ms%s\n", qPrintable(movie.label), qPrintable(fmt(percentile(t, 0.5), "timeout")),
