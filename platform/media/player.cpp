@@ -131,6 +131,7 @@ void Player::chooseDefaultTimeSource()
                         self->audioFailed(message);
                 });
             };
+            m_audioOutput->setFailureHandler(failed);
             m_audioDecoder = std::make_unique<playback::AudioDecoder>(asset->url().toLocalFile(), streams,
                 m_audioOutput->format(), m_audioOutput->ring(), std::move(failed));
             m_audioOutput->setReadyCheck([this] { return m_audioDecoder && m_audioDecoder->servingRequest() == m_audioRequest; });
