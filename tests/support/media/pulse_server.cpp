@@ -184,7 +184,7 @@ PulseServer::PulseServer()
         QStringLiteral("--use-pid-file=no"), QStringLiteral("--system=no"), QStringLiteral("--realtime=no"),
         QStringLiteral("--high-priority=no"), QStringLiteral("--disallow-module-loading=yes"),
         QStringLiteral("--log-target=stderr"), QStringLiteral("-L"),
-        QStringLiteral("module-null-sink sink_name=%1 format=float32le rate=48000 channels=2").arg(sinkName()),
+        QStringLiteral("module-null-sink sink_name=%1 format=float32le rate=48000 channels=2 norewinds=1").arg(sinkName()),
         QStringLiteral("-L"), QStringLiteral("module-native-protocol-unix auth-anonymous=1 socket=%1").arg(d->socketPath())};
     const QString log = d->dir.filePath(QStringLiteral("daemon.log"));
     if (!d->daemon.start(QStringLiteral("pulseaudio"), args, d->environment(), -1, log, &d->error))

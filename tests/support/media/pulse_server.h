@@ -8,7 +8,10 @@
 // loads only a null sink and the native protocol, waits until its socket answers and points
 // PULSE_SERVER at it for the rest of the process. Qt's audio devices bind to the server the first
 // time they are asked for, so the server has to be up before the first QMediaDevices call.
-// The destructor stops the daemon and reaps it. Needs no test framework: the benchmarks use it too.
+// The null sink is loaded without rewinds: otherwise, while idle, it renders two seconds of silence
+// ahead and, unlike a sound card's sink, does not take them back when a stream starts, so the first
+// stream of the server would be heard two seconds late. Without rewinds it renders at most 50 ms
+// ahead, like a card with a fixed period. The destructor stops the daemon and reaps it. Needs no test framework: the benchmarks use it too.
 //
 // SinkRecording records the null sink's monitor with `parec` into memory. Both sides of a timing
 // check are host monotonic time (std::chrono::steady_clock, the clock QElapsedTimer reads). The
