@@ -99,7 +99,7 @@ void Player::startPipeline()
         auto failed = [](const QString &message) { zaf::log::error(lcPlayback(), message); };
         m_videoDecoder = std::make_unique<playback::VideoDecoder>(path, video.first().streamIndex, m_frames.get(),
             m_decodedPictureBudget, std::move(framesReady), std::move(failed));
-        m_videoDecoder->seek(m_currentNs, ++m_generation);
+        requestPictures(false);
     }
     if (!m_customTimeSource)
         chooseDefaultTimeSource();
@@ -203,6 +203,8 @@ void Player::startRunning()
     if (m_running || !canRun())
         return;
     m_running = true;
+    if (!m_decoderPlaying)
+        requestPictures(true);
     if (m_timeSource == m_audioOutput && m_audioDecoder)
         m_audioRequest = m_audioDecoder->start(m_currentNs);
     // Anchored before the source is switched on: switching on may already report an advance.
@@ -244,6 +246,7 @@ void Player::pause()
         return;
     m_rate = 0;
     stopRunning(false);
+    requestPictures(false);
     ++m_interruptions;
     presentDueFrame();
     callPeriodicObservers(true);
@@ -265,11 +268,19 @@ void Player::seekToTime(const MediaTime &time)
     m_currentNs = ns;
     m_endReported = false;
     ++m_interruptions;
-    if (m_videoDecoder)
-        m_videoDecoder->seek(ns, ++m_generation);
+    requestPictures(wasRunning);
     if (wasRunning)
         startRunning();
     callPeriodicObservers(true);
+}
+
+// The picture at the current time, and while `playing` the pictures after it; paused, the decoder
+// decodes nothing beyond what is on screen.
+void Player::requestPictures(bool playing)
+{
+    m_decoderPlaying = playing;
+    if (m_videoDecoder)
+        m_videoDecoder->seek(m_currentNs, ++m_generation, playing);
 }
 
 void Player::setDecodedPictureBudget(std::int64_t bytes)

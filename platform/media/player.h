@@ -93,7 +93,7 @@ public:
     // The memory the decoded pictures kept around the playhead may take, in bytes; the default is
     // kDefaultDecodedPictureBudget. Takes effect with the next decoded picture.
     void setDecodedPictureBudget(std::int64_t bytes);
-    static constexpr std::int64_t kDefaultDecodedPictureBudget = 160 * 1024 * 1024;
+    static constexpr std::int64_t kDefaultDecodedPictureBudget = 128 * 1024 * 1024;
     // What the video decoder has done so far; zeros before the item is ready.
     playback::VideoDecoderStatistics decodingStatistics() const;
 
@@ -119,6 +119,7 @@ private:
 
     void itemStatusChanged();
     void startPipeline();
+    void requestPictures(bool playing);
     void stopPipeline();
     void chooseDefaultTimeSource();
     void installTimeSource(std::shared_ptr<TimeSource> source);
@@ -146,6 +147,7 @@ private:
     std::uint64_t m_interruptions = 0; // counts pauses and seeks, to notice them inside a block
     std::uint64_t m_generation = 0;    // the latest video seek request
     std::int64_t m_decodedPictureBudget = kDefaultDecodedPictureBudget;
+    bool m_decoderPlaying = false;     // the latest request asks for the pictures after its target
 
     PlaybackClock m_clock;
     std::shared_ptr<TimeSource> m_timeSource;

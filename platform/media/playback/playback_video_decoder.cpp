@@ -30,6 +30,8 @@ constexpr auto kStandInInterval = std::chrono::milliseconds(30);
 constexpr std::int64_t kStandInReachNs = 1'000'000'000;
 // Seeks for one request beyond which the decoder gives up on it (each lands earlier than the last).
 constexpr int kMaxSeeksPerRequest = 12;
+// Decoding on rather than seeking while the next keyframe is at most this far ahead.
+constexpr std::int64_t kDecodeOnMarginNs = 250'000'000;
 // A seek that landed after its target tries again this much before the picture it landed on.
 constexpr std::int64_t kLateSeekMarginNs = 100'000'000;
 constexpr std::int64_t kNoTime = std::numeric_limits<std::int64_t>::min();
@@ -96,6 +98,7 @@ struct VideoDecoder::DecodeRun {
     std::optional<std::int64_t> headNs;
     std::optional<std::int64_t> beforeHeadNs; // the picture it produced before that one
     std::int64_t seekPointNs = 0;
+    std::int64_t runKeyframeNs = kNoTime; // the index entry the last seek was aimed at
     std::int64_t seekTargetNs = 0;
     bool seekFromStart = false; // the last seek went to the stream's first keyframe
     // Demuxers seek by decoding time: with reordered pictures a seek can land on a keyframe shown
@@ -109,7 +112,7 @@ struct VideoDecoder::DecodeRun {
     std::int64_t lastPtsNs = 0; // the time given to a picture that carries none
 
     // The request under way.
-    Request current{0, 0, {}};
+    Request current{0, 0, false, {}};
     Clock::time_point previousPostedAt{};
     bool active = false;   // false: nothing to do until the next request
     bool dragging = false; // the request came close after the one before it
@@ -142,9 +145,9 @@ VideoDecoder::~VideoDecoder()
     m_thread.stop();
 }
 
-void VideoDecoder::seek(std::int64_t targetNs, std::uint64_t generation)
+void VideoDecoder::seek(std::int64_t targetNs, std::uint64_t generation, bool playing)
 {
-    m_thread.post(Request{targetNs, generation, Clock::now()});
+    m_thread.post(Request{targetNs, generation, playing, Clock::now()});
 }
 
 VideoDecoderStatistics VideoDecoder::statistics() const
@@ -230,8 +233,8 @@ void VideoDecoder::DecodeRun::begin(const Request &request)
 bool VideoDecoder::DecodeRun::handOnFromWindow()
 {
     if (answered) {
-        if (window.isLast(*delivered)) {
-            active = false; // the stream is played out
+        if (!current.playing || window.isLast(*delivered)) {
+            active = false; // paused on the answer, or the stream is played out
             return true;
         }
         const std::optional<std::int64_t> next = window.successorOf(*delivered);
@@ -262,10 +265,16 @@ bool VideoDecoder::DecodeRun::handOnFromWindow()
 void VideoDecoder::DecodeRun::positionFor(std::int64_t neededNs)
 {
     const std::int64_t from = headNs ? *headNs : seekPointNs;
-    const std::int64_t keyframe = keyframeAtOrBefore(neededNs);
+    const std::int64_t backoffNs = lateFor == neededNs ? lateBackoffNs : 0;
+    if (lateFor != neededNs)
+        lateFor.reset();
+    const std::int64_t keyframe = keyframeAtOrBefore(neededNs - backoffNs);
     // Decoding on reaches the picture when the decoder stands before it, and is the cheaper way
-    // unless a keyframe lies between the two.
-    if (positioned && from <= neededNs && (keyframe == kNoTime || keyframe <= from))
+    // unless a seek would start at a keyframe well between the two. The index gives decoding
+    // times, not the presentation times of reordered pictures, so a seek is only worth it toward
+    // another index entry than the one this run started from, and beyond a margin.
+    const bool seekSkipsAhead = keyframe != kNoTime && keyframe != runKeyframeNs && keyframe > from + kDecodeOnMarginNs;
+    if (positioned && from <= neededNs && !seekSkipsAhead)
         return;
     if (++seeksForRequest > kMaxSeeksPerRequest) {
         // A stream whose times the window cannot make sense of: show what there is and stop.
@@ -278,9 +287,6 @@ void VideoDecoder::DecodeRun::positionFor(std::int64_t neededNs)
         active = false;
         return;
     }
-    const std::int64_t backoffNs = lateFor == neededNs ? lateBackoffNs : 0;
-    if (lateFor != neededNs)
-        lateFor.reset();
     const double targetSeconds = double(neededNs - backoffNs) / 1e9 + startSeconds;
     const std::int64_t ts = std::llround(targetSeconds / timeBase);
     int rc = av_seek_frame(format.get(), d.m_streamIndex, ts, AVSEEK_FLAG_BACKWARD);
@@ -293,6 +299,7 @@ void VideoDecoder::DecodeRun::positionFor(std::int64_t neededNs)
     headNs.reset();
     beforeHeadNs.reset();
     seekPointNs = keyframe != kNoTime ? std::min(keyframe, neededNs) : neededNs;
+    runKeyframeNs = keyframe;
     seekTargetNs = neededNs;
     seekFromStart = neededNs - backoffNs <= streamStartNs || rc < 0;
     draining = false;

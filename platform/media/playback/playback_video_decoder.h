@@ -5,8 +5,8 @@
 //
 // Input: seek requests (a target time and a generation number). Output: pictures in the queue,
 // tagged with the generation of the request they follow, and a call of `framesReady` after each.
-// After a request the answer is the picture shown at the target, exact, followed by the pictures
-// after it in order until the end of the stream.
+// After a request the answer is the picture shown at the target, exact, followed, when the request
+// is for playing, by the pictures after it in order until the end of the stream.
 //
 // Decoded pictures stay in a window around the playhead (FrameWindow, in the decoder's format and
 // within a memory budget), so a request near the playhead is answered from it without decoding,
@@ -42,8 +42,9 @@ public:
     VideoDecoder(const VideoDecoder &) = delete;
     VideoDecoder &operator=(const VideoDecoder &) = delete;
 
-    // Any thread. Replaces any request not yet started.
-    void seek(std::int64_t targetNs, std::uint64_t generation);
+    // Any thread. Replaces any request not yet started. With `playing`, the pictures after the
+    // target follow its answer; without, the decoder stops at the answer.
+    void seek(std::int64_t targetNs, std::uint64_t generation, bool playing);
     // Any thread. The window's budget from its next picture on.
     void setWindowBudget(std::int64_t bytes) { m_budget.store(bytes); }
     VideoDecoderStatistics statistics() const;
@@ -52,6 +53,7 @@ private:
     struct Request {
         std::int64_t targetNs;
         std::uint64_t generation;
+        bool playing;
         std::chrono::steady_clock::time_point postedAt;
     };
     struct DecodeRun; // what one run of the thread holds, and its steps
