@@ -2,6 +2,7 @@
 // tool doing the nearest jobs in the same run, and prints the ratios (ours / ffmpeg).
 //
 //   player_bench [--work DIR] [--runs N] [--seeks N]
+//   player_bench --play-one MOVIE --label TEXT --fps N   (one playback row; the bench runs itself so)
 //
 // Recordings (generated once and kept in the work directory, like media_bench's): the fixture
 // generator's numbered frames with one audio tone and fine moving grain, re-encoded by the ffmpeg
@@ -35,6 +36,7 @@
 #include <QElapsedTimer>
 #include <QEventLoop>
 #include <QFile>
+#include <QProcess>
 #include <QMediaDevices>
 #include <QAudioDevice>
 #include <QTimer>
@@ -451,6 +453,7 @@ int main(int argc, char **argv)
     QStringList args = app.arguments().mid(1);
     QString work = QDir::temp().filePath(QStringLiteral("zaf-bench"));
     int runs = 5, seeks = 20;
+    Movie playOne;
     for (int i = 0; i + 1 < args.size(); i += 2) {
         if (args[i] == QLatin1String("--work"))
             work = args[i + 1];
@@ -458,6 +461,16 @@ int main(int argc, char **argv)
             runs = std::max(1, args[i + 1].toInt());
         else if (args[i] == QLatin1String("--seeks"))
             seeks = std::max(1, args[i + 1].toInt());
+        else if (args[i] == QLatin1String("--play-one")) // the parent's child run of one playback
+            playOne.path = args[i + 1];
+        else if (args[i] == QLatin1String("--label"))
+            playOne.label = args[i + 1];
+        else if (args[i] == QLatin1String("--fps"))
+            playOne.fps = std::max(1, args[i + 1].toInt());
+    }
+    if (!playOne.path.isEmpty()) {
+        playbackBench(playOne, !QMediaDevices::defaultAudioOutput().isNull());
+        return 0;
     }
     QDir().mkpath(work);
     QStringList plains;
@@ -495,7 +508,17 @@ int main(int argc, char **argv)
                                           : QStringLiteral("\"%1\" (the Player plays on its clock)").arg(device.description());
     std::printf("\n== playback for %d s (CPU: user + sys of the process per media second; RSS before play, peak while playing)\n"
                 "audio device: %s\n", kPlaySeconds, qPrintable(audio));
-    for (const Movie &movie : playMovies)
-        playbackBench(movie, !device.isNull());
+    std::fflush(stdout); // before the child runs write to the same output
+    // Each in a process of its own, so the memory figures are the playback's and not what earlier
+    // players left in the heap.
+    for (const Movie &movie : playMovies) {
+        QProcess one;
+        one.setProcessChannelMode(QProcess::ForwardedChannels);
+        one.start(QCoreApplication::applicationFilePath(),
+                  {QStringLiteral("--play-one"), movie.path, QStringLiteral("--label"), movie.label, QStringLiteral("--fps"),
+                   QString::number(movie.fps)});
+        if (!one.waitForFinished(kPlaySeconds * 1000 + 120000) || one.exitCode() != 0)
+            std::printf("%-28s playback run failed\n", qPrintable(movie.label));
+    }
     return 0;
 }
