@@ -293,6 +293,7 @@ void Player::setDecodedPictureBudget(std::int64_t bytes)
 
 playback::VideoDecoderStatistics Player::decodingStatistics() const
 {
+    ZAF_ASSERT_MAIN_THREAD();
     return m_videoDecoder ? m_videoDecoder->statistics() : playback::VideoDecoderStatistics{};
 }
 
@@ -424,6 +425,9 @@ bool Player::presentDueFrame()
         return false;
     std::optional<playback::VideoFrame> frame = m_frames->takeDue(m_generation, m_currentNs);
     if (!frame)
+        return false;
+    // The answer to a play or pause is often the picture already on screen (the same image).
+    if (frame->image.cacheKey() == m_frame.cacheKey())
         return false;
     m_frame = std::move(frame->image);
     Q_EMIT videoFrameChanged();
