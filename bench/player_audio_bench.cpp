@@ -16,6 +16,8 @@
 // There is no comparison with the ffmpeg tool: it shows no pictures here, so it has neither a
 // thirtieth picture nor a picture to set its sound against.
 #include "bench/bench_recordings.h"
+#include "bench/bench_statistics.h"
+#include "tests/support/wait_until.h"
 #include "platform/log.h"
 #include "platform/media/media_asset.h"
 #include "platform/media/player.h"
@@ -42,38 +44,13 @@
 
 using namespace zaf::media;
 using zaf::test::hostSeconds;
+using zaf::bench::percentile;
 
 namespace {
 
 constexpr int kSeconds = 8;
 constexpr int kFps = 30;
 constexpr double kClickInterval = 0.5;
-
-double percentile(std::vector<double> v, double p)
-{
-    if (v.empty())
-        return NAN;
-    std::sort(v.begin(), v.end());
-    return v[std::min(v.size(), size_t(std::max(1.0, std::ceil(p * double(v.size()))))) - 1];
-}
-
-// Runs the event loop until `done` holds or `ms` pass; returns `done()`.
-bool waitFor(const std::function<bool()> &done, int ms)
-{
-    QEventLoop loop;
-    QTimer poll, timeout;
-    QObject::connect(&poll, &QTimer::timeout, &loop, [&] {
-        if (done())
-            loop.quit();
-    });
-    QObject::connect(&timeout, &QTimer::timeout, &loop, &QEventLoop::quit);
-    poll.start(5);
-    timeout.setSingleShot(true);
-    timeout.start(ms);
-    if (!done())
-        loop.exec();
-    return done();
-}
 
 QString clickRecording(const QString &work)
 {
@@ -120,7 +97,7 @@ Run playOnce(const zaf::test::PulseServer &server, const QString &path)
     QObject::connect(&player, &Player::videoFrameChanged, [&] {
         shown.try_emplace(zaf::fixture::readFrameNumber(player.currentVideoFrame()), hostSeconds());
     });
-    if (!waitFor([&] { return item->status() == PlayerItem::Status::ReadyToPlay; }, 10000))
+    if (!zaf::test::waitUntil([&] { return item->status() == PlayerItem::Status::ReadyToPlay; }, 10000))
         return run;
     zaf::test::SinkRecording recording(server);
     if (!recording.ok()) {
@@ -130,8 +107,8 @@ Run playOnce(const zaf::test::PulseServer &server, const QString &path)
     const double playHost = hostSeconds();
     player.play();
     const int clicks = int(kSeconds / kClickInterval) - 1;
-    waitFor([&] { return player.rate() == 0; }, (kSeconds + 10) * 1000);
-    waitFor([&] { return recording.clickHostTimes().size() >= clicks; }, 3000);
+    zaf::test::waitUntil([&] { return player.rate() == 0; }, (kSeconds + 10) * 1000);
+    zaf::test::waitUntil([&] { return recording.clickHostTimes().size() >= clicks; }, 3000);
     recording.stop();
     if (shown.count(30))
         run.frame30 = shown.at(30) - playHost;

@@ -24,6 +24,7 @@
 // - playback for 10 s of 1080p30, 1080p60 and 2160p30: CPU time (user + sys) per media second and the peak
 //   resident memory, against ffmpeg decoding the same 10 s as fast as it can.
 #include "bench/bench_recordings.h"
+#include "bench/bench_statistics.h"
 #include "platform/log.h"
 #include "platform/media/media_asset.h"
 #include "platform/media/player.h"
@@ -57,6 +58,7 @@
 
 using namespace zaf::media;
 using zaf::bench::runFfmpeg;
+using zaf::bench::percentile;
 
 namespace {
 
@@ -76,14 +78,6 @@ struct Movie {
 QElapsedTimer g_clock; // every timestamp of the run, in ns since the start
 
 double ms(qint64 ns) { return ns / 1e6; }
-
-double percentile(std::vector<double> v, double p)
-{
-    if (v.empty())
-        return NAN;
-    std::sort(v.begin(), v.end());
-    return v[std::min(v.size(), size_t(std::max(1.0, std::ceil(p * double(v.size()))))) - 1]; // the nearest rank
-}
 
 // "12.3" or "timeout" / "-" for a figure the run did not produce.
 QString fmt(double v, const char *missing = "-")
