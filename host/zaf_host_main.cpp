@@ -9,6 +9,7 @@
 // start, died, refused the request or ended without a report; 2 for bad arguments.
 
 #include "host/extension_session.h"
+#include "platform/install_layout.h"
 #include "platform/log.h"
 
 #include <QCommandLineParser>
@@ -50,8 +51,8 @@ bool isExecutableFile(const QString &path)
     return info.isFile() && info.isExecutable();
 }
 
-// --extension, else $ZAF_EXTENSION_PATH, else the build's extension directory beside ours, else our
-// own directory, else PATH. Empty (with `error` set) when none of these names a program.
+// --extension, else $ZAF_EXTENSION_PATH, else the installed one (PREFIX/libexec/zafrel), else the
+// build's extension directory beside ours, else our own directory, else PATH. Empty (with `error` set) when none of these names a program.
 QString findExtension(const QString &given, QString *error)
 {
     if (!given.isEmpty()) {
@@ -68,8 +69,11 @@ QString findExtension(const QString &given, QString *error)
         return {};
     }
     const QDir ownDir(QCoreApplication::applicationDirPath());
-    for (const QString &candidate : {ownDir.filePath(QStringLiteral("../extension/") + QLatin1String(kExtensionName)),
-                                     ownDir.filePath(QLatin1String(kExtensionName))}) {
+    QStringList candidates{ownDir.filePath(QStringLiteral("../extension/") + QLatin1String(kExtensionName)),
+                           ownDir.filePath(QLatin1String(kExtensionName))};
+    if (const QString prefix = zaf::install::installPrefix(); !prefix.isEmpty())
+        candidates.prepend(QDir(prefix).filePath(QLatin1String(zaf::install::kLibexecDir) + QLatin1Char('/') + QLatin1String(kExtensionName)));
+    for (const QString &candidate : candidates) {
         if (isExecutableFile(candidate))
             return QFileInfo(candidate).canonicalFilePath();
     }

@@ -1,5 +1,7 @@
 #include "identity/bundle_extensions.h"
 
+#include "platform/install_layout.h"
+
 #include <QDir>
 #include <QFileInfo>
 
@@ -13,8 +15,8 @@ constexpr const char *kLocalizableTable = "Localizable";
 
 QString frameworkBundlePath()
 {
-    const QString overridden = qEnvironmentVariable("ZAF_FRAMEWORK_BUNDLE_PATH");
-    return overridden.isEmpty() ? QStringLiteral(ZAF_FRAMEWORK_BUNDLE_DIR) : overridden;
+    return zaf::install::dataPath("ZAF_FRAMEWORK_BUNDLE_PATH", QLatin1String(zaf::install::kStringTablesDir) + QStringLiteral("/Zafrel"),
+                                  QStringLiteral(ZAF_FRAMEWORK_BUNDLE_DIR));
 }
 
 QString stringValue(const QVariantMap &dictionary, const char *key)

@@ -1,5 +1,7 @@
 #include "identity/framework_strings.h"
 
+#include "platform/install_layout.h"
+
 #include <QFileInfo>
 
 #include <atomic>
@@ -17,8 +19,9 @@ std::shared_ptr<Bundle> g_componentBundle;
 
 QString componentBundlePath()
 {
-    const QString overridden = qEnvironmentVariable("ZAF_PHOTO_LIBRARY_BUNDLE_PATH");
-    return overridden.isEmpty() ? QStringLiteral(ZAF_PHOTO_LIBRARY_BUNDLE_DIR) : overridden;
+    return zaf::install::dataPath("ZAF_PHOTO_LIBRARY_BUNDLE_PATH",
+                                  QLatin1String(zaf::install::kStringTablesDir) + QStringLiteral("/ZafPhotoLibrary"),
+                                  QStringLiteral(ZAF_PHOTO_LIBRARY_BUNDLE_DIR));
 }
 
 } // namespace

@@ -1,5 +1,6 @@
 #include "publishing/plugin_loader.h"
 
+#include "platform/install_layout.h"
 #include "platform/log.h"
 
 #include <QCoreApplication>
@@ -102,11 +103,9 @@ PluginLookup<const QMetaObject> publishingAgentClass(const QString &path, const 
 
 QString defaultPublishingPluginPath()
 {
-    const QString overridden = qEnvironmentVariable("ZAF_PUBLISHING_PLUGIN_PATH");
-    if (!overridden.isEmpty())
-        return overridden;
-    // The plug-in's place in a build that runs where it was built.
-    return QStringLiteral(ZAF_PUBLISHING_PLUGIN_FILE);
+    return install::dataPath("ZAF_PUBLISHING_PLUGIN_PATH",
+                             QLatin1String(install::kPluginsDir) + QStringLiteral("/libzaf_publishing_plugin.so"),
+                             QStringLiteral(ZAF_PUBLISHING_PLUGIN_FILE));
 }
 
 } // namespace zaf::publishing

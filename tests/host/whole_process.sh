@@ -13,6 +13,9 @@
 # what the killed one left. "host-dies" applies the trim and kills zaf-host (SIGKILL): the
 # extension must exit by itself.
 #
+# EXTENSION "installed" runs an installed zaf-host as a user would: it finds the extension itself, with
+# no ZAF_* variable set, from another folder, with HOME at SCRATCH_DIR/home.
+#
 # MOVIE "fixture" (the default) is a 3 s 640x360 recording with two audio tracks; "tiny" is a 4x4
 # H.264 movie; "garbage" is random bytes named .mp4.
 #
@@ -28,8 +31,10 @@ if [ "${1:-}" = "--inside" ]; then
 
     # start_host NAME: a host presenting the editor on the movie; its output goes to NAME.out/.err.
     start_host() {
+        local given=(--extension "$extension")
+        [ "$extension" = installed ] && given=()
         "$host" --movie "$scratch/movie.mp4" --app-name "Whole Process" --bundle-id org.example.WholeProcess \
-            --tint '#3366CC' --extension "$extension" >"$scratch/$1.out" 2>"$scratch/$1.err" &
+            --tint '#3366CC' "${given[@]}" >"$scratch/$1.out" 2>"$scratch/$1.err" &
     }
     # new_window KNOWN: waits up to 60 s for an editor window other than KNOWN and prints it.
     new_window() {
@@ -154,7 +159,17 @@ if [ ! -s "$scratch/movie.mp4" ]; then
     exit 0
 fi
 sha256sum "$scratch/movie.mp4" | cut -d' ' -f1 >"$scratch/movie.sha256"
-export ZAF_TEMP_DIRECTORY="$scratch/temp/"
-export ZAF_VIDEO_LIBRARY="$scratch/Videos"
+if [ "$extension" = installed ]; then
+    # As a user runs the installed programs: no ZAF_* variable, from another folder, with a home of
+    # its own (the temporary root is then $scratch/home/.cache/Zafrel, the library $scratch/home/Videos).
+    for variable in $(env | sed -n 's/^\(ZAF_[A-Za-z0-9_]*\)=.*/\1/p'); do unset "$variable"; done
+    export HOME="$scratch/home"
+    unset XDG_CACHE_HOME XDG_CONFIG_HOME XDG_DATA_HOME XDG_RUNTIME_DIR
+    mkdir -p "$HOME"
+    cd /
+else
+    export ZAF_TEMP_DIRECTORY="$scratch/temp/"
+    export ZAF_VIDEO_LIBRARY="$scratch/Videos"
+fi
 export QT_QPA_PLATFORM=xcb
 exec xvfb-run -a -s "-screen 0 1280x800x24" "$0" --inside "$host" "$extension" "$scratch" "$scenario"

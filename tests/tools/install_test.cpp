@@ -1,0 +1,151 @@
+// The installed application: `cmake --install` into a scratch prefix lays out what the programs need,
+// and the installed programs find it from their own place, with no ZAF_* variable set.
+#include "platform/install_layout.h"
+#include "tests/support/child_process.h"
+#include "tests/support/media/fixture_movies.h"
+#include "tests/support/named_cases.h"
+#include "tests/support/temp_dir.h"
+
+#include <QDir>
+#include <QFile>
+#include <QFileInfo>
+#include <QProcessEnvironment>
+#include <QStandardPaths>
+
+#include <gtest/gtest.h>
+
+namespace zaf::test {
+namespace {
+
+ZAF_PRINT_CASES_AS_NAMES
+
+// Installs the build once per process into a scratch prefix.
+const QString &installedPrefix()
+{
+    static ScratchDir scratch;
+    static const QString prefix = [] {
+        const QString into = scratch.file(QStringLiteral("prefix"));
+        const ChildRun install = runChild(QStringLiteral("cmake"), {QStringLiteral("--install"), QStringLiteral(ZAF_BINARY_DIR),
+                                                                    QStringLiteral("--prefix"), into});
+        EXPECT_TRUE(install.ok()) << install.error.toStdString() << install.err.toStdString();
+        return install.ok() ? into : QString();
+    }();
+    return prefix;
+}
+
+// The environment of a user's session: the test's own without any ZAF_* variable.
+QStringList userEnvironment()
+{
+    QStringList environment;
+    for (const QString &entry : QProcessEnvironment::systemEnvironment().toStringList()) {
+        if (!entry.startsWith(QLatin1String("ZAF_")))
+            environment.append(entry);
+    }
+    return environment;
+}
+
+struct InstalledFile {
+    const char *name;
+    const char *path; // under the prefix
+    bool executable;
+};
+
+class InstalledFileTest : public ::testing::TestWithParam<InstalledFile> {};
+
+TEST_P(InstalledFileTest, IsInItsPlace)
+{
+    const InstalledFile &c = GetParam();
+    ASSERT_FALSE(installedPrefix().isEmpty());
+    const QFileInfo file(QDir(installedPrefix()).filePath(QLatin1String(c.path)));
+    EXPECT_TRUE(file.isFile()) << c.path;
+    EXPECT_EQ(file.isExecutable(), c.executable) << c.path;
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Layout, InstalledFileTest,
+    ::testing::Values(InstalledFile{"Host", "bin/zaf-host", true}, InstalledFile{"MediaTool", "bin/zaf-media", true},
+                      InstalledFile{"TempStoreTool", "bin/zaf-tempstore", true}, InstalledFile{"IdentityTool", "bin/zaf-identity", true},
+                      InstalledFile{"Extension", "libexec/zafrel/zaf-video-editor-extension", true},
+                      InstalledFile{"AgentLibrary", "lib/zafrel/libzaf_publishing_agent.so", false},
+                      InstalledFile{"PublishingPlugin", "lib/zafrel/plugins/libzaf_publishing_plugin.so", false},
+                      InstalledFile{"FrameworkStrings", "share/zafrel/Zafrel/en.lproj/Localizable.mo", false},
+                      InstalledFile{"PhotoLibraryStrings", "share/zafrel/ZafPhotoLibrary/de.lproj/PhotoLibrary.mo", false}),
+    caseName);
+
+struct PrefixCase {
+    const char *name;
+    const char *executable; // under a scratch folder
+    bool withData;          // the folder holds share/zafrel
+    const char *prefix;     // expected, under the scratch folder; nullptr: none
+};
+
+class InstallPrefixTest : public ::testing::TestWithParam<PrefixCase> {};
+
+// A program finds the prefix it is installed under from its own place, and a build tree is none.
+TEST_P(InstallPrefixTest, ComesFromTheProgramsPlace)
+{
+    const PrefixCase &c = GetParam();
+    ScratchDir scratch;
+    const QString executable = scratch.file(QLatin1String(c.executable));
+    QDir().mkpath(QFileInfo(executable).absolutePath());
+    QFile file(executable);
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly));
+    file.close();
+    if (c.withData)
+        QDir().mkpath(scratch.file(QStringLiteral("usr/share/zafrel")));
+    const QString expected = c.prefix ? QFileInfo(scratch.file(QLatin1String(c.prefix))).canonicalFilePath() : QString();
+    EXPECT_EQ(zaf::install::installPrefixOf(executable), expected);
+}
+
+INSTANTIATE_TEST_SUITE_P(Places, InstallPrefixTest,
+                         ::testing::Values(PrefixCase{"ProgramInBin", "usr/bin/zaf-host", true, "usr"},
+                                           PrefixCase{"ExtensionInLibexec", "usr/libexec/zafrel/zaf-video-editor-extension", true, "usr"},
+                                           PrefixCase{"BinWithoutOurData", "usr/bin/zaf-host", false, nullptr},
+                                           PrefixCase{"BuildTree", "usr/host/zaf-host", true, nullptr}),
+                         caseName);
+
+// The installed media tool reads a movie from any folder, with nothing set.
+TEST(InstalledPrograms, MediaToolProbesAMovie)
+{
+    ASSERT_FALSE(installedPrefix().isEmpty());
+    const QString movie = sharedFixtureMovie({.seconds = 1});
+    ChildOptions options;
+    options.environment = userEnvironment();
+    const ChildRun probe = runChild(QDir(installedPrefix()).filePath(QStringLiteral("bin/zaf-media")),
+                                    {QStringLiteral("probe"), movie}, options);
+    ASSERT_TRUE(probe.ok()) << probe.err.toStdString();
+    EXPECT_TRUE(probe.out.contains("\"display_size\"")) << probe.out.toStdString();
+}
+
+// The installed host finds the installed extension and presents the editor on a recording under
+// Xvfb; Escape cancels it, the report is empty and the temporary root is left empty.
+TEST(InstalledPrograms, HostPresentsTheEditorAndTheUserCancels)
+{
+    for (const char *tool : {"xvfb-run", "Xvfb", "xdotool"}) {
+        if (QStandardPaths::findExecutable(QLatin1String(tool)).isEmpty())
+            GTEST_SKIP() << tool << " is not installed; the installed run needs an X server and xdotool";
+    }
+    ASSERT_FALSE(installedPrefix().isEmpty());
+    ScratchDir scratch;
+    ChildOptions options;
+    options.timeoutMs = 240000;
+    options.forwardOutput = true;
+    const ChildRun script = runChild(QStringLiteral("bash"), {QStringLiteral(ZAF_WHOLE_PROCESS_SCRIPT),
+                                                              QDir(installedPrefix()).filePath(QStringLiteral("bin/zaf-host")),
+                                                              QStringLiteral("installed"), QStringLiteral(ZAF_FIXTURE_BIN), scratch.path(),
+                                                              QStringLiteral("cancel")}, options);
+    ASSERT_TRUE(script.ok()) << script.error.toStdString();
+    auto read = [&](const char *name) {
+        QFile file(scratch.file(QLatin1String(name)));
+        return file.open(QIODevice::ReadOnly) ? QString::fromUtf8(file.readAll()) : QString();
+    };
+    ASSERT_EQ(read("result").trimmed(), QStringLiteral("ok")) << read("host.err").toStdString();
+    EXPECT_EQ(read("host.status").trimmed(), QStringLiteral("0")) << read("host.err").toStdString();
+    EXPECT_EQ(read("host.out"), QStringLiteral("[]\n"));
+    const QDir temporaryRoot(scratch.file(QStringLiteral("home/.cache/Zafrel")));
+    EXPECT_TRUE(temporaryRoot.exists()) << "the installed extension made its temporary root in the user's cache";
+    EXPECT_EQ(temporaryRoot.entryList(QDir::Files | QDir::Hidden | QDir::System), QStringList());
+}
+
+} // namespace
+} // namespace zaf::test
