@@ -4,11 +4,20 @@
 //
 //   zaf-host --movie PATH --app-name NAME --bundle-id ID [--attachment PATH] [--share-message TEXT]
 //            [--tint #RRGGBB[AA]] [--extension PATH]
+//   zaf-host --open PATH [...]
+//
+// --movie hands the editor the recording itself, as a recorder does: the editor's save removes it.
+// --open is how a user opens a movie of their own (the desktop entry's "Open With"): the editor gets
+// a private clone of it (a reflink, a hard link or a copy) in a folder of the user's cache that goes
+// when zaf-host ends, so the user's file is never removed or changed; the application is then the
+// editor itself unless --app-name and --bundle-id say otherwise.
 //
 // Exit status: 0 after a report and a normal exit of the extension; 1 when the extension could not
 // start, died, refused the request or ended without a report; 2 for bad arguments.
 
 #include "host/extension_session.h"
+#include "host/host_log.h"
+#include "platform/files/file_manager.h"
 #include "platform/install_layout.h"
 #include "platform/log.h"
 
@@ -19,6 +28,7 @@
 #include <QJsonArray>
 #include <QJsonDocument>
 #include <QStandardPaths>
+#include <QTemporaryDir>
 #include <QTimer>
 
 #include <csignal>
@@ -27,6 +37,9 @@
 namespace {
 
 constexpr char kExtensionName[] = "zaf-video-editor-extension";
+// Who asks for the editor when a user opens a movie of their own: the editor, by its desktop entry.
+constexpr char kOwnAppName[] = "Zafrel";
+constexpr char kOwnBundleIdentifier[] = "org.zafrel.Editor";
 // How long the extension may take to exit once its channel is closed without a report, and once
 // its view has been removed (it empties its temporary directory first).
 constexpr int kExitAfterCloseMs = 10000;
@@ -84,6 +97,29 @@ QString findExtension(const QString &given, QString *error)
     return {};
 }
 
+// Clones the user's movie at *path into a new folder of the user's cache and points *path at the
+// clone; null, with *error set, when it cannot.
+std::unique_ptr<QTemporaryDir> privateClone(QString *path, QString *error)
+{
+    const QString cache = QStandardPaths::writableLocation(QStandardPaths::GenericCacheLocation);
+    QDir().mkpath(cache);
+    auto folder = std::make_unique<QTemporaryDir>(QDir(cache).filePath(QStringLiteral("zafrel-open-XXXXXX")));
+    if (!folder->isValid()) {
+        *error = QStringLiteral("cannot make a folder for the editor's copy in %1: %2").arg(cache, folder->errorString());
+        return nullptr;
+    }
+    const QString clone = folder->filePath(QFileInfo(*path).fileName());
+    zaf::FileManager::CloneKind kind = zaf::FileManager::CloneKind::Copy;
+    if (const zaf::OptionalError failure = zaf::FileManager::defaultManager().cloneItemAtPath(*path, clone, &kind)) {
+        *error = QStringLiteral("cannot hand the editor a copy of %1: %2").arg(*path, failure->description());
+        return nullptr;
+    }
+    zaf::log::info(lcHost(), QStringLiteral("the editor works on %1 of %2")
+        .arg(QLatin1String(kind == zaf::FileManager::CloneKind::Reflink ? "a clone" : kind == zaf::FileManager::CloneKind::HardLink ? "a hard link" : "a copy"), *path));
+    *path = clone;
+    return folder;
+}
+
 } // namespace
 
 int main(int argc, char **argv)
@@ -108,7 +144,10 @@ int main(int argc, char **argv)
                                                 QStringLiteral("TEXT"));
     const QCommandLineOption tintOption(QStringLiteral("tint"), QStringLiteral("Tint colour, #RRGGBB or #RRGGBBAA."), QStringLiteral("COLOR"));
     const QCommandLineOption extensionOption(QStringLiteral("extension"), QStringLiteral("The extension program."), QStringLiteral("PATH"));
-    parser.addOptions({movieOption, appNameOption, bundleIdOption, attachmentOption, shareMessageOption, tintOption, extensionOption});
+    const QCommandLineOption openOption(QStringLiteral("open"),
+        QStringLiteral("A movie of the user's: the editor gets a private clone, and the file is never removed or changed."),
+        QStringLiteral("PATH"));
+    parser.addOptions({movieOption, appNameOption, bundleIdOption, attachmentOption, shareMessageOption, tintOption, extensionOption, openOption});
 
     if (!parser.parse(app.arguments()))
         return usage(parser.errorText(), parser);
@@ -118,22 +157,39 @@ int main(int argc, char **argv)
     }
     if (!parser.positionalArguments().isEmpty())
         return usage(QStringLiteral("unexpected argument: %1").arg(parser.positionalArguments().constFirst()), parser);
+    const bool opening = parser.isSet(openOption);
+    if (opening && parser.isSet(movieOption))
+        return usage(QStringLiteral("--movie and --open exclude each other"), parser);
     for (const QCommandLineOption *required : {&movieOption, &appNameOption, &bundleIdOption}) {
-        if (!parser.isSet(*required) || parser.value(*required).isEmpty())
-            return usage(QStringLiteral("--%1 is required").arg(required->names().constFirst()), parser);
+        if (opening && required != &movieOption && !parser.isSet(*required))
+            continue;
+        const QCommandLineOption &option = opening && required == &movieOption ? openOption : *required;
+        if (!parser.isSet(option) || parser.value(option).isEmpty())
+            return usage(QStringLiteral("--%1 is required").arg(option.names().constFirst()), parser);
     }
     for (const QCommandLineOption *single : {&movieOption, &appNameOption, &bundleIdOption, &attachmentOption, &shareMessageOption,
-                                             &tintOption, &extensionOption}) {
+                                             &tintOption, &extensionOption, &openOption}) {
         if (parser.values(*single).size() > 1)
             return usage(QStringLiteral("--%1 is given more than once").arg(single->names().constFirst()), parser);
     }
 
     zaf::host::RecordingDetails details;
-    details.moviePath = QFileInfo(parser.value(movieOption)).absoluteFilePath();
-    details.appName = parser.value(appNameOption);
-    details.bundleIdentifier = parser.value(bundleIdOption);
+    const QString given = parser.value(opening ? openOption : movieOption);
+    details.moviePath = QFileInfo(given).absoluteFilePath();
+    details.appName = parser.isSet(appNameOption) ? parser.value(appNameOption) : QString::fromLatin1(kOwnAppName);
+    details.bundleIdentifier = parser.isSet(bundleIdOption) ? parser.value(bundleIdOption) : QString::fromLatin1(kOwnBundleIdentifier);
     if (!QFileInfo(details.moviePath).isFile())
-        return usage(QStringLiteral("the movie %1 is not a file").arg(parser.value(movieOption)), parser);
+        return usage(QStringLiteral("the movie %1 is not a file").arg(given), parser);
+    // The private clone lives until main() returns; QTemporaryDir removes it with its folder.
+    std::unique_ptr<QTemporaryDir> cloneFolder;
+    if (opening) {
+        QString problem;
+        cloneFolder = privateClone(&details.moviePath, &problem);
+        if (!cloneFolder) {
+            complain(problem);
+            return 1;
+        }
+    }
     if (parser.isSet(attachmentOption)) {
         const QString path = QFileInfo(parser.value(attachmentOption)).absoluteFilePath();
         if (!QFileInfo(path).isFile())

@@ -8,6 +8,8 @@
 #include <cerrno>
 #include <dirent.h>
 #include <fcntl.h>
+#include <linux/fs.h>
+#include <sys/ioctl.h>
 #include <filesystem>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
@@ -187,6 +189,45 @@ OptionalError FileManager::copyItemAtPath(const QString &from, const QString &to
     ::close(in);
     // On failure the temporary goes with the AtomicFile.
     return failure ? failure : (*out.value)->commit();
+}
+
+OptionalError FileManager::cloneItemAtPath(const QString &from, const QString &to, CloneKind *kind) const
+{
+    CloneKind made = CloneKind::Copy;
+    const int in = retrying([&] { return ::open(encoded(from).constData(), O_RDONLY | O_CLOEXEC); });
+    if (in < 0)
+        return Error::fromErrno(errno, from);
+    struct stat st;
+    const int statError = ::fstat(in, &st) != 0 ? errno : (S_ISREG(st.st_mode) ? 0 : EINVAL);
+    if (statError != 0) {
+        ::close(in);
+        return Error::fromErrno(statError, from);
+    }
+    OptionalError failure;
+    {
+        Result<std::unique_ptr<AtomicFile>> out = AtomicFile::create(to);
+        if (!out.ok()) {
+            ::close(in);
+            return out.error;
+        }
+        if (::ioctl((*out.value)->descriptor(), FICLONE, in) == 0) {
+            made = CloneKind::Reflink;
+            failure = (*out.value)->commit();
+        }
+        // Otherwise the reserved temporary goes with the AtomicFile.
+    }
+    ::close(in);
+    if (made != CloneKind::Reflink) {
+        if (::link(encoded(from).constData(), encoded(to).constData()) == 0)
+            made = CloneKind::HardLink;
+        else if (errno == EEXIST)
+            return Error::fromErrno(EEXIST, to);
+        else
+            failure = copyItemAtPath(from, to);
+    }
+    if (!failure && kind)
+        *kind = made;
+    return failure;
 }
 
 Result<FileSystemAttributes> FileManager::attributesOfFileSystemForPath(const QString &path) const

@@ -66,6 +66,14 @@ public:
     // destination appears only complete and flushed to disk, and a failure leaves nothing.
     virtual OptionalError copyItemAtPath(const QString &from, const QString &to) const;
 
+    // How a clone was made.
+    enum class CloneKind { Reflink, HardLink, Copy };
+    // A second name for a regular file's contents at a destination that must not exist, for a
+    // reader that may remove it but never writes it: a copy-on-write clone where the file system
+    // can (a reflink), else a hard link on the same file system, else a copy (copyItemAtPath).
+    // Removing the destination never touches the source.
+    OptionalError cloneItemAtPath(const QString &from, const QString &to, CloneKind *kind = nullptr) const;
+
     // Attributes of the file system that holds the path.
     virtual Result<FileSystemAttributes> attributesOfFileSystemForPath(const QString &path) const;
 };

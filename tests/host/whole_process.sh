@@ -6,7 +6,8 @@
 #
 # SCENARIO "cancel" (the default) presses Escape. "trim-save" trims with the keyboard (the playhead
 # to 1 s, I, to 2.5 s, O, Return to apply), waits for the trim, then saves with Ctrl+S into
-# SCRATCH_DIR/Videos. "two-editors" runs two hosts at once on the same user's temporary root: the
+# SCRATCH_DIR/Videos; "open-trim-save" does the same on a movie opened as a user's own (--open), whose
+# private clone goes into SCRATCH_DIR/cache. "two-editors" runs two hosts at once on the same user's temporary root: the
 # first editor applies the same trim, the second is cancelled while the first stays open, then
 # the first saves. "kill-mid-trim" applies the trim and kills the extension (SIGKILL) while the trim
 # writes into its temporary directory, then opens and cancels a second editor, whose start sweeps
@@ -33,8 +34,9 @@ if [ "${1:-}" = "--inside" ]; then
     start_host() {
         local given=(--extension "$extension")
         [ "$extension" = installed ] && given=()
-        "$host" --movie "$scratch/movie.mp4" --app-name "Whole Process" --bundle-id org.example.WholeProcess \
-            --tint '#3366CC' "${given[@]}" >"$scratch/$1.out" 2>"$scratch/$1.err" &
+        local movie=(--movie "$scratch/movie.mp4" --app-name "Whole Process" --bundle-id org.example.WholeProcess)
+        [ "$scenario" = open-trim-save ] && movie=(--open "$scratch/movie.mp4")
+        "$host" "${movie[@]}" --tint '#3366CC' "${given[@]}" >"$scratch/$1.out" 2>"$scratch/$1.err" &
     }
     # new_window KNOWN: waits up to 60 s for an editor window other than KNOWN and prints it.
     new_window() {
@@ -96,7 +98,7 @@ if [ "${1:-}" = "--inside" ]; then
         # Let the editor finish opening the movie before the keys arrive.
         sleep 2
         case "$scenario" in
-        trim-save)
+        trim-save | open-trim-save)
             trim_with_keys "$window"
             xdotool key ctrl+s
             ;;
@@ -170,6 +172,7 @@ if [ "$extension" = installed ]; then
 else
     export ZAF_TEMP_DIRECTORY="$scratch/temp/"
     export ZAF_VIDEO_LIBRARY="$scratch/Videos"
+    export XDG_CACHE_HOME="$scratch/cache"
 fi
 export QT_QPA_PLATFORM=xcb
 exec xvfb-run -a -s "-screen 0 1280x800x24" "$0" --inside "$host" "$extension" "$scratch" "$scenario"

@@ -99,6 +99,16 @@ TEST_F(ZafHostWholeProcess, KeyboardTrimThenSavePutsTheTrimmedMixedMovieInTheLib
     expectTheTrimmedMixedMovieInTheLibrary();
 }
 
+// A movie the user opens as their own: the editor works on a private clone, so after a trim and a
+// save the user's file is there, byte for byte, and the clone's folder has gone with zaf-host.
+TEST_F(ZafHostWholeProcess, OpeningAUsersMovieLeavesItUntouchedAfterASave)
+{
+    ASSERT_NO_FATAL_FAILURE(run("open-trim-save", kTwoSaves));
+    expectTheTrimmedMixedMovieInTheLibrary();
+    EXPECT_EQ(QString::fromLatin1(fileDigest(scratch.file("movie.mp4")).toHex()), read("movie.sha256").trimmed());
+    EXPECT_EQ(QDir(scratch.file("cache")).entryList({QStringLiteral("zafrel-open-*")}, QDir::AllEntries | QDir::Hidden), QStringList());
+}
+
 // Two editors of one user: the second one's Cancel must not empty the first one's trimmed movie.
 TEST_F(ZafHostWholeProcess, CancellingASecondEditorLeavesTheFirstEditorsTrimToSave)
 {

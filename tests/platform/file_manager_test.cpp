@@ -59,6 +59,9 @@ INSTANTIATE_TEST_SUITE_P(
                       RefusalCase{"CopyOntoAFile", [](auto &s) { return fm().copyItemAtPath(s.file("a"), s.file("b")); }, EEXIST},
                       RefusalCase{"CopyOfADirectory", [](auto &s) { return fm().copyItemAtPath(s.file("out"), s.file("d")); }, EINVAL},
                       RefusalCase{"CopyOfNothing", [](auto &s) { return fm().copyItemAtPath(s.file("none"), s.file("d")); }, ENOENT},
+                      RefusalCase{"CloneOntoAFile", [](auto &s) { return fm().cloneItemAtPath(s.file("a"), s.file("b")); }, EEXIST},
+                      RefusalCase{"CloneOfADirectory", [](auto &s) { return fm().cloneItemAtPath(s.file("out"), s.file("d")); }, EINVAL},
+                      RefusalCase{"CloneOfNothing", [](auto &s) { return fm().cloneItemAtPath(s.file("none"), s.file("d")); }, ENOENT},
                       RefusalCase{"RemoveNothing", [](auto &s) { return fm().removeItemAtPath(s.file("none")); }, ENOENT},
                       RefusalCase{"ListNothing", [](auto &s) { return fm().contentsOfDirectoryAtPath(s.file("none")).error; }, ENOENT},
                       RefusalCase{"AttributesOfNothing", [](auto &s) { return fm().attributesOfItemAtPath(s.file("none")).error; }, ENOENT}),
@@ -79,6 +82,20 @@ TEST(FileManager, AttributesOfAFile)
     ASSERT_TRUE(attrs.ok());
     EXPECT_EQ(attrs.value->size, 5);
     EXPECT_FALSE(attrs.value->isDirectory);
+}
+
+// A clone holds the same bytes, and removing it leaves the source as it was.
+TEST(FileManager, CloneHoldsTheBytesAndItsRemovalLeavesTheSource)
+{
+    test::ScratchDir scratch;
+    const QString source = scratch.write("movie.mp4", 300000);
+    const QByteArray before = fileContents(source);
+    FileManager::CloneKind kind = FileManager::CloneKind::Copy;
+    ASSERT_FALSE(fm().cloneItemAtPath(source, scratch.file("clone.mp4"), &kind).has_value());
+    EXPECT_EQ(fileContents(scratch.file("clone.mp4")), before);
+    ASSERT_FALSE(fm().removeItemAtPath(scratch.file("clone.mp4")).has_value());
+    EXPECT_EQ(fileContents(source), before);
+    EXPECT_EQ(entryNames(scratch.path()), QStringList{QStringLiteral("movie.mp4")}) << "no temporary is left";
 }
 
 TEST(FileManager, RemoveTakesADirectoryWithItsContents)
