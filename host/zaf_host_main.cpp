@@ -4,13 +4,14 @@
 //
 //   zaf-host --movie PATH --app-name NAME --bundle-id ID [--attachment PATH] [--share-message TEXT]
 //            [--tint #RRGGBB[AA]] [--extension PATH]
-//   zaf-host --open PATH [...]
+//   zaf-host --open [PATH] [...]
 //
 // --movie hands the editor the recording itself, as a recorder does: the editor's save removes it.
 // --open is how a user opens a movie of their own (the desktop entry's "Open With"): the editor gets
 // a private clone of it (a reflink, a hard link or a copy) in a folder of the user's cache that goes
 // when zaf-host ends, so the user's file is never removed or changed; the application is then the
-// editor itself unless --app-name and --bundle-id say otherwise.
+// editor itself unless --app-name and --bundle-id say otherwise. Without PATH (the editor started
+// from the desktop's menu) the user chooses the movie with the desktop's file chooser.
 //
 // Exit status: 0 after a report and a normal exit of the extension; 1 when the extension could not
 // start, died, refused the request or ended without a report; 2 for bad arguments.
@@ -21,7 +22,9 @@
 #include "platform/install_layout.h"
 #include "platform/log.h"
 
+#include <QApplication>
 #include <QCommandLineParser>
+#include <QFileDialog>
 #include <QCoreApplication>
 #include <QDir>
 #include <QFileInfo>
@@ -39,7 +42,7 @@ namespace {
 constexpr char kExtensionName[] = "zaf-video-editor-extension";
 // Who asks for the editor when a user opens a movie of their own: the editor, by its desktop entry.
 constexpr char kOwnAppName[] = "Zafrel";
-constexpr char kOwnBundleIdentifier[] = "org.zafrel.Editor";
+constexpr char kOwnBundleIdentifier[] = "com.zafrel.VideoEditor";
 // How long the extension may take to exit once its channel is closed without a report, and once
 // its view has been removed (it empties its temporary directory first).
 constexpr int kExitAfterCloseMs = 10000;
@@ -97,6 +100,30 @@ QString findExtension(const QString &given, QString *error)
     return {};
 }
 
+// `--open` and no movie among the arguments: the user is to choose one.
+bool choosesAMovie(int argc, char **argv)
+{
+    bool open = false, positional = false;
+    for (int i = 1; i < argc; ++i) {
+        const QByteArray arg(argv[i]);
+        if (arg == "--open" || arg == "-open")
+            open = true;
+        else if (arg.startsWith('-'))
+            i += arg.contains('=') ? 0 : 1; // every other option takes a value
+        else
+            positional = true;
+    }
+    return open && !positional;
+}
+
+// The movie the user chooses, or nothing when they cancel.
+QString chooseMovie()
+{
+    return QFileDialog::getOpenFileName(nullptr, QStringLiteral("Open a movie"),
+                                        QStandardPaths::writableLocation(QStandardPaths::MoviesLocation),
+                                        QStringLiteral("Movies (*.mp4 *.m4v *.mov);;All files (*)"));
+}
+
 // Clones the user's movie at *path into a new folder of the user's cache and points *path at the
 // clone; null, with *error set, when it cannot.
 std::unique_ptr<QTemporaryDir> privateClone(QString *path, QString *error)
@@ -126,7 +153,11 @@ int main(int argc, char **argv)
 {
     // A closed stdout or a vanished extension must give a write error, not kill the host.
     std::signal(SIGPIPE, SIG_IGN);
-    QCoreApplication app(argc, argv);
+    // `--open` without a movie asks for one with the desktop's file chooser, which needs the widgets
+    // of a QApplication; every other use runs without a display.
+    std::unique_ptr<QCoreApplication> application = choosesAMovie(argc, argv) ? std::make_unique<QApplication>(argc, argv)
+                                                                                : std::make_unique<QCoreApplication>(argc, argv);
+    QCoreApplication &app = *application;
     zaf::log::hideInformationalEntriesByDefault();
 
     QCommandLineParser parser;
@@ -145,8 +176,8 @@ int main(int argc, char **argv)
     const QCommandLineOption tintOption(QStringLiteral("tint"), QStringLiteral("Tint colour, #RRGGBB or #RRGGBBAA."), QStringLiteral("COLOR"));
     const QCommandLineOption extensionOption(QStringLiteral("extension"), QStringLiteral("The extension program."), QStringLiteral("PATH"));
     const QCommandLineOption openOption(QStringLiteral("open"),
-        QStringLiteral("A movie of the user's: the editor gets a private clone, and the file is never removed or changed."),
-        QStringLiteral("PATH"));
+        QStringLiteral("Open the movie given after the options as one of the user's own: the editor gets a private clone, and "
+                       "the file is never removed or changed. Without a movie, the user chooses one."));
     parser.addOptions({movieOption, appNameOption, bundleIdOption, attachmentOption, shareMessageOption, tintOption, extensionOption, openOption});
 
     if (!parser.parse(app.arguments()))
@@ -155,26 +186,32 @@ int main(int argc, char **argv)
         std::fprintf(stdout, "%s", qPrintable(parser.helpText()));
         return 0;
     }
-    if (!parser.positionalArguments().isEmpty())
-        return usage(QStringLiteral("unexpected argument: %1").arg(parser.positionalArguments().constFirst()), parser);
     const bool opening = parser.isSet(openOption);
+    const QStringList positional = parser.positionalArguments();
+    if (positional.size() > (opening ? 1 : 0))
+        return usage(QStringLiteral("unexpected argument: %1").arg(positional.constLast()), parser);
+    QString opened;
+    if (opening) {
+        opened = positional.isEmpty() ? chooseMovie() : positional.constFirst();
+        if (opened.isEmpty())
+            return 0; // the user chose nothing
+    }
     if (opening && parser.isSet(movieOption))
         return usage(QStringLiteral("--movie and --open exclude each other"), parser);
     for (const QCommandLineOption *required : {&movieOption, &appNameOption, &bundleIdOption}) {
-        if (opening && required != &movieOption && !parser.isSet(*required))
+        if (opening && !parser.isSet(*required))
             continue;
-        const QCommandLineOption &option = opening && required == &movieOption ? openOption : *required;
-        if (!parser.isSet(option) || parser.value(option).isEmpty())
-            return usage(QStringLiteral("--%1 is required").arg(option.names().constFirst()), parser);
+        if (!parser.isSet(*required) || parser.value(*required).isEmpty())
+            return usage(QStringLiteral("--%1 is required").arg(required->names().constFirst()), parser);
     }
     for (const QCommandLineOption *single : {&movieOption, &appNameOption, &bundleIdOption, &attachmentOption, &shareMessageOption,
-                                             &tintOption, &extensionOption, &openOption}) {
+                                             &tintOption, &extensionOption}) {
         if (parser.values(*single).size() > 1)
             return usage(QStringLiteral("--%1 is given more than once").arg(single->names().constFirst()), parser);
     }
 
     zaf::host::RecordingDetails details;
-    const QString given = parser.value(opening ? openOption : movieOption);
+    const QString given = opening ? opened : parser.value(movieOption);
     details.moviePath = QFileInfo(given).absoluteFilePath();
     details.appName = parser.isSet(appNameOption) ? parser.value(appNameOption) : QString::fromLatin1(kOwnAppName);
     details.bundleIdentifier = parser.isSet(bundleIdOption) ? parser.value(bundleIdOption) : QString::fromLatin1(kOwnBundleIdentifier);

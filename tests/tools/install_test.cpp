@@ -14,6 +14,8 @@
 
 #include <gtest/gtest.h>
 
+#include <vector>
+
 namespace zaf::test {
 namespace {
 
@@ -69,7 +71,10 @@ INSTANTIATE_TEST_SUITE_P(
                       InstalledFile{"AgentLibrary", "lib/zafrel/libzaf_publishing_agent.so", false},
                       InstalledFile{"PublishingPlugin", "lib/zafrel/plugins/libzaf_publishing_plugin.so", false},
                       InstalledFile{"FrameworkStrings", "share/zafrel/Zafrel/en.lproj/Localizable.mo", false},
-                      InstalledFile{"PhotoLibraryStrings", "share/zafrel/ZafPhotoLibrary/de.lproj/PhotoLibrary.mo", false}),
+                      InstalledFile{"PhotoLibraryStrings", "share/zafrel/ZafPhotoLibrary/de.lproj/PhotoLibrary.mo", false},
+                      InstalledFile{"DesktopEntry", "share/applications/com.zafrel.VideoEditor.desktop", false},
+                      InstalledFile{"Metainfo", "share/metainfo/com.zafrel.VideoEditor.metainfo.xml", false},
+                      InstalledFile{"Icon", "share/icons/hicolor/scalable/apps/com.zafrel.VideoEditor.svg", false}),
     caseName);
 
 struct PrefixCase {
@@ -103,6 +108,47 @@ INSTANTIATE_TEST_SUITE_P(Places, InstallPrefixTest,
                                            PrefixCase{"BinWithoutOurData", "usr/bin/zaf-host", false, nullptr},
                                            PrefixCase{"BuildTree", "usr/host/zaf-host", true, nullptr}),
                          caseName);
+
+struct ValidatorCase {
+    const char *name;
+    const char *program;
+    std::vector<const char *> options;
+    const char *path; // under the prefix
+};
+
+class InstalledDescriptionTest : public ::testing::TestWithParam<ValidatorCase> {};
+
+// The desktop entry and the metainfo pass the desktop's own validators, and the entry opens movies
+// with the installed zaf-host.
+TEST_P(InstalledDescriptionTest, PassesItsValidator)
+{
+    const ValidatorCase &c = GetParam();
+    if (QStandardPaths::findExecutable(QLatin1String(c.program)).isEmpty())
+        GTEST_SKIP() << c.program << " is not installed";
+    ASSERT_FALSE(installedPrefix().isEmpty());
+    QStringList args;
+    for (const char *option : c.options)
+        args << QLatin1String(option);
+    const QString path = QDir(installedPrefix()).filePath(QLatin1String(c.path));
+    const ChildRun check = runChild(QLatin1String(c.program), args << path);
+    EXPECT_TRUE(check.ok()) << check.out.toStdString() << check.err.toStdString();
+}
+
+INSTANTIATE_TEST_SUITE_P(Validators, InstalledDescriptionTest,
+                         ::testing::Values(ValidatorCase{"DesktopEntry", "desktop-file-validate", {}, "share/applications/com.zafrel.VideoEditor.desktop"},
+                                           ValidatorCase{"Metainfo", "appstreamcli", {"validate", "--no-net"}, "share/metainfo/com.zafrel.VideoEditor.metainfo.xml"}),
+                         caseName);
+
+TEST(InstalledPrograms, DesktopEntryOpensMoviesWithTheInstalledHost)
+{
+    ASSERT_FALSE(installedPrefix().isEmpty());
+    QFile entry(QDir(installedPrefix()).filePath(QStringLiteral("share/applications/com.zafrel.VideoEditor.desktop")));
+    ASSERT_TRUE(entry.open(QIODevice::ReadOnly));
+    const QString text = QString::fromUtf8(entry.readAll());
+    EXPECT_TRUE(text.contains(QStringLiteral("\nExec=") + QDir(installedPrefix()).filePath(QStringLiteral("bin/zaf-host")) + QStringLiteral(" --open %f\n")))
+        << text.toStdString();
+    EXPECT_TRUE(text.contains(QStringLiteral("\nMimeType=video/mp4;video/quicktime;\n"))) << text.toStdString();
+}
 
 // The installed media tool reads a movie from any folder, with nothing set.
 TEST(InstalledPrograms, MediaToolProbesAMovie)
