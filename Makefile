@@ -10,7 +10,7 @@ BUILD_DIR := build-$(SANITIZE)
 BUILD_TYPE := RelWithDebInfo
 endif
 
-.PHONY: all deps configure build run test sanitizer-job fuzz bench clean
+.PHONY: all deps configure build run test sanitizer-job fuzz bench package clean
 
 all: build
 
@@ -29,6 +29,10 @@ TEST_ENV = QT_QPA_PLATFORM=offscreen \
   TSAN_OPTIONS="suppressions=$(CURDIR)/scripts/tsan.supp $(TSAN_OPTIONS)" \
   LSAN_OPTIONS="suppressions=$(CURDIR)/scripts/lsan.supp $(LSAN_OPTIONS)" \
   UBSAN_OPTIONS="halt_on_error=1:print_stacktrace=1 $(UBSAN_OPTIONS)"
+
+# A Debian package (build/zafrel_VERSION_ARCH.deb) of the installed layout.
+package: build
+	@cd $(BUILD_DIR) && cpack
 
 test: build
 	@cd $(BUILD_DIR) && $(TEST_ENV) ctest --output-on-failure -j2 --timeout 600
