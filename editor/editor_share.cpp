@@ -90,11 +90,13 @@ bool ZafVideoEditorViewController::offersPublishingActivity()
     if (serviceExtensionInstalled)
         return false;
     // Only a plug-in that loads, has our API version and has the agent class counts: a mere file at
-    // the plug-in's place would offer an action that cannot run. The answer is cached per process
-    // (see publishingAgentClass), so the plug-in is loaded once, at the first share.
-    return zaf::publishing::publishingAgentClass(zaf::publishing::defaultPublishingPluginPath(),
-                                                 QLatin1String(kZafYouTubePublishingAgentClassName))
-        .ok();
+    // the plug-in's place would offer an action that cannot run. The plug-in is loaded once per
+    // process (see publishingAgentClass), at the first share. And only a plug-in that can sign in:
+    // without an OAuth client set up, publishing could only fail.
+    const QString path = zaf::publishing::defaultPublishingPluginPath();
+    const auto plugin = zaf::publishing::loadPublishingPlugin(path);
+    return plugin.ok() && zaf::publishing::publishingAgentClass(path, QLatin1String(kZafYouTubePublishingAgentClassName)).ok()
+        && plugin.value->canSignIn();
 }
 
 void ZafVideoEditorViewController::presentShareSheet(const QVariantList &items, const QUrl &movieURL)

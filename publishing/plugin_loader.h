@@ -30,8 +30,8 @@ PluginLookup<ZafPublishingPluginInterface> loadPublishingPlugin(const QString &p
 // for a path and class loads the plug-in, every later one is a hash probe. So whether the share sheet
 // offers publishing is decided once per process, and a plug-in put in place later is not seen.
 PluginLookup<const QMetaObject> publishingAgentClass(const QString &path, const QString &className);
-// The plug-in's usual place: <directory of the executable>/publishing/plugin/<kZafPublishingPluginFileName>
-// unless $ZAF_PUBLISHING_PLUGIN names another file.
+// The plug-in's place: $ZAF_PUBLISHING_PLUGIN_PATH when set, else PREFIX/lib/zafrel/plugins/ of an
+// installed program, else the build tree's publishing/plugin/ (platform/install_layout.h).
 QString defaultPublishingPluginPath();
 
 } // namespace zaf::publishing

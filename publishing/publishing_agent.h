@@ -67,6 +67,10 @@ public:
     // The routine gets the form object; an empty function restores the form's own routine.
     // Main thread only.
     virtual void setFormDefaultCategoryRoutine(std::function<void(QObject *form)> routine) = 0;
+    // True when publishing can sign in without the user setting anything up first: an OAuth client
+    // is configured (a kept sign-in needs one too) or an access token is given. The share sheet
+    // offers publishing only then. Any thread.
+    virtual bool canSignIn() const = 0;
 };
 
 // The names by which the activity reaches the plug-in's form and agent at run time: the form's and
@@ -92,6 +96,6 @@ inline constexpr const char *kZafPublishingCategoryLabelKey = "label";
 inline constexpr const char *kZafPublishingPluginFileName = "libzaf_publishing_plugin.so";
 inline constexpr const char *kZafYouTubePublishingAgentClassName = "ZafYouTubePublishingAgent";
 
-inline constexpr int kZafPublishingPluginApiVersion = 2;
-#define ZafPublishingPluginInterface_iid "com.zafrel.VideoPublisher/2"
+inline constexpr int kZafPublishingPluginApiVersion = 3;
+#define ZafPublishingPluginInterface_iid "com.zafrel.VideoPublisher/3"
 Q_DECLARE_INTERFACE(ZafPublishingPluginInterface, ZafPublishingPluginInterface_iid)

@@ -1,5 +1,6 @@
 #include "publishing/plugin/publishing_plugin.h"
 
+#include "publishing/plugin/signin/youtube_client.h"
 #include "publishing/plugin/youtube_publishing_agent.h"
 #include "publishing/plugin/youtube_publishing_form.h"
 
@@ -18,4 +19,9 @@ void ZafPublishingPlugin::setFormDefaultCategoryRoutine(std::function<void(QObje
     }
     ZafYouTubePublishingForm::setDefaultCategoryRoutine(
         [routine = std::move(routine)](ZafYouTubePublishingForm *form) { routine(form); });
+}
+
+bool ZafPublishingPlugin::canSignIn() const
+{
+    return zaf::publishing::configuredYouTubeClient().has_value() || !qEnvironmentVariable("ZAF_YOUTUBE_ACCESS_TOKEN").trimmed().isEmpty();
 }

@@ -17,4 +17,5 @@ public:
     int apiVersion() const override { return kZafPublishingPluginApiVersion; }
     const QMetaObject *agentClassNamed(const QString &className) const override;
     void setFormDefaultCategoryRoutine(std::function<void(QObject *form)> routine) override;
+    bool canSignIn() const override;
 };

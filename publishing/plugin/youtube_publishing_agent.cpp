@@ -3,6 +3,8 @@
 #include "platform/log.h"
 #include "platform/ui/bar_button_item.h"
 #include "platform/ui/toolbar.h"
+#include "publishing/plugin/signin/refresh_token_store.h"
+#include "publishing/plugin/signin/youtube_client.h"
 #include "publishing/plugin/youtube_publishing_form.h"
 
 #include <QDesktopServices>
@@ -174,11 +176,12 @@ void ZafYouTubePublishingAgent::beginPublishing()
 
 void ZafYouTubePublishingAgent::authorizeAndUpload()
 {
-    const QString clientId = environment("ZAF_YOUTUBE_CLIENT_ID");
-    if (clientId.isEmpty()) {
+    const std::optional<zaf::publishing::YouTubeClient> client = zaf::publishing::configuredYouTubeClient();
+    if (!client) {
         finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), NoClientIdError,
-                                    QStringLiteral("Publishing to YouTube needs an OAuth client id in "
-                                                   "ZAF_YOUTUBE_CLIENT_ID.")});
+                                    QStringLiteral("Publishing to YouTube needs an OAuth client: run zaf-youtube-setup, "
+                                                   "or write its id and secret into %1.")
+                                        .arg(zaf::publishing::youTubeClientSettingsPath())});
         return;
     }
     if (m_oauth && !m_oauth->token().isEmpty()) {
@@ -186,12 +189,12 @@ void ZafYouTubePublishingAgent::authorizeAndUpload()
         return;
     }
     if (!m_oauth) {
-        m_oauth = new QOAuth2AuthorizationCodeFlow(clientId, QUrl(QString::fromLatin1(kAuthorizationUrl)),
+        m_clientId = client->id;
+        m_oauth = new QOAuth2AuthorizationCodeFlow(client->id, QUrl(QString::fromLatin1(kAuthorizationUrl)),
                                                    QUrl(QString::fromLatin1(kTokenUrl)), m_network, this);
         m_oauth->setScope(QString::fromLatin1(kUploadScope));
-        const QString secret = environment("ZAF_YOUTUBE_CLIENT_SECRET");
-        if (!secret.isEmpty())
-            m_oauth->setClientIdentifierSharedKey(secret);
+        if (!client->secret.isEmpty())
+            m_oauth->setClientIdentifierSharedKey(client->secret);
         auto *replyHandler = new QOAuthHttpServerReplyHandler(QHostAddress(QHostAddress::LocalHost), 0, m_oauth);
         m_oauth->setReplyHandler(replyHandler);
         connect(m_oauth, &QOAuth2AuthorizationCodeFlow::authorizeWithBrowser, this, [](const QUrl &url) {
@@ -200,8 +203,21 @@ void ZafYouTubePublishingAgent::authorizeAndUpload()
         });
         connect(m_oauth, &QOAuth2AuthorizationCodeFlow::granted, this, [this] {
             m_signInTimer->stop();
+            m_refreshing = false;
+            // Kept in the secret store, so the next publish needs no browser.
+            if (!m_oauth->refreshToken().isEmpty())
+                zaf::publishing::storeRefreshToken(m_clientId, m_oauth->refreshToken());
             if (m_publishing && !(m_upload && m_upload->isRunning()))
                 startUpload(m_oauth->token());
+        });
+        // A kept sign-in the service no longer accepts (revoked, expired): sign in in the browser.
+        connect(m_oauth, &QAbstractOAuth::statusChanged, this, [this](QAbstractOAuth::Status status) {
+            if (m_refreshing && status == QAbstractOAuth::Status::NotAuthenticated && m_publishing) {
+                m_refreshing = false;
+                zaf::log::info(lcPublishingAgent(), QStringLiteral("The kept sign-in was refused; signing in in the browser"));
+                zaf::publishing::forgetRefreshToken(m_clientId);
+                m_oauth->grant();
+            }
         });
         connect(m_oauth, &QOAuth2AuthorizationCodeFlow::error, this,
                 [this](const QString &error, const QString &description, const QUrl &) {
@@ -219,7 +235,19 @@ void ZafYouTubePublishingAgent::authorizeAndUpload()
         }
     }
     m_signInTimer->start(m_signInTimeoutMs);
-    m_oauth->grant();
+    // A sign-in kept from an earlier publish is refreshed without the browser.
+    QPointer<ZafYouTubePublishingAgent> self(this);
+    zaf::publishing::readRefreshToken(m_clientId, [self](const QString &refreshToken) {
+        if (!self || !self->m_publishing || !self->m_oauth)
+            return;
+        if (refreshToken.isEmpty()) {
+            self->m_oauth->grant();
+            return;
+        }
+        self->m_refreshing = true;
+        self->m_oauth->setRefreshToken(refreshToken);
+        self->m_oauth->refreshAccessToken();
+    });
 }
 
 void ZafYouTubePublishingAgent::abandonSignIn()

@@ -4,10 +4,12 @@
 // Cancel, Publish and Done on its toolbar, and the upload of the media file with the form's values.
 //
 // Publishing: the access token comes from $ZAF_YOUTUBE_ACCESS_TOKEN when it is set, otherwise from an
-// OAuth 2.0 authorization code flow in the browser with a loopback (127.0.0.1) redirect, for the
-// client id in $ZAF_YOUTUBE_CLIENT_ID (and the optional $ZAF_YOUTUBE_CLIENT_SECRET). Without a client
-// id, publishing ends at once with an error. Tokens are kept in memory only. The service's base URL
-// is $ZAF_YOUTUBE_API_BASE (default https://www.googleapis.com).
+// OAuth 2.0 authorization code flow for the client the user set up (signin/youtube_client.h): a
+// refresh token kept in the desktop's secret store from an earlier sign-in is refreshed without the
+// browser; otherwise (or when the service refuses it) the sign-in runs in the browser with a loopback
+// (127.0.0.1) redirect, and its refresh token is kept for next time. Without a client, publishing
+// ends at once with an error. The service's base URL is $ZAF_YOUTUBE_API_BASE (default
+// https://www.googleapis.com).
 //
 // The browser sign-in is given signInTimeoutMs (five minutes unless set otherwise): a sign-in the
 // person abandons in the browser then ends publishing with an error, and its loopback listener is
@@ -100,6 +102,8 @@ private:
     QNetworkAccessManager *m_network;
     zaf::publishing::ResumableUpload *m_upload = nullptr;
     QOAuth2AuthorizationCodeFlow *m_oauth = nullptr;
+    QString m_clientId;      // the client m_oauth signs in with
+    bool m_refreshing = false; // m_oauth is refreshing a kept sign-in
     QTimer *m_signInTimer;
     int m_signInTimeoutMs = kDefaultSignInTimeoutMs;
     qint64 m_chunkSize = zaf::publishing::ResumableUpload::kDefaultChunkSize;

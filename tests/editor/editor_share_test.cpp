@@ -35,6 +35,14 @@ protected:
         QDir().mkpath(scratch.file(QStringLiteral("catalogue")));
         qputenv("XDG_DATA_HOME", QFile::encodeName(scratch.file(QStringLiteral("data"))));
         qputenv("XDG_DATA_DIRS", QFile::encodeName(scratch.file(QStringLiteral("none"))));
+        // Publishing can sign in with a client given in the environment; none set up on the machine counts.
+        qputenv("XDG_CONFIG_HOME", QFile::encodeName(scratch.file(QStringLiteral("config"))));
+        qputenv("ZAF_YOUTUBE_CLIENT_ID", "test-client");
+    }
+    void TearDown() override
+    {
+        qunsetenv("ZAF_YOUTUBE_CLIENT_ID");
+        qunsetenv("ZAF_YOUTUBE_ACCESS_TOKEN");
     }
     // The built plug-in at its default place.
     void installPlugin() { qunsetenv("ZAF_PUBLISHING_PLUGIN_PATH"); }
@@ -78,7 +86,7 @@ TEST_F(EditorShareTest, ItemsFollowTheOverrideMessageOrTheStoreRecord)
 // Only a plug-in that loads and has the agent class offers publishing: a file at the plug-in's place
 // that is no plug-in (garbage, a library that is no plug-in) is not offered, and asking does not
 // stop the process.
-TEST_F(EditorShareTest, PublishingIsOfferedOnlyWithALoadablePluginAndWithoutTheServicesOwnExtension)
+TEST_F(EditorShareTest, PublishingIsOfferedOnlyWithALoadablePluginThatCanSignInAndWithoutTheServicesOwnExtension)
 {
     const QString builtPlugin = zaf::publishing::defaultPublishingPluginPath();
     const struct {
@@ -96,6 +104,17 @@ TEST_F(EditorShareTest, PublishingIsOfferedOnlyWithALoadablePluginAndWithoutTheS
     }
     installPlugin();
     EXPECT_TRUE(ZafVideoEditorViewController::offersPublishingActivity());
+    qunsetenv("ZAF_YOUTUBE_CLIENT_ID");
+    EXPECT_FALSE(ZafVideoEditorViewController::offersPublishingActivity()) << "without a client publishing could only fail";
+    QDir().mkpath(scratch.file(QStringLiteral("config/zafrel")));
+    QFile settings(scratch.file(QStringLiteral("config/zafrel/youtube-client.ini")));
+    ASSERT_TRUE(settings.open(QIODevice::WriteOnly));
+    settings.write("[client]\nid=1234-abcd.apps.googleusercontent.com\nsecret=s\n");
+    settings.close();
+    EXPECT_TRUE(ZafVideoEditorViewController::offersPublishingActivity()) << "a client the user set up";
+    QFile::remove(settings.fileName());
+    qputenv("ZAF_YOUTUBE_ACCESS_TOKEN", "token");
+    EXPECT_TRUE(ZafVideoEditorViewController::offersPublishingActivity()) << "an access token given";
     installServiceExtension(false);
     EXPECT_TRUE(ZafVideoEditorViewController::offersPublishingActivity()) << "a disabled extension does not count";
     installServiceExtension(true);

@@ -11,6 +11,7 @@
 
 #include <gtest/gtest.h>
 
+#include <QFile>
 #include <QVariantMap>
 
 #include <memory>
@@ -56,11 +57,14 @@ class PublishingAgentTest : public ::testing::Test {
 protected:
     void SetUp() override
     {
+        // No client the user set up on this machine, and none kept, leaks in.
+        qputenv("XDG_CONFIG_HOME", QFile::encodeName(m_config.path()));
         m_agent = makeAgent();
         ASSERT_NE(m_agent, nullptr);
         m_agent->setDelegate(&m_delegate);
     }
 
+    zaf::test::ScratchDir m_config;
     std::unique_ptr<ZafPublishingAgent> m_agent;
     RecordingDelegate m_delegate;
 };
@@ -214,7 +218,7 @@ TEST_F(PublishingAgentTest, WithoutCredentialsPublishingEndsAtOnceWithAnError)
     qunsetenv("ZAF_YOUTUBE_API_BASE");
     EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("begin"), QStringLiteral("end")}));
     ASSERT_TRUE(m_delegate.error.has_value());
-    EXPECT_TRUE(m_delegate.error->message.contains(QLatin1String("ZAF_YOUTUBE_CLIENT_ID")));
+    EXPECT_TRUE(m_delegate.error->message.contains(QLatin1String("zaf-youtube-setup"))) << m_delegate.error->message.toStdString();
 }
 
 // Cancel during the browser sign-in ends it quietly: no end of publishing, even after the time
@@ -225,7 +229,8 @@ TEST_F(PublishingAgentTest, CancelEndsASignInQuietly)
     m_agent->setMediaPath(QStringLiteral("/nonexistent/movie.mp4"));
     ASSERT_TRUE(m_agent->setProperty("signInTimeoutMs", 100));
     ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "publishAction"));
-    ASSERT_EQ(signIn.browser.opened.size(), 1);
+    // The browser opens once the secret store has said it keeps no sign-in.
+    ASSERT_TRUE(zaf::test::waitUntil([&] { return signIn.browser.opened.size() == 1; }, 10000));
     EXPECT_EQ(signIn.browser.opened.first().host(), QStringLiteral("accounts.google.com"));
     const quint16 port = signIn.browser.redirectPort();
     ASSERT_NE(port, 0);
@@ -234,7 +239,7 @@ TEST_F(PublishingAgentTest, CancelEndsASignInQuietly)
     zaf::test::waitUntil([] { return false; }, 300);
     EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("begin"), QStringLiteral("cancel")}));
     ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "publishAction"));
-    EXPECT_EQ(signIn.browser.opened.size(), 2);
+    EXPECT_TRUE(zaf::test::waitUntil([&] { return signIn.browser.opened.size() == 2; }, 10000));
 }
 
 // A sign-in abandoned in the browser ends publishing with an error after the agent's limit, and
@@ -245,6 +250,7 @@ TEST_F(PublishingAgentTest, AnAbandonedSignInEndsAfterItsLimit)
     m_agent->setMediaPath(QStringLiteral("/nonexistent/movie.mp4"));
     ASSERT_TRUE(m_agent->setProperty("signInTimeoutMs", 100));
     ASSERT_TRUE(QMetaObject::invokeMethod(m_agent.get(), "publishAction"));
+    ASSERT_TRUE(zaf::test::waitUntil([&] { return signIn.browser.opened.size() == 1; }, 10000));
     const quint16 port = signIn.browser.redirectPort();
     ASSERT_TRUE(zaf::test::waitUntil([this] { return m_delegate.events.size() == 2; }, 5000));
     EXPECT_EQ(m_delegate.events, (QStringList{QStringLiteral("begin"), QStringLiteral("end")}));

@@ -67,6 +67,7 @@ INSTANTIATE_TEST_SUITE_P(
     Layout, InstalledFileTest,
     ::testing::Values(InstalledFile{"Host", "bin/zaf-host", true}, InstalledFile{"MediaTool", "bin/zaf-media", true},
                       InstalledFile{"TempStoreTool", "bin/zaf-tempstore", true}, InstalledFile{"IdentityTool", "bin/zaf-identity", true},
+                      InstalledFile{"YouTubeSetupTool", "bin/zaf-youtube-setup", true},
                       InstalledFile{"Extension", "libexec/zafrel/zaf-video-editor-extension", true},
                       InstalledFile{"AgentLibrary", "lib/zafrel/libzaf_publishing_agent.so", false},
                       InstalledFile{"PublishingPlugin", "lib/zafrel/plugins/libzaf_publishing_plugin.so", false},
@@ -148,6 +149,34 @@ TEST(InstalledPrograms, DesktopEntryOpensMoviesWithTheInstalledHost)
     EXPECT_TRUE(text.contains(QStringLiteral("\nExec=") + QDir(installedPrefix()).filePath(QStringLiteral("bin/zaf-host")) + QStringLiteral(" --open %f\n")))
         << text.toStdString();
     EXPECT_TRUE(text.contains(QStringLiteral("\nMimeType=video/mp4;video/quicktime;\n"))) << text.toStdString();
+}
+
+// The setup tool writes the OAuth client into the user's settings, readable by the user alone,
+// replaces it when run again, refuses a malformed id without losing the one set up, and says what
+// is set up.
+TEST(InstalledPrograms, YouTubeSetupKeepsTheClientInTheUsersSettings)
+{
+    ASSERT_FALSE(installedPrefix().isEmpty());
+    ScratchDir config;
+    ChildOptions options;
+    options.environment = userEnvironment() << QStringLiteral("XDG_CONFIG_HOME=") + config.path();
+    const QString tool = QDir(installedPrefix()).filePath(QStringLiteral("bin/zaf-youtube-setup"));
+    const QString settings = config.file(QStringLiteral("zafrel/youtube-client.ini"));
+    auto setup = [&](const QStringList &args) { return runChild(tool, args, options); };
+
+    EXPECT_TRUE(setup({QStringLiteral("--client-id"), QStringLiteral("old.apps.googleusercontent.com")}).ok());
+    const ChildRun written = setup({QStringLiteral("--client-id"), QStringLiteral("1234-abcd.apps.googleusercontent.com"),
+                                    QStringLiteral("--client-secret"), QStringLiteral("GOCSPX-secret")});
+    ASSERT_TRUE(written.ok()) << written.err.toStdString();
+    EXPECT_EQ(QFileInfo(settings).permissions() & (QFileDevice::ReadGroup | QFileDevice::ReadOther | QFileDevice::WriteGroup | QFileDevice::WriteOther),
+              QFileDevice::Permissions());
+    const ChildRun refused = setup({QStringLiteral("--client-id"), QStringLiteral("not an id")});
+    EXPECT_EQ(refused.exitCode, 1);
+    const ChildRun shown = setup({});
+    ASSERT_TRUE(shown.ok()) << shown.err.toStdString();
+    EXPECT_TRUE(shown.out.contains("1234-abcd.apps.googleusercontent.com (with a secret)")) << shown.out.toStdString();
+    EXPECT_EQ(QDir(config.file(QStringLiteral("zafrel"))).entryList(QDir::Files | QDir::Hidden), QStringList{QStringLiteral("youtube-client.ini")})
+        << "no temporary is left";
 }
 
 // The installed media tool reads a movie from any folder, with nothing set.
