@@ -70,6 +70,22 @@ OptionalError copyFileData(int in, int out, const QString &from, const QString &
     }
 }
 
+// Opens a regular file for reading; EINVAL for anything else (a directory, a device).
+OptionalError openRegularFile(const QString &path, int *fd)
+{
+    const int in = retrying([&] { return ::open(encoded(path).constData(), O_RDONLY | O_CLOEXEC); });
+    if (in < 0)
+        return Error::fromErrno(errno, path);
+    struct stat st;
+    const int statError = ::fstat(in, &st) != 0 ? errno : (S_ISREG(st.st_mode) ? 0 : EINVAL);
+    if (statError != 0) {
+        ::close(in);
+        return Error::fromErrno(statError, path);
+    }
+    *fd = in;
+    return std::nullopt;
+}
+
 } // namespace
 
 FileManager::~FileManager() = default;
@@ -171,15 +187,9 @@ OptionalError FileManager::moveItemAtPath(const QString &from, const QString &to
 
 OptionalError FileManager::copyItemAtPath(const QString &from, const QString &to) const
 {
-    const int in = retrying([&] { return ::open(encoded(from).constData(), O_RDONLY | O_CLOEXEC); });
-    if (in < 0)
-        return Error::fromErrno(errno, from);
-    struct stat st;
-    const int statError = ::fstat(in, &st) != 0 ? errno : (S_ISREG(st.st_mode) ? 0 : EINVAL);
-    if (statError != 0) {
-        ::close(in);
-        return Error::fromErrno(statError, from);
-    }
+    int in = -1;
+    if (OptionalError e = openRegularFile(from, &in))
+        return e;
     Result<std::unique_ptr<AtomicFile>> out = AtomicFile::create(to);
     if (!out.ok()) {
         ::close(in);
@@ -194,15 +204,9 @@ OptionalError FileManager::copyItemAtPath(const QString &from, const QString &to
 OptionalError FileManager::cloneItemAtPath(const QString &from, const QString &to, CloneKind *kind) const
 {
     CloneKind made = CloneKind::Copy;
-    const int in = retrying([&] { return ::open(encoded(from).constData(), O_RDONLY | O_CLOEXEC); });
-    if (in < 0)
-        return Error::fromErrno(errno, from);
-    struct stat st;
-    const int statError = ::fstat(in, &st) != 0 ? errno : (S_ISREG(st.st_mode) ? 0 : EINVAL);
-    if (statError != 0) {
-        ::close(in);
-        return Error::fromErrno(statError, from);
-    }
+    int in = -1;
+    if (OptionalError e = openRegularFile(from, &in))
+        return e;
     OptionalError failure;
     {
         Result<std::unique_ptr<AtomicFile>> out = AtomicFile::create(to);
