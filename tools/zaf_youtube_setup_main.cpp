@@ -3,6 +3,8 @@
 //
 //   zaf-youtube-setup --client-id ID [--client-secret SECRET]   writes the user's settings file
 //   zaf-youtube-setup --forget-sign-in                           removes the kept sign-in
+//   zaf-youtube-setup --check-secret-store                       keeps, reads back and forgets a probe
+//                                                                entry: whether sign-ins can be kept
 //   zaf-youtube-setup                                            says where the settings are, and what they hold
 //
 // Exit status: 0 when done, 1 when the settings or the secret store refused, 2 for bad arguments.
@@ -18,6 +20,39 @@
 
 using namespace zaf::publishing;
 
+namespace {
+
+// Keeps a probe entry, reads it back and forgets it, as a publish keeps, reads and forgets a sign-in.
+int checkSecretStore(QCoreApplication &app)
+{
+    const QString probeClient = QStringLiteral("zafrel-secret-store-check");
+    const QString probe = QStringLiteral("probe-%1").arg(QCoreApplication::applicationPid());
+    int status = 1;
+    storeRefreshToken(probeClient, probe, [&](zaf::OptionalError stored) {
+        if (stored) {
+            std::fprintf(stderr, "zaf-youtube-setup: the secret store cannot keep sign-ins: %s\n", qPrintable(stored->description()));
+            app.quit();
+            return;
+        }
+        readRefreshToken(probeClient, [&](const QString &read) {
+            forgetRefreshToken(probeClient, [&, read](zaf::OptionalError forgotten) {
+                if (read != probe)
+                    std::fprintf(stderr, "zaf-youtube-setup: the secret store gave back something else than it was given\n");
+                else if (forgotten)
+                    std::fprintf(stderr, "zaf-youtube-setup: the secret store cannot forget: %s\n", qPrintable(forgotten->description()));
+                else
+                    std::printf("The secret store keeps sign-ins.\n");
+                status = read == probe && !forgotten ? 0 : 1;
+                app.quit();
+            });
+        });
+    });
+    app.exec();
+    return status;
+}
+
+} // namespace
+
 int main(int argc, char **argv)
 {
     QCoreApplication app(argc, argv);
@@ -28,7 +63,9 @@ int main(int argc, char **argv)
     const QCommandLineOption idOption(QStringLiteral("client-id"), QStringLiteral("The OAuth client's id."), QStringLiteral("ID"));
     const QCommandLineOption secretOption(QStringLiteral("client-secret"), QStringLiteral("The OAuth client's secret."), QStringLiteral("SECRET"));
     const QCommandLineOption forgetOption(QStringLiteral("forget-sign-in"), QStringLiteral("Forget the sign-in kept for the client."));
-    parser.addOptions({idOption, secretOption, forgetOption});
+    const QCommandLineOption checkOption(QStringLiteral("check-secret-store"),
+                                         QStringLiteral("Check that the desktop's secret store can keep a sign-in."));
+    parser.addOptions({idOption, secretOption, forgetOption, checkOption});
     parser.process(app);
     if (!parser.positionalArguments().isEmpty() || (parser.isSet(secretOption) && !parser.isSet(idOption))) {
         std::fprintf(stderr, "%s", qPrintable(parser.helpText()));
@@ -43,6 +80,8 @@ int main(int argc, char **argv)
         std::printf("The client is set up in %s.\n", qPrintable(youTubeClientSettingsPath()));
         return 0;
     }
+    if (parser.isSet(checkOption))
+        return checkSecretStore(app);
     const std::optional<YouTubeClient> client = configuredYouTubeClient();
     if (parser.isSet(forgetOption)) {
         if (!client) {

@@ -179,6 +179,51 @@ TEST(InstalledPrograms, YouTubeSetupKeepsTheClientInTheUsersSettings)
         << "no temporary is left";
 }
 
+struct SecretStoreCase {
+    const char *name;
+    bool withKeyring; // a session bus with gnome-keyring's Secret Service, unlocked
+    int status;
+    const char *says;
+};
+
+class SecretStoreTest : public ::testing::TestWithParam<SecretStoreCase> {};
+
+// A sign-in is kept, read back and forgotten through the desktop's secret store when there is one,
+// and without one the setup tool says so rather than pretending.
+TEST_P(SecretStoreTest, SetupToolTellsWhetherSignInsCanBeKept)
+{
+    const SecretStoreCase &c = GetParam();
+    if (c.withKeyring) {
+        for (const char *tool : {"dbus-run-session", "gnome-keyring-daemon"}) {
+            if (QStandardPaths::findExecutable(QLatin1String(tool)).isEmpty())
+                GTEST_SKIP() << tool << " is not installed";
+        }
+    }
+    ASSERT_FALSE(installedPrefix().isEmpty());
+    ScratchDir home;
+    ChildOptions options;
+    QStringList environment;
+    for (const QString &entry : userEnvironment()) {
+        if (!entry.startsWith(QLatin1String("DBUS_SESSION_BUS_ADDRESS=")) && !entry.startsWith(QLatin1String("DISPLAY="))
+            && !entry.startsWith(QLatin1String("HOME=")) && !entry.startsWith(QLatin1String("XDG_")))
+            environment << entry;
+    }
+    options.environment = environment << QStringLiteral("HOME=") + home.path();
+    const QString tool = QDir(installedPrefix()).filePath(QStringLiteral("bin/zaf-youtube-setup"));
+    const ChildRun check = c.withKeyring
+        ? runChild(QStringLiteral("dbus-run-session"), {QStringLiteral("--"), QStringLiteral("sh"), QStringLiteral("-c"),
+                   QStringLiteral("echo -n pw | gnome-keyring-daemon --unlock --components=secrets >/dev/null 2>&1; exec \"$0\" --check-secret-store"),
+                   tool}, options)
+        : runChild(tool, {QStringLiteral("--check-secret-store")}, options);
+    EXPECT_EQ(check.exitCode, c.status) << check.out.toStdString() << check.err.toStdString();
+    EXPECT_TRUE((check.out + check.err).contains(c.says)) << check.out.toStdString() << check.err.toStdString();
+}
+
+INSTANTIATE_TEST_SUITE_P(Stores, SecretStoreTest,
+                         ::testing::Values(SecretStoreCase{"NoSecretService", false, 1, "cannot keep sign-ins"},
+                                           SecretStoreCase{"GnomeKeyring", true, 0, "The secret store keeps sign-ins."}),
+                         caseName);
+
 // The installed media tool reads a movie from any folder, with nothing set.
 TEST(InstalledPrograms, MediaToolProbesAMovie)
 {
