@@ -108,6 +108,8 @@ bool choosesAMovie(int argc, char **argv)
         const QByteArray arg(argv[i]);
         if (arg == "--open" || arg == "-open")
             open = true;
+        else if (arg == "--help" || arg == "-h" || arg == "--help-all")
+            return false; // the help is printed, nothing is opened
         else if (arg.startsWith('-'))
             i += arg.contains('=') ? 0 : 1; // every other option takes a value
         else
