@@ -18,7 +18,7 @@
 
 #include "host/extension_session.h"
 #include "host/host_log.h"
-#include "platform/files/file_manager.h"
+#include "host/private_clone.h"
 #include "platform/install_layout.h"
 #include "platform/log.h"
 
@@ -31,7 +31,6 @@
 #include <QJsonArray>
 #include <QJsonDocument>
 #include <QStandardPaths>
-#include <QTemporaryDir>
 #include <QTimer>
 
 #include <csignal>
@@ -126,29 +125,6 @@ QString chooseMovie()
                                         QStringLiteral("Movies (*.mp4 *.m4v *.mov);;All files (*)"));
 }
 
-// Clones the user's movie at *path into a new folder of the user's cache and points *path at the
-// clone; null, with *error set, when it cannot.
-std::unique_ptr<QTemporaryDir> privateClone(QString *path, QString *error)
-{
-    const QString cache = QStandardPaths::writableLocation(QStandardPaths::GenericCacheLocation);
-    QDir().mkpath(cache);
-    auto folder = std::make_unique<QTemporaryDir>(QDir(cache).filePath(QStringLiteral("zafrel-open-XXXXXX")));
-    if (!folder->isValid()) {
-        *error = QStringLiteral("cannot make a folder for the editor's copy in %1: %2").arg(cache, folder->errorString());
-        return nullptr;
-    }
-    const QString clone = folder->filePath(QFileInfo(*path).fileName());
-    zaf::FileManager::CloneKind kind = zaf::FileManager::CloneKind::Copy;
-    if (const zaf::OptionalError failure = zaf::FileManager::defaultManager().cloneItemAtPath(*path, clone, &kind)) {
-        *error = QStringLiteral("cannot hand the editor a copy of %1: %2").arg(*path, failure->description());
-        return nullptr;
-    }
-    zaf::log::info(lcHost(), QStringLiteral("the editor works on %1 of %2")
-        .arg(QLatin1String(kind == zaf::FileManager::CloneKind::Reflink ? "a clone" : kind == zaf::FileManager::CloneKind::HardLink ? "a hard link" : "a copy"), *path));
-    *path = clone;
-    return folder;
-}
-
 } // namespace
 
 int main(int argc, char **argv)
@@ -219,15 +195,16 @@ int main(int argc, char **argv)
     details.bundleIdentifier = parser.isSet(bundleIdOption) ? parser.value(bundleIdOption) : QString::fromLatin1(kOwnBundleIdentifier);
     if (!QFileInfo(details.moviePath).isFile())
         return usage(QStringLiteral("the movie %1 is not a file").arg(given), parser);
-    // The private clone lives until main() returns; QTemporaryDir removes it with its folder.
-    std::unique_ptr<QTemporaryDir> cloneFolder;
+    // The private clone lives until main() returns, and goes with its folder.
+    std::unique_ptr<zaf::host::PrivateClone> clone;
     if (opening) {
         QString problem;
-        cloneFolder = privateClone(&details.moviePath, &problem);
-        if (!cloneFolder) {
+        clone = zaf::host::PrivateClone::make(details.moviePath, QStandardPaths::writableLocation(QStandardPaths::GenericCacheLocation), &problem);
+        if (!clone) {
             complain(problem);
             return 1;
         }
+        details.moviePath = clone->path();
     }
     if (parser.isSet(attachmentOption)) {
         const QString path = QFileInfo(parser.value(attachmentOption)).absoluteFilePath();
