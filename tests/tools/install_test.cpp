@@ -70,7 +70,7 @@ INSTANTIATE_TEST_SUITE_P(
                       InstalledFile{"YouTubeSetupTool", "bin/zaf-youtube-setup", true},
                       InstalledFile{"Extension", "libexec/zafrel/zaf-video-editor-extension", true},
                       InstalledFile{"AgentLibrary", "lib/zafrel/libzaf_publishing_agent.so", false},
-                      InstalledFile{"PublishingPlugin", "lib/zafrel/plugins/libzaf_publishing_plugin.so", false},
+                      InstalledFile{"UploaderPlugIn", "lib/zafrel/plugins/libzaf_publishing_plugin.so", false},
                       InstalledFile{"FrameworkStrings", "share/zafrel/Zafrel/en.lproj/Localizable.mo", false},
                       InstalledFile{"PhotoLibraryStrings", "share/zafrel/ZafPhotoLibrary/de.lproj/PhotoLibrary.mo", false},
                       InstalledFile{"DesktopEntry", "share/applications/com.zafrel.VideoEditor.desktop", false},
