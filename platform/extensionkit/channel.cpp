@@ -131,9 +131,9 @@ OptionalError Channel::sendResult(const QJsonValue &id, const QJsonValue &result
     return sendMessage(jsonrpc::makeResult(id, result));
 }
 
-OptionalError Channel::sendError(const QJsonValue &id, int code, const QString &message)
+OptionalError Channel::sendError(const QJsonValue &id, int code, const QString &message, const QJsonValue &data)
 {
-    return sendMessage(jsonrpc::makeError(id, code, message));
+    return sendMessage(jsonrpc::makeError(id, code, message, data));
 }
 
 OptionalError Channel::sendFrame(const QByteArray &payload)

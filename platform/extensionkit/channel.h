@@ -49,7 +49,7 @@ public:
     OptionalError sendMessage(const QJsonObject &message);
     OptionalError sendNotification(const QString &method, const QJsonValue &params = QJsonValue::Undefined);
     OptionalError sendResult(const QJsonValue &id, const QJsonValue &result);
-    OptionalError sendError(const QJsonValue &id, int code, const QString &message);
+    OptionalError sendError(const QJsonValue &id, int code, const QString &message, const QJsonValue &data = QJsonValue::Undefined);
     // Any thread: write one frame with this payload.
     OptionalError sendFrame(const QByteArray &payload);
 

@@ -3,6 +3,7 @@
 #include "platform/extensionkit/channel.h"
 #include "platform/extensionkit/extensionkit_log.h"
 #include "platform/extensionkit/json_rpc.h"
+#include "platform/extensionkit/protocol_version.h"
 #include "platform/log.h"
 #include "platform/ui/view_controller.h"
 #include "platform/ui/window_host.h"
@@ -160,11 +161,35 @@ void ExtensionRuntime::handleRequest(const QJsonValue &id, const QString &method
             answerError(jsonrpc::InvalidParams, QStringLiteral("beginExtensionRequest needs params {\"inputItems\": [...]}"));
             return;
         }
+        const QJsonValue versionValue = params.toObject().value(QLatin1String(kProtocolVersionKey));
+        std::optional<ProtocolVersion> hostVersion = kUnversionedProtocolVersion;
+        if (!versionValue.isUndefined())
+            hostVersion = parseProtocolVersion(versionValue.toString());
+        if (!hostVersion) {
+            const QString given = versionValue.isString() ? QStringLiteral("\"%1\"").arg(versionValue.toString())
+                                                          : QStringLiteral("a value that is no string");
+            answerError(jsonrpc::InvalidParams, QStringLiteral("protocolVersion must be a string \"MAJOR.MINOR\", not %1").arg(given));
+            return;
+        }
+        if (!isCompatibleProtocolVersion(kProtocolVersion, *hostVersion)) {
+            // The request is not begun: the host may ask again with a version this extension speaks.
+            const QString text = QStringLiteral("unsupported protocol version %1: this editor speaks %2")
+                                     .arg(hostVersion->toString(), kProtocolVersion.toString());
+            log::error(lcExtensionKit(), QStringLiteral("request %1 refused: %2").arg(method, text));
+            const QJsonObject ours{{QLatin1String(kProtocolVersionKey), kProtocolVersion.toString()}};
+            if (const OptionalError error = d->channel->sendError(id, jsonrpc::UnsupportedProtocolVersion, text, ours))
+                log::error(lcExtensionKit(), QStringLiteral("cannot answer request %1: %2").arg(method, error->description()));
+            return;
+        }
         d->requestBegun = true;
         const QList<InputItem> inputItems = inputItemsFromJson(items.toArray());
         d->context->setInputItems(inputItems);
-        log::notice(lcExtensionKit(), QStringLiteral("request begun with %1 input items").arg(inputItems.size()));
-        if (const OptionalError error = d->channel->sendResult(id, QJsonObject{{QStringLiteral("accepted"), true}}))
+        log::notice(lcExtensionKit(), QStringLiteral("request begun with %1 input items, protocol %2 (ours %3)")
+                                          .arg(inputItems.size())
+                                          .arg(hostVersion->toString(), kProtocolVersion.toString()));
+        const QJsonObject answer{{QStringLiteral("accepted"), true},
+                                 {QLatin1String(kProtocolVersionKey), kProtocolVersion.toString()}};
+        if (const OptionalError error = d->channel->sendResult(id, answer))
             log::error(lcExtensionKit(), QStringLiteral("cannot accept the request: %1").arg(error->description()));
         showPrincipal();
         return;

@@ -14,7 +14,7 @@
 //      (context->principalObject(), ExtensionContext::contextOfPrincipal(principal)). The
 //      principal's view is NOT loaded yet and there is no window.
 //   2. beginExtensionRequest arrives: the items are set on the context, the request is answered
-//      {"accepted": true}, and only then the window is made and shown: the principal's loadView and
+//      {"accepted": true, "protocolVersion": ...}, and only then the window is made and shown: the principal's loadView and
 //      viewDidLoad run now, so inputItems() is already complete when viewDidLoad starts loading the
 //      items; viewWillAppear, viewDidLayoutSubviews, viewDidAppear follow as the window shows.
 //   3. removeExtensionView arrives or the channel closes (whichever comes first; the other is then
@@ -23,7 +23,8 @@
 //      before any request finishes at once, without any view callback.
 // Malformed messages are logged and answered with a JSON-RPC error when they carried an id; an
 // oversized frame closes the channel (step 3). Unknown requests get -32601, unknown notifications
-// are logged. A second beginExtensionRequest gets -32600 "request already begun".
+// are logged. A second beginExtensionRequest gets -32600 "request already begun". A request in
+// another major protocol version than ours gets -32001 and is not begun (protocol_version.h).
 
 #include "platform/extensionkit/extension_context.h"
 

@@ -288,6 +288,7 @@ QString errorCodeName(int code)
     case MethodNotFound: return QStringLiteral("method not found");
     case InvalidParams: return QStringLiteral("invalid params");
     case InternalError: return QStringLiteral("internal error");
+    case UnsupportedProtocolVersion: return QStringLiteral("unsupported protocol version");
     default: break;
     }
     return QStringLiteral("error %1").arg(code);

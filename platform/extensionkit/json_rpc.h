@@ -22,6 +22,9 @@ enum ErrorCode : int {
     MethodNotFound = -32601,
     InvalidParams = -32602,
     InternalError = -32603,
+    // The channel's own, from the range JSON-RPC leaves to servers: the request speaks a major
+    // protocol version this extension does not (protocol_version.h).
+    UnsupportedProtocolVersion = -32001,
 };
 
 // Messages nested deeper than this (arrays and objects; the message itself is level 1) are refused

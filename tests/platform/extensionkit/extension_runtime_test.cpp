@@ -64,9 +64,13 @@ QJsonObject textItem(const QString &title, const QString &value)
     return item(title, QJsonArray{QJsonObject{{"type", "text/plain"}, {"value", value}}});
 }
 
-QJsonObject beginRequest(int id, const QJsonArray &items)
+// A request in `version` (undefined: a host from before the version existed, which sends none).
+QJsonObject beginRequest(int id, const QJsonArray &items, const QJsonValue &version = QJsonValue::Undefined)
 {
-    return rpc::makeRequest(id, "beginExtensionRequest", QJsonObject{{"inputItems", items}});
+    QJsonObject params{{"inputItems", items}};
+    if (!version.isUndefined())
+        params.insert("protocolVersion", version);
+    return rpc::makeRequest(id, "beginExtensionRequest", params);
 }
 
 class RuntimeTest : public ::testing::Test {
@@ -90,12 +94,13 @@ protected:
     // Sends the request, checks it is accepted and waits for the principal's view to appear.
     void begin(int id = 1, const QJsonArray &items = {textItem("ZafVideoEditorExtensionMovieURLKey", "/tmp/m.mp4"),
                                                        textItem("ZafVideoEditorExtensionAppNameKey", "App"),
-                                                       textItem("ZafVideoEditorExtensionBundleIdentifierKey", "org.example.App")})
+                                                       textItem("ZafVideoEditorExtensionBundleIdentifierKey", "org.example.App")},
+               const QJsonValue &version = "1.0")
     {
-        pair.writeMessage(beginRequest(id, items));
+        pair.writeMessage(beginRequest(id, items, version));
         const QList<QJsonObject> answers = pair.readMessages(1);
         ASSERT_EQ(answers.size(), 1);
-        ASSERT_EQ(answers[0], rpc::makeResult(id, QJsonObject{{"accepted", true}}));
+        ASSERT_EQ(answers[0], rpc::makeResult(id, QJsonObject{{"accepted", true}, {"protocolVersion", "1.0"}}));
         ASSERT_TRUE(waitUntil([&] { return recorder->calls.contains("viewDidAppear"); }));
     }
 
@@ -227,11 +232,40 @@ INSTANTIATE_TEST_SUITE_P(Messages, RuntimeBadMessageTest, ::testing::Values(
     BadMessage{"ParamsAnArray", rpc::serialize(rpc::makeRequest(1, "beginExtensionRequest", QJsonArray{})), {{1, rpc::InvalidParams}}},
     BadMessage{"ItemsNotAnArray", rpc::serialize(rpc::makeRequest(2, "beginExtensionRequest", QJsonObject{{"inputItems", "nope"}})), {{2, rpc::InvalidParams}}},
     BadMessage{"NoParams", rpc::serialize(rpc::makeRequest(3, "beginExtensionRequest")), {{3, rpc::InvalidParams}}},
+    BadMessage{"NewerMajorVersion", rpc::serialize(beginRequest(10, {}, "2.0")), {{10, rpc::UnsupportedProtocolVersion}}},
+    BadMessage{"OlderMajorVersion", rpc::serialize(beginRequest(11, {}, "0.9")), {{11, rpc::UnsupportedProtocolVersion}}},
+    BadMessage{"VersionWithoutMinor", rpc::serialize(beginRequest(12, {}, "1")), {{12, rpc::InvalidParams}}},
+    BadMessage{"VersionWithThreeParts", rpc::serialize(beginRequest(13, {}, "1.0.1")), {{13, rpc::InvalidParams}}},
+    BadMessage{"VersionANumber", rpc::serialize(beginRequest(14, {}, 1.0)), {{14, rpc::InvalidParams}}},
     BadMessage{"UnknownMethod", rpc::serialize(rpc::makeRequest(4, "doSomethingElse", QJsonObject{})), {{4, rpc::MethodNotFound}}},
     BadMessage{"RemovalAsARequest", rpc::serialize(rpc::makeRequest(5, "removeExtensionView")), {{5, rpc::InvalidRequest}}},
     BadMessage{"UnknownNotification", rpc::serialize(rpc::makeNotification("unknownNotification")), std::nullopt},
     BadMessage{"RequestAsANotification", rpc::serialize(rpc::makeNotification("beginExtensionRequest", QJsonObject{{"inputItems", QJsonArray{}}})), std::nullopt}),
     caseName);
+
+// Any request of our major version is served, whatever its minor, and so is one without a version;
+// the answer states our own.
+class RuntimeVersionTest : public RuntimeTest, public ::testing::WithParamInterface<const char *> {};
+
+TEST_P(RuntimeVersionTest, IsAcceptedWithOurVersionInTheAnswer)
+{
+    const QJsonValue version = *GetParam() ? QJsonValue(GetParam()) : QJsonValue(QJsonValue::Undefined);
+    begin(1, {textItem("ZafVideoEditorExtensionMovieURLKey", "/tmp/m.mp4")}, version);
+}
+
+INSTANTIATE_TEST_SUITE_P(Versions, RuntimeVersionTest, ::testing::Values("", "1.0", "1.7", "01.0"));
+
+// A refusal for the version leaves the request to be asked again: the same message in our version
+// then goes through.
+TEST_F(RuntimeTest, ARefusedVersionTellsOursInTheErrorsData)
+{
+    pair.writeMessage(beginRequest(3, {}, "2.1"));
+    const QList<QJsonObject> answers = pair.readMessages(1);
+    ASSERT_EQ(answers.size(), 1);
+    EXPECT_EQ(answers[0]["error"].toObject()["data"].toObject(), (QJsonObject{{"protocolVersion", "1.0"}}));
+    EXPECT_TRUE(answers[0]["error"].toObject()["message"].toString().contains("2.1"));
+    begin(4);
+}
 
 TEST_F(RuntimeTest, SecondRequestIsRefused)
 {
