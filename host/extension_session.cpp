@@ -4,6 +4,7 @@
 #include "host/host_log.h"
 #include "platform/extensionkit/framed_socket.h"
 #include "platform/extensionkit/json_rpc.h"
+#include "platform/extensionkit/protocol_version.h"
 #include "platform/log.h"
 #include "platform/unique_fd.h"
 
@@ -25,6 +26,8 @@ namespace {
 
 namespace rpc = zaf::extensionkit::jsonrpc;
 using zaf::extensionkit::FramedSocket;
+using zaf::extensionkit::kProtocolVersion;
+using zaf::extensionkit::kProtocolVersionKey;
 
 // Reads once the process has ended: what it wrote before it went (up to 64 MiB) comes before
 // finished(); anything beyond that (a descendant still writing) follows on later notifications.
@@ -146,7 +149,9 @@ struct ExtensionSession::Private {
             Q_EMIT q->requestRejected(text);
             return;
         }
-        log::info(lcHost(), QStringLiteral("the extension accepted the request"));
+        // An extension from before the version existed states none: it speaks 1.0.
+        const QString theirs = message.result.toObject().value(QLatin1String(kProtocolVersionKey)).toString(QStringLiteral("1.0"));
+        log::info(lcHost(), QStringLiteral("the extension accepted the request (protocol %1, ours %2)").arg(theirs, kProtocolVersion.toString()));
         Q_EMIT q->requestAccepted();
     }
 
@@ -206,7 +211,7 @@ bool ExtensionSession::start(const QString &extensionExecutable, const QList<Inp
     if (d->started)
         return fail(QStringLiteral("the extension session was already started"));
 
-    const QJsonObject request = rpc::makeRequest(d->requestId, kMethodBegin, QJsonObject{{QStringLiteral("inputItems"), toJson(items)}});
+    const QJsonObject request = rpc::makeRequest(d->requestId, kMethodBegin, QJsonObject{{QLatin1String(kProtocolVersionKey), kProtocolVersion.toString()}, {QStringLiteral("inputItems"), toJson(items)}});
     const QByteArray payload = rpc::serialize(request);
     if (payload.size() > kMaxMessageLength)
         return fail(QStringLiteral("the request to the extension is too large (%1 bytes, at most %2)").arg(payload.size()).arg(kMaxMessageLength));
