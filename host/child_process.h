@@ -8,31 +8,18 @@
 // waits for the child's end (without reaping it) and hands it over to that thread; the destructor
 // joins it.
 //
-// The child starts with no blocked signals and SIGPIPE at its default, whatever the host does, and
-// with none of the host's descriptors but the standard three and the one handed over, which it
-// finds as descriptor 3 (kHandedFd).
+// The child is started by spawnChild (spawn_child.h), which says what it inherits.
 
-#include <QByteArray>
-#include <QList>
+#include "host/spawn_child.h"
+
 #include <QObject>
 #include <QString>
-#include <QStringList>
 
 #include <sys/types.h>
 
 #include <memory>
 
 namespace zaf::host {
-
-// The number the handed descriptor has in the child.
-inline constexpr int kHandedFd = 3;
-
-struct ChildSpec {
-    QString program;               // a path; no PATH search
-    QStringList arguments;         // after the program's name
-    QList<QByteArray> environment; // NAME=VALUE entries set over the host's own environment
-    int handedFd = -1;             // a descriptor of the host's, given to the child as kHandedFd; -1: none
-};
 
 class ChildProcess : public QObject {
     Q_OBJECT
