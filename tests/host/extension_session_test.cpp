@@ -101,6 +101,7 @@ TEST(ExtensionSessionRequest, CarriesEveryItemOverTheChannelNamedInTheEnvironmen
     const QJsonObject request = dump.value("request").toObject();
     EXPECT_EQ(request.value("jsonrpc"), "2.0");
     EXPECT_EQ(request.value("method"), "beginExtensionRequest");
+    EXPECT_EQ(request.value("params").toObject().value("protocolVersion"), "1.0");
     auto item = [](const char *title, const char *type, const char *value) {
         return QJsonObject{{"title", title}, {"attachments", QJsonArray{QJsonObject{{"type", type}, {"value", value}}}}};
     };
