@@ -75,7 +75,10 @@ INSTANTIATE_TEST_SUITE_P(
                       InstalledFile{"PhotoLibraryStrings", "share/zafrel/ZafPhotoLibrary/de.lproj/PhotoLibrary.mo", false},
                       InstalledFile{"DesktopEntry", "share/applications/com.zafrel.VideoEditor.desktop", false},
                       InstalledFile{"Metainfo", "share/metainfo/com.zafrel.VideoEditor.metainfo.xml", false},
-                      InstalledFile{"Icon", "share/icons/hicolor/scalable/apps/com.zafrel.VideoEditor.svg", false}),
+                      InstalledFile{"Icon", "share/icons/hicolor/scalable/apps/com.zafrel.VideoEditor.svg", false},
+                      InstalledFile{"HostLibrary", "lib/libzafrel-host.so.1", false},
+                      InstalledFile{"HostLibraryHeader", "include/zafrel/host.h", false},
+                      InstalledFile{"HostLibraryPkgConfig", "lib/pkgconfig/zafrel-host.pc", false}),
     caseName);
 
 struct PrefixCase {
@@ -237,23 +240,54 @@ TEST(InstalledPrograms, MediaToolProbesAMovie)
     EXPECT_TRUE(probe.out.contains("\"display_size\"")) << probe.out.toStdString();
 }
 
-// The installed host finds the installed extension and presents the editor on a recording under
-// Xvfb; Escape cancels it, the report is empty and the temporary root is left empty.
-TEST(InstalledPrograms, HostPresentsTheEditorAndTheUserCancels)
+// The example host in C++, built from examples/cpp-host with the installed library found by pkg-config
+// alone (an rpath to its folder, since a scratch prefix is not on the loader's path). Empty, with
+// the reason in `error`, when it cannot be built.
+QString buildExampleHost(const ScratchDir &scratch, QString *error)
 {
-    for (const char *tool : {"xvfb-run", "Xvfb", "xdotool"}) {
+    const QString prefix = installedPrefix();
+    const QString source = QStringLiteral(ZAF_SOURCE_DIR "/examples/cpp-host");
+    const QString into = scratch.file(QStringLiteral("cpp-host"));
+    QDir().mkpath(into);
+    for (const QString &name : QDir(source).entryList(QDir::Files))
+        QFile::copy(QDir(source).filePath(name), QDir(into).filePath(name));
+    QStringList environment = QProcessEnvironment::systemEnvironment().toStringList();
+    environment << QStringLiteral("PKG_CONFIG_PATH=%1/lib/pkgconfig").arg(prefix);
+    ChildOptions options;
+    options.environment = environment;
+    options.mergeErrorIntoOutput = true;
+    const ChildRun make = runChild(QStringLiteral("make"), {QStringLiteral("-C"), into, QStringLiteral("LDFLAGS=-Wl,-rpath,%1/lib").arg(prefix)}, options);
+    if (!make.ok()) {
+        *error = QString::fromUtf8(make.out) + make.error;
+        return {};
+    }
+    return QDir(into).filePath(QStringLiteral("zafrel_example_host"));
+}
+
+// An installed host finds the installed extension and presents the editor on a recording under
+// Xvfb; Escape cancels it, the host reads the empty report, and the temporary root is left empty.
+// Both the installed zaf-host and the example host built against the installed library.
+class InstalledHostTest : public ::testing::TestWithParam<const char *> {};
+
+TEST_P(InstalledHostTest, PresentsTheEditorAndReadsTheReportWhenTheUserCancels)
+{
+    for (const char *tool : {"xvfb-run", "Xvfb", "xdotool", "make", "c++", "pkg-config"}) {
         if (QStandardPaths::findExecutable(QLatin1String(tool)).isEmpty())
-            GTEST_SKIP() << tool << " is not installed; the installed run needs an X server and xdotool";
+            GTEST_SKIP() << tool << " is not installed; the installed run needs an X server, xdotool and a C++ toolchain";
     }
     ASSERT_FALSE(installedPrefix().isEmpty());
     ScratchDir scratch;
+    QString host = QDir(installedPrefix()).filePath(QStringLiteral("bin/zaf-host"));
+    if (QLatin1String(GetParam()) == QLatin1String("ExampleHostBuiltWithPkgConfig")) {
+        QString error;
+        host = buildExampleHost(scratch, &error);
+        ASSERT_FALSE(host.isEmpty()) << error.toStdString();
+    }
     ChildOptions options;
     options.timeoutMs = 240000;
     options.forwardOutput = true;
-    const ChildRun script = runChild(QStringLiteral("bash"), {QStringLiteral(ZAF_WHOLE_PROCESS_SCRIPT),
-                                                              QDir(installedPrefix()).filePath(QStringLiteral("bin/zaf-host")),
-                                                              QStringLiteral("installed"), QStringLiteral(ZAF_FIXTURE_BIN), scratch.path(),
-                                                              QStringLiteral("cancel")}, options);
+    const ChildRun script = runChild(QStringLiteral("bash"), {QStringLiteral(ZAF_WHOLE_PROCESS_SCRIPT), host, QStringLiteral("installed"),
+                                                              QStringLiteral(ZAF_FIXTURE_BIN), scratch.path(), QStringLiteral("cancel")}, options);
     ASSERT_TRUE(script.ok()) << script.error.toStdString();
     auto read = [&](const char *name) {
         QFile file(scratch.file(QLatin1String(name)));
@@ -266,6 +300,9 @@ TEST(InstalledPrograms, HostPresentsTheEditorAndTheUserCancels)
     EXPECT_TRUE(temporaryRoot.exists()) << "the installed extension made its temporary root in the user's cache";
     EXPECT_EQ(temporaryRoot.entryList(QDir::Files | QDir::Hidden | QDir::System), QStringList());
 }
+
+INSTANTIATE_TEST_SUITE_P(Hosts, InstalledHostTest, ::testing::Values("InstalledZafHost", "ExampleHostBuiltWithPkgConfig"),
+                         [](const auto &info) { return std::string(info.param); });
 
 } // namespace
 } // namespace zaf::test
