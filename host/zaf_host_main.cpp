@@ -5,6 +5,7 @@
 //   zaf-host --movie PATH --app-name NAME --bundle-id ID [--attachment PATH] [--share-message TEXT]
 //            [--tint #RRGGBB[AA]] [--extension PATH]
 //   zaf-host --open [PATH] [...]
+//   zaf-host --watch [DIR] [--app-name NAME --bundle-id ID] [--share-message TEXT] [--tint COLOR] [--extension PATH]
 //
 // --movie hands the editor the recording itself, as a recorder does: the editor's save removes it.
 // --open is how a user opens a movie of their own (the desktop entry's "Open With"): the editor gets
@@ -12,13 +13,21 @@
 // when zaf-host ends, so the user's file is never removed or changed; the application is then the
 // editor itself unless --app-name and --bundle-id say otherwise. Without PATH (the editor started
 // from the desktop's menu) the user chooses the movie with the desktop's file chooser.
+// --watch is for recorders that cannot start the editor: it watches DIR (by default the desktop's
+// screencast folder, $(xdg-user-dir VIDEOS)/Screencasts, waited for while it does not exist) and
+// offers the editor each MPEG-4 or QuickTime movie finished there (closed after writing, or renamed
+// into place), on a private clone as --open does, one editor at a time, the others waiting in order;
+// after each editor a desktop notification says what was done. It runs until SIGTERM or SIGINT
+// (host/watch/watch_mode.h); the user service desktop/zafrel-watch.service runs it at login.
 //
-// Exit status: 0 after a report and a normal exit of the extension; 1 when the extension could not
-// start, died, refused the request or ended without a report; 2 for bad arguments.
+// Exit status: 0 after a report and a normal exit of the extension (--watch: after SIGTERM or
+// SIGINT); 1 when the extension could not start, died, refused the request or ended without a
+// report (--watch: the folder cannot be watched); 2 for bad arguments.
 
 #include "host/extension_session.h"
 #include "host/host_log.h"
 #include "host/private_clone.h"
+#include "host/watch/watch_mode.h"
 #include "platform/install_layout.h"
 #include "platform/log.h"
 
@@ -107,6 +116,8 @@ bool choosesAMovie(int argc, char **argv)
         const QByteArray arg(argv[i]);
         if (arg == "--open" || arg == "-open")
             open = true;
+        else if (arg == "--watch" || arg == "-watch")
+            return false; // watching asks for nothing
         else if (arg == "--help" || arg == "-h" || arg == "--help-all")
             return false; // the help is printed, nothing is opened
         else if (arg.startsWith('-'))
@@ -123,6 +134,43 @@ QString chooseMovie()
     return QFileDialog::getOpenFileName(nullptr, QStringLiteral("Open a movie"),
                                         QStandardPaths::writableLocation(QStandardPaths::MoviesLocation),
                                         QStringLiteral("Movies (*.mp4 *.m4v *.mov);;All files (*)"));
+}
+
+// --watch [DIR]: checks the arguments, then watches until SIGTERM or SIGINT.
+int watch(const QCommandLineParser &parser, const QString &given, std::initializer_list<const QCommandLineOption *> excluded,
+          const QCommandLineOption &appNameOption, const QCommandLineOption &bundleIdOption, const QCommandLineOption &shareMessageOption,
+          const QCommandLineOption &tintOption, const QCommandLineOption &extensionOption)
+{
+    for (const QCommandLineOption *option : excluded) {
+        if (parser.isSet(*option))
+            return usage(QStringLiteral("--watch and --%1 exclude each other").arg(option->names().constFirst()), parser);
+    }
+    zaf::host::watch::WatchSettings settings;
+    settings.folder = given.isEmpty() ? zaf::host::watch::defaultWatchFolder() : QFileInfo(given).absoluteFilePath();
+    if (const std::optional<QString> problem = zaf::host::watch::watchFolderProblem(settings.folder, !given.isEmpty()))
+        return usage(*problem, parser);
+    settings.details.appName = parser.isSet(appNameOption) ? parser.value(appNameOption) : QString::fromLatin1(kOwnAppName);
+    settings.details.bundleIdentifier = parser.isSet(bundleIdOption) ? parser.value(bundleIdOption) : QString::fromLatin1(kOwnBundleIdentifier);
+    if (parser.isSet(shareMessageOption))
+        settings.details.shareMessage = parser.value(shareMessageOption);
+    if (parser.isSet(tintOption))
+        settings.details.tintColor = parser.value(tintOption);
+    QString problem;
+    for (const QString &value : {settings.details.appName, settings.details.bundleIdentifier}) {
+        if (value.isEmpty())
+            return usage(QStringLiteral("--app-name and --bundle-id may not be empty"), parser);
+    }
+    zaf::host::RecordingDetails check = settings.details;
+    check.moviePath = settings.folder; // any path: only the other values are checked here
+    if (!zaf::host::makeInputItems(check, &problem))
+        return usage(problem, parser);
+    settings.extension = findExtension(parser.value(extensionOption), &problem);
+    if (settings.extension.isEmpty()) {
+        complain(problem);
+        return 1;
+    }
+    settings.cacheDirectory = QStandardPaths::writableLocation(QStandardPaths::GenericCacheLocation);
+    return zaf::host::watch::runWatchMode(settings);
 }
 
 } // namespace
@@ -156,7 +204,15 @@ int main(int argc, char **argv)
     const QCommandLineOption openOption(QStringLiteral("open"),
         QStringLiteral("Open the movie given after the options as one of the user's own: the editor gets a private clone, and "
                        "the file is never removed or changed. Without a movie, the user chooses one."));
-    parser.addOptions({movieOption, appNameOption, bundleIdOption, attachmentOption, shareMessageOption, tintOption, extensionOption, openOption});
+    const QCommandLineOption watchOption(QStringLiteral("watch"),
+        QStringLiteral("Watch the folder given after the options (by default the desktop's screencast folder, %1) and offer "
+                       "the editor each MPEG-4 or QuickTime movie a recorder finishes there, on a private clone, one at a "
+                       "time, until SIGTERM or SIGINT; a desktop notification says what was done.")
+            .arg(zaf::host::watch::defaultWatchFolder()));
+    parser.addOptions({movieOption, appNameOption, bundleIdOption, attachmentOption, shareMessageOption, tintOption, extensionOption, openOption,
+                       watchOption});
+    parser.addPositionalArgument(QStringLiteral("PATH|DIR"), QStringLiteral("With --open, the movie; with --watch, the folder."),
+                                 QStringLiteral("[PATH|DIR]"));
 
     if (!parser.parse(app.arguments()))
         return usage(parser.errorText(), parser);
@@ -165,9 +221,18 @@ int main(int argc, char **argv)
         return 0;
     }
     const bool opening = parser.isSet(openOption);
+    const bool watching = parser.isSet(watchOption);
     const QStringList positional = parser.positionalArguments();
-    if (positional.size() > (opening ? 1 : 0))
+    if (positional.size() > (opening || watching ? 1 : 0))
         return usage(QStringLiteral("unexpected argument: %1").arg(positional.constLast()), parser);
+    for (const QCommandLineOption *single : {&movieOption, &appNameOption, &bundleIdOption, &attachmentOption, &shareMessageOption,
+                                             &tintOption, &extensionOption}) {
+        if (parser.values(*single).size() > 1)
+            return usage(QStringLiteral("--%1 is given more than once").arg(single->names().constFirst()), parser);
+    }
+    if (watching)
+        return watch(parser, positional.value(0), {&movieOption, &openOption, &attachmentOption}, appNameOption, bundleIdOption,
+                     shareMessageOption, tintOption, extensionOption);
     QString opened;
     if (opening) {
         opened = positional.isEmpty() ? chooseMovie() : positional.constFirst();
@@ -181,11 +246,6 @@ int main(int argc, char **argv)
             continue;
         if (!parser.isSet(*required) || parser.value(*required).isEmpty())
             return usage(QStringLiteral("--%1 is required").arg(required->names().constFirst()), parser);
-    }
-    for (const QCommandLineOption *single : {&movieOption, &appNameOption, &bundleIdOption, &attachmentOption, &shareMessageOption,
-                                             &tintOption, &extensionOption}) {
-        if (parser.values(*single).size() > 1)
-            return usage(QStringLiteral("--%1 is given more than once").arg(single->names().constFirst()), parser);
     }
 
     zaf::host::RecordingDetails details;
