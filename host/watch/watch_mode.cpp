@@ -177,13 +177,12 @@ void WatchMode::examined(Examination examination)
     } else if (!examination.offer) {
         log::notice(lcHost(), QStringLiteral("ignored %1: %2").arg(examination.path, examination.reason));
     } else {
-        m_offered.remember(examination.identity);
-        openEditor(examination.path, std::move(examination.clone));
+        openEditor(examination.path, examination.identity, std::move(examination.clone));
     }
     offerNext();
 }
 
-void WatchMode::openEditor(const QString &source, std::unique_ptr<PrivateClone> clone)
+void WatchMode::openEditor(const QString &source, const FileIdentity &identity, std::unique_ptr<PrivateClone> clone)
 {
     auto offer = std::make_unique<Offer>();
     offer->source = source;
@@ -244,6 +243,8 @@ void WatchMode::openEditor(const QString &source, std::unique_ptr<PrivateClone> 
         end();
     });
     log::notice(lcHost(), QStringLiteral("offered %1 to the editor, on its copy %2").arg(source, o->clone->path()));
+    // Remembered once the editor is open: a file whose editor could not start may come again.
+    m_offered.remember(identity);
     m_offer = std::move(offer);
 }
 

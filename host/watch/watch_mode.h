@@ -86,7 +86,7 @@ private:
     void fileFinished(const QString &path);
     void offerNext();
     void examined(Examination examination);
-    void openEditor(const QString &source, std::unique_ptr<PrivateClone> clone);
+    void openEditor(const QString &source, const FileIdentity &identity, std::unique_ptr<PrivateClone> clone);
     void endOffer(Offer *offer);
     void notifyFailure(const QString &source);
     bool isBusy() const { return m_examining || m_offer; }
