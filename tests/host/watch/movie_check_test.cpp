@@ -1,7 +1,7 @@
 // The check a file passes before --watch offers it: real movies made by ffmpeg in the layouts
 // recorders write (the index at the end, at the start, fragmented, QuickTime), cut-short copies of
 // them, a Matroska movie, box layouts written by hand for the edges of the rule, and things that
-// are not files.
+// are not regular files.
 #include "host/watch/movie_check.h"
 #include "tests/support/child_process.h"
 #include "tests/support/named_cases.h"
@@ -128,13 +128,9 @@ INSTANTIATE_TEST_SUITE_P(
         CheckCase{"MediaStillOpenToTheEnd", [](const TestFiles &f) { return f.write("open.mp4", kFtyp + box("mdat", 64, 0)); }, V::Incomplete},
         CheckCase{"IndexThenMediaToTheEnd", [](const TestFiles &f) { return f.write("to-end.mp4", kFtyp + box("moov", 8) + box("mdat", 64, 0)); }, V::Movie},
         CheckCase{"LargeSizes", [](const TestFiles &f) { return f.write("large.mp4", kFtyp + largeBox("mdat", 64) + largeBox("moov", 8)); }, V::Movie},
-        CheckCase{"HeaderCutInTheLargeSize", [](const TestFiles &f) { return f.write("large-cut.mp4", kFtyp + box("moov", 8) + largeBox("mdat", 0).left(12)); }, V::Incomplete},
         CheckCase{"BoxShorterThanItsHeader", [](const TestFiles &f) { return f.write("short.mp4", kFtyp + box("moov", 8) + box("free", 0, 4)); }, V::NotMpeg4},
-        CheckCase{"FtypWithoutBrand", [](const TestFiles &f) { return f.write("brandless.mp4", box("ftyp", 4) + box("moov", 8)); }, V::NotMpeg4},
         CheckCase{"NoIndex", [](const TestFiles &f) { return f.write("no-moov.mp4", kFtyp + box("mdat", 64)); }, V::Incomplete},
-        CheckCase{"Text", [](const TestFiles &f) { return f.write("notes.mp4", "this is not a movie at all\n"); }, V::NotMpeg4},
         CheckCase{"Missing", [](const TestFiles &f) { return f.scratch.file("missing.mp4"); }, V::NotAFile},
-        CheckCase{"Folder", [](const TestFiles &f) { QDir().mkpath(f.scratch.file("folder.mp4")); return f.scratch.file("folder.mp4"); }, V::NotAFile},
         CheckCase{"Fifo", [](const TestFiles &f) { ::mkfifo(QFile::encodeName(f.scratch.file("fifo.mp4")).constData(), 0600); return f.scratch.file("fifo.mp4"); }, V::NotAFile},
         CheckCase{"LinkToAMovie", [](const TestFiles &f) {
             const QString movie = f.movie("index-first.mp4");
@@ -158,16 +154,11 @@ INSTANTIATE_TEST_SUITE_P(
     Names, PartialName,
     ::testing::Values(NameCase{"Movie", "Screencast from 2024-05-01 10-00-00.mp4", false},
                       NameCase{"NoExtension", "recording", false},
-                      NameCase{"PartInside", "part.2.mp4", false},
                       NameCase{"Hidden", ".recording.mp4", true},
                       NameCase{"OurOwnPartial", ".movie.mp4.partial-Ab12Cd", true},
-                      NameCase{"Part", "movie.mp4.part", true},
-                      NameCase{"PartUpperCase", "MOVIE.MP4.PART", true},
-                      NameCase{"Partial", "movie.mp4.partial", true},
+                      NameCase{"PartInAnyCase", "movie.mp4.PART", true},
                       NameCase{"Tmp", "movie.tmp", true},
-                      NameCase{"Temp", "movie.mp4.temp", true},
                       NameCase{"Crdownload", "movie.mp4.crdownload", true},
-                      NameCase{"Download", "movie.mp4.download", true},
                       NameCase{"Backup", "movie.mp4~", true}),
     test::caseName);
 

@@ -87,7 +87,6 @@ INSTANTIATE_TEST_SUITE_P(
                       ProblemCase{"GivenAndMissing", "missing", true, "", "does not exist"},
                       ProblemCase{"DefaultAndMissing", "home/Videos/Screencasts", false, "", ""},
                       ProblemCase{"TheVideosFolder", "home/Videos", true, "", "is the video library"},
-                      ProblemCase{"TheLibraryOfTheVariable", "recordings", true, "recordings", "is the video library"},
                       ProblemCase{"TheLibraryThroughALink", "link", true, "recordings", "is the video library"},
                       ProblemCase{"VideosWhenTheLibraryIsElsewhere", "home/Videos", true, "recordings", ""}),
     test::caseName);
