@@ -20,7 +20,7 @@ namespace {
 
 // The folder's own events: a file finished, and the folder itself going away.
 constexpr uint32_t kFolderEvents = IN_CLOSE_WRITE | IN_MOVED_TO | IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR | IN_EXCL_UNLINK;
-// An ancestor's, while the folder is missing: the next part of the path appearing, and the
+// An ancestor's, while the folder is missing: the next folder of the path appearing, and the
 // ancestor itself going away.
 constexpr uint32_t kAncestorEvents = IN_CREATE | IN_MOVED_TO | IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR;
 // The watch itself has gone (removed, or the file system unmounted) or is to be dropped.
@@ -38,8 +38,8 @@ QString parentOf(const QString &path)
     return QFileInfo(path).path();
 }
 
-// The part of the folder's path just below `ancestor`: what the ancestor's watch waits for.
-QString nextPartBelow(const QString &ancestor, const QString &folder)
+// The folder of the path just below `ancestor`: what the ancestor's watch waits for.
+QString nextFolderBelow(const QString &ancestor, const QString &folder)
 {
     const QString rest = folder.mid(ancestor == QLatin1String("/") ? 1 : ancestor.size() + 1);
     return QDir(ancestor).filePath(rest.section(QLatin1Char('/'), 0, 0));
@@ -113,8 +113,8 @@ void FolderWatcher::rearm()
             }
             m_ancestor = ancestor;
         }
-        // The next part may have appeared before the ancestor's watch was in place: look again.
-        if (!missing || !QFileInfo::exists(nextPartBelow(ancestor, m_folder)))
+        // The next folder may have appeared before the ancestor's watch was in place: look again.
+        if (!missing || !QFileInfo::exists(nextFolderBelow(ancestor, m_folder)))
             break;
     }
     if (!m_missingAnnounced) {
@@ -160,7 +160,7 @@ void FolderWatcher::readEvents()
                 if (mask & kGoneEvents) {
                     dropAncestorWatch();
                     rearm();
-                } else if (QDir(m_ancestor).filePath(name) == nextPartBelow(m_ancestor, m_folder)) {
+                } else if (QDir(m_ancestor).filePath(name) == nextFolderBelow(m_ancestor, m_folder)) {
                     rearm();
                 }
             }

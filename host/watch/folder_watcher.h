@@ -10,7 +10,7 @@
 // subfolders themselves.
 //
 // A folder that does not exist, yet or any more, is waited for, never created: the watcher watches
-// the nearest existing ancestor until the next missing part of the path appears, step by step, and
+// the nearest existing ancestor until the next missing folder of the path appears, step by step, and
 // watches the folder from the moment it exists. A folder removed or moved away while watched is
 // waited for again. Files finished in a folder before its watch is in place are not reported (a
 // folder that has just appeared is watched within one pass of the event loop).

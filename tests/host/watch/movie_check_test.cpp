@@ -156,7 +156,7 @@ INSTANTIATE_TEST_SUITE_P(
                       NameCase{"NoExtension", "recording", false},
                       NameCase{"Hidden", ".recording.mp4", true},
                       NameCase{"OurOwnPartial", ".movie.mp4.partial-Ab12Cd", true},
-                      NameCase{"PartInAnyCase", "movie.mp4.PART", true},
+                      NameCase{"SuffixInAnyCase", "movie.mp4.PART", true},
                       NameCase{"Tmp", "movie.tmp", true},
                       NameCase{"Crdownload", "movie.mp4.crdownload", true},
                       NameCase{"Backup", "movie.mp4~", true}),
