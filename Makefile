@@ -44,7 +44,7 @@ SANITIZER_JOB_TESTS := media_asset_tests media_export_tests media_player_tests m
   media_writer_tests media_odd_size_tests audio_mix_utility_tests tools_tests \
   extensionkit_codec_tests extensionkit_channel_tests extensionkit_runtime_tests extension_tests host_tests \
   bundle_tests store_lookup_tests photos_tests tempstore_tests platform_tests thread_rules_tests publishing_upload_tests \
-  corpus_engine_tests corpus_editor_tests
+  corpus_engine_tests corpus_editor_tests host_watch_tests host_library_tests
 empty :=
 space := $(empty) $(empty)
 sanitizer-job:
