@@ -29,13 +29,14 @@ protected:
     }
     // Runs the script's scenario: it runs through, zaf-host prints `report` and exits with
     // `hostStatus`, and the extension's temporary directory is left empty.
-    void run(const char *scenario, const char *report, const char *movie = "fixture", const char *hostStatus = "0")
+    void run(const char *scenario, const char *report, const char *movie = "fixture", const char *hostStatus = "0",
+             const char *host = ZAF_HOST_BIN)
     {
         zaf::test::ChildOptions options;
         options.timeoutMs = 240000;
         options.forwardOutput = true;
         const zaf::test::ChildRun script = zaf::test::runChild(
-            "bash", {ZAF_WHOLE_PROCESS_SCRIPT, ZAF_HOST_BIN, ZAF_EXTENSION_BIN, ZAF_FIXTURE_BIN, scratch.path(), scenario, movie}, options);
+            "bash", {ZAF_WHOLE_PROCESS_SCRIPT, host, ZAF_EXTENSION_BIN, ZAF_FIXTURE_BIN, scratch.path(), scenario, movie}, options);
         ASSERT_TRUE(script.started && !script.timedOut) << script.error.toStdString();
         ASSERT_EQ(script.exitCode, 0);
         const std::string hostErr = read("host.err").toStdString();
@@ -93,11 +94,31 @@ INSTANTIATE_TEST_SUITE_P(Movies, ZafHostWholeProcessCancel, ::testing::Values("f
 
 const char *const kTwoSaves = "[\"com.zafrel.activity.SaveToPhotoLibrary\",\"com.zafrel.activity.SaveToPhotoLibrary\"]\n";
 
-TEST_F(ZafHostWholeProcess, KeyboardTrimThenSavePutsTheTrimmedMixedMovieInTheLibrary)
+// The same run from zaf-host and from the host in Python that examples/python-host holds, written
+// from the README's protocol text alone: both present, trim, save and read the report alike.
+struct Host {
+    const char *name;
+    const char *program;
+};
+
+void PrintTo(const Host &host, std::ostream *out)
 {
-    ASSERT_NO_FATAL_FAILURE(run("trim-save", kTwoSaves));
+    *out << host.name;
+}
+
+class WholeProcessHostTest : public ZafHostWholeProcess, public ::testing::WithParamInterface<Host> {};
+
+TEST_P(WholeProcessHostTest, KeyboardTrimThenSavePutsTheTrimmedMixedMovieInTheLibrary)
+{
+    if (QStandardPaths::findExecutable("python3").isEmpty())
+        GTEST_SKIP() << "python3 is not installed";
+    ASSERT_NO_FATAL_FAILURE(run("trim-save", kTwoSaves, "fixture", "0", GetParam().program));
     expectTheTrimmedMixedMovieInTheLibrary();
 }
+
+INSTANTIATE_TEST_SUITE_P(Hosts, WholeProcessHostTest,
+                         ::testing::Values(Host{"ZafHost", ZAF_HOST_BIN}, Host{"PythonHost", ZAF_PYTHON_HOST}),
+                         [](const auto &info) { return std::string(info.param.name); });
 
 // A movie the user opens as their own: the editor works on a private clone, so after a trim and a
 // save the user's file is there, byte for byte, and the clone's folder has gone with zaf-host.
