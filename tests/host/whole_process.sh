@@ -26,6 +26,7 @@
 # second.err and second.status, for "kill-mid-trim" killed.files (what the temporary directory held
 # at the kill), and result ("ok" or what went wrong). Exits 0 when the script itself ran to its end; the caller judges the outputs.
 set -u
+. "$(dirname "$0")/../support/shell/wait_exit.sh"
 
 if [ "${1:-}" = "--inside" ]; then
     host=$2 extension=$3 scratch=$4 scenario=$5
@@ -44,14 +45,6 @@ if [ "${1:-}" = "--inside" ]; then
             for w in $(xdotool search --name "Zafrel Video Editor" 2>/dev/null); do
                 [ "$w" != "$1" ] && { echo "$w"; return 0; }
             done
-            sleep 0.1
-        done
-        return 1
-    }
-    # wait_exit PID: true once the process has gone, false after 60 s.
-    wait_exit() {
-        for _ in $(seq 1 600); do
-            kill -0 "$1" 2>/dev/null || return 0
             sleep 0.1
         done
         return 1

@@ -23,6 +23,7 @@
 # (zaf-host's exit status), notify.log (dbus-monitor's record), and result ("ok" or what went
 # wrong). Exits 0 when the script itself ran to its end; the caller judges the outputs.
 set -u
+. "$(dirname "$0")/../../support/shell/wait_exit.sh"
 
 if [ "${1:-}" = "--inside" ]; then
     host=$2 extension=$3 scratch=$4
@@ -38,14 +39,6 @@ if [ "${1:-}" = "--inside" ]; then
     new_window() {
         for _ in $(seq 1 600); do
             windows | head -n 1 | grep . && return 0
-            sleep 0.1
-        done
-        return 1
-    }
-    # wait_exit PID: true once the process has gone, false after 60 s.
-    wait_exit() {
-        for _ in $(seq 1 600); do
-            kill -0 "$1" 2>/dev/null || return 0
             sleep 0.1
         done
         return 1
