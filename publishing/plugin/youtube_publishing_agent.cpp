@@ -10,6 +10,7 @@
 #include <QDesktopServices>
 #include <QHostAddress>
 #include <QNetworkAccessManager>
+#include <QNetworkReply>
 #include <QOAuth2AuthorizationCodeFlow>
 #include <QOAuthHttpServerReplyHandler>
 #include <QPushButton>
@@ -190,8 +191,10 @@ void ZafYouTubePublishingAgent::authorizeAndUpload()
     }
     if (!m_oauth) {
         m_clientId = client->id;
+        // The token endpoint can be another (a loopback server in tests), like the upload server.
+        const QString tokenUrl = environment("ZAF_YOUTUBE_TOKEN_URL");
         m_oauth = new QOAuth2AuthorizationCodeFlow(client->id, QUrl(QString::fromLatin1(kAuthorizationUrl)),
-                                                   QUrl(QString::fromLatin1(kTokenUrl)), m_network, this);
+                                                   QUrl(tokenUrl.isEmpty() ? QString::fromLatin1(kTokenUrl) : tokenUrl), m_network, this);
         m_oauth->setScope(QString::fromLatin1(kUploadScope));
         if (!client->secret.isEmpty())
             m_oauth->setClientIdentifierSharedKey(client->secret);
@@ -211,13 +214,29 @@ void ZafYouTubePublishingAgent::authorizeAndUpload()
                 startUpload(m_oauth->token());
         });
         // A kept sign-in the service no longer accepts (revoked, expired): sign in in the browser.
-        connect(m_oauth, &QAbstractOAuth::statusChanged, this, [this](QAbstractOAuth::Status status) {
-            if (m_refreshing && status == QAbstractOAuth::Status::NotAuthenticated && m_publishing) {
-                m_refreshing = false;
-                zaf::log::info(lcPublishingAgent(), QStringLiteral("The kept sign-in was refused; signing in in the browser"));
-                zaf::publishing::forgetRefreshToken(m_clientId);
-                m_oauth->grant();
+        // The flow of this Qt version reports a refused refresh neither as an error nor as a status,
+        // so the token endpoint's answer is watched on the network itself.
+        const QUrl tokenEndpoint = m_oauth->accessTokenUrl();
+        // Only an answer of the service's (4xx: the grant is invalid) forgets the kept sign-in; a
+        // failure to reach it keeps it for the next publish.
+        connect(m_network, &QNetworkAccessManager::finished, this, [this, tokenEndpoint](QNetworkReply *reply) {
+            if (!m_refreshing || reply->url() != tokenEndpoint || reply->error() == QNetworkReply::NoError)
+                return;
+            const int status = reply->attribute(QNetworkRequest::HttpStatusCodeAttribute).toInt();
+            if (status >= 400 && status < 500) {
+                signInAfterARefusedRefresh();
+                return;
             }
+            m_refreshing = false;
+            if (!m_publishing)
+                return;
+            abandonSignIn();
+            finishPublishing(zaf::Error{QString::fromLatin1(kAgentErrorDomain), AuthorizationError,
+                                        QStringLiteral("Could not reach the sign-in service: %1").arg(reply->errorString())});
+        });
+        connect(m_oauth, &QAbstractOAuth::statusChanged, this, [this](QAbstractOAuth::Status status) {
+            if (m_refreshing && status == QAbstractOAuth::Status::NotAuthenticated)
+                signInAfterARefusedRefresh();
         });
         connect(m_oauth, &QOAuth2AuthorizationCodeFlow::error, this,
                 [this](const QString &error, const QString &description, const QUrl &) {
@@ -248,6 +267,16 @@ void ZafYouTubePublishingAgent::authorizeAndUpload()
         self->m_oauth->setRefreshToken(refreshToken);
         self->m_oauth->refreshAccessToken();
     });
+}
+
+void ZafYouTubePublishingAgent::signInAfterARefusedRefresh()
+{
+    m_refreshing = false;
+    if (!m_publishing || !m_oauth)
+        return;
+    zaf::log::info(lcPublishingAgent(), QStringLiteral("The kept sign-in was refused; signing in in the browser"));
+    zaf::publishing::forgetRefreshToken(m_clientId);
+    m_oauth->grant();
 }
 
 void ZafYouTubePublishingAgent::abandonSignIn()

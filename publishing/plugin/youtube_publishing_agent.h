@@ -89,6 +89,8 @@ private:
     void authorizeAndUpload();
     void finishPublishing(const zaf::OptionalError &error);
     // Drops a running browser sign-in: its flow, its loopback listener and its time limit.
+    // A kept sign-in was refused: it is forgotten and the user signs in in the browser.
+    void signInAfterARefusedRefresh();
     void abandonSignIn();
     // Runs on the main thread when the sign-in has not finished within signInTimeoutMs.
     void signInTimedOut();

@@ -13,6 +13,7 @@ namespace zaf::test {
 namespace {
 
 const QString kUploadPath = QStringLiteral("/upload/youtube/v3/videos");
+constexpr char kTokenPath[] = "/token";
 
 // The metadata problem the service would report, empty when the body is acceptable.
 QString metadataProblem(const QByteArray &body, const QSet<QString> &categories)
@@ -164,7 +165,9 @@ void UploadTestServer::readFrom(QTcpSocket *socket)
     }
     if (c.buffer.size() < c.contentLength)
         return;
-    if (c.headers.value("authorization") != "Bearer " + m_token)
+    if (c.target.path() == QLatin1String(kTokenPath) && c.method == QLatin1String("POST"))
+        handleTokenRequest(socket, c.buffer.left(c.contentLength));
+    else if (c.headers.value("authorization") != "Bearer " + m_token)
         respondError(socket, 401, QStringLiteral("Invalid Credentials"));
     else if (c.target.path() == kUploadPath && c.method == QLatin1String("POST"))
         handleInitiation(socket, c, c.buffer.left(c.contentLength));
@@ -172,6 +175,27 @@ void UploadTestServer::readFrom(QTcpSocket *socket)
         handlePut(socket, c, c.buffer.left(c.contentLength));
     else
         respondError(socket, 404, QStringLiteral("No such resource"));
+}
+
+QUrl UploadTestServer::tokenUrl() const
+{
+    QUrl url = baseUrl();
+    url.setPath(QLatin1String(kTokenPath));
+    return url;
+}
+
+void UploadTestServer::handleTokenRequest(QTcpSocket *socket, const QByteArray &body)
+{
+    const QUrlQuery form(QString::fromUtf8(body));
+    const bool refreshes = form.queryItemValue(QStringLiteral("grant_type")) == QLatin1String("refresh_token")
+                           && !m_refreshToken.isEmpty()
+                           && form.queryItemValue(QStringLiteral("refresh_token"), QUrl::FullyDecoded).toUtf8() == m_refreshToken;
+    const QJsonObject answer = refreshes
+        ? QJsonObject{{QStringLiteral("access_token"), QString::fromUtf8(m_token)}, {QStringLiteral("expires_in"), 3599},
+                      {QStringLiteral("token_type"), QStringLiteral("Bearer")}}
+        : QJsonObject{{QStringLiteral("error"), QStringLiteral("invalid_grant")},
+                      {QStringLiteral("error_description"), QStringLiteral("Token has been expired or revoked.")}};
+    respond(socket, refreshes ? 200 : 400, {{"Content-Type", "application/json"}}, QJsonDocument(answer).toJson(QJsonDocument::Compact));
 }
 
 void UploadTestServer::handleInitiation(QTcpSocket *socket, const Connection &c, const QByteArray &body)

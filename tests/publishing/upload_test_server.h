@@ -66,6 +66,10 @@ public:
     void queueFault(const Fault &fault) { m_faults.append(fault); }
     // The bearer token every request must carry (401 otherwise).
     void setExpectedToken(const QByteArray &token) { m_token = token; }
+    // The OAuth token endpoint at tokenUrl(): a POST refreshing a sign-in with this refresh token
+    // gets the expected bearer token; any other grant gets 400 "invalid_grant", as for a revoked one.
+    void setRefreshToken(const QByteArray &refreshToken) { m_refreshToken = refreshToken; }
+    QUrl tokenUrl() const; // http://127.0.0.1:PORT/token
     // Every answer goes out this long after the request was read (a slow link, for screenshots).
     void setResponseDelay(std::chrono::milliseconds delay) { m_responseDelay = delay; }
     // Initiations whose category is not in this set are refused with 400 (empty: any category).
@@ -104,6 +108,7 @@ private:
     void readFrom(QTcpSocket *socket);
     void handleInitiation(QTcpSocket *socket, const Connection &connection, const QByteArray &body);
     void handlePut(QTcpSocket *socket, const Connection &connection, const QByteArray &body);
+    void handleTokenRequest(QTcpSocket *socket, const QByteArray &body);
     void respond(QTcpSocket *socket, int status, const Headers &headers, const QByteArray &body = {});
     void respondError(QTcpSocket *socket, int status, const QString &message, const Headers &headers = {});
     std::optional<Fault> takeFault(FaultKind kind);
@@ -120,6 +125,7 @@ private:
     QHash<QTcpSocket *, Connection> m_connections;
     QList<Fault> m_faults;
     QByteArray m_token = "test-token";
+    QByteArray m_refreshToken;
     QSet<QString> m_categories;
     QMap<QString, Session> m_sessions;
     QMap<QString, QByteArray> m_videos;
