@@ -8,12 +8,12 @@
 #include "host/watch/movie_check.h"
 #include "host/watch/termination_signals.h"
 #include "platform/dispatch.h"
+#include "platform/files/user_folders.h"
 #include "platform/log.h"
 
 #include <QCoreApplication>
 #include <QDir>
 #include <QFileInfo>
-#include <QStandardPaths>
 #include <QTimer>
 
 #include <cstring>
@@ -38,24 +38,18 @@ QString canonical(const QString &path)
     return resolved.isEmpty() ? QDir::cleanPath(QDir(path).absolutePath()) : resolved;
 }
 
-QString videosFolder()
-{
-    const QString movies = QStandardPaths::writableLocation(QStandardPaths::MoviesLocation);
-    return movies.isEmpty() ? QDir::homePath() + QStringLiteral("/Videos") : movies;
-}
-
 } // namespace
 
 QString defaultWatchFolder()
 {
-    return QDir(videosFolder()).filePath(QStringLiteral("Screencasts"));
+    return QDir(zaf::files::videosFolder()).filePath(QStringLiteral("Screencasts"));
 }
 
 std::optional<QString> watchFolderProblem(const QString &folder, bool givenByTheUser)
 {
     if (givenByTheUser && !QFileInfo(folder).isDir())
         return QStringLiteral("the folder %1 does not exist").arg(folder);
-    const QString library = qEnvironmentVariableIsEmpty("ZAF_VIDEO_LIBRARY") ? videosFolder() : qEnvironmentVariable("ZAF_VIDEO_LIBRARY");
+    const QString library = zaf::files::videoLibraryFolder();
     if (canonical(folder) == canonical(library))
         return QStringLiteral("%1 is the video library the editor saves into: every save would be offered again; watch the folder "
                               "your recorder saves into (by default %2)").arg(folder, defaultWatchFolder());

@@ -48,14 +48,13 @@ struct WatchSettings {
     QString cacheDirectory;   // where the private clones' folders go
 };
 
-// The desktop's screencast folder, `$(xdg-user-dir VIDEOS)/Screencasts`: the Videos folder as the
-// user's user-dirs.dirs names it (QStandardPaths::MoviesLocation), else ~/Videos.
+// The desktop's screencast folder, `$(xdg-user-dir VIDEOS)/Screencasts` (files::videosFolder()).
 QString defaultWatchFolder();
 
 // Why `folder` cannot be watched, or nullopt when it can. A folder the user named must be an existing
 // folder; the default one may be missing (it is waited for, as the desktop's recorder makes it on its
-// first recording). Neither may be the video library the editor saves into ($ZAF_VIDEO_LIBRARY,
-// else the Videos folder, as the editor's library finds it): each save would be offered again.
+// first recording). Neither may be the video library the editor saves into
+// (files::videoLibraryFolder()): each save would be offered again.
 std::optional<QString> watchFolderProblem(const QString &folder, bool givenByTheUser);
 
 class WatchMode : public QObject {

@@ -1,6 +1,7 @@
 #include "platform/photos/photo_library.h"
 
 #include "platform/files/file_manager.h"
+#include "platform/files/user_folders.h"
 #include "platform/dispatch.h"
 #include "platform/log.h"
 #include "platform/media/media_asset.h"
@@ -9,7 +10,6 @@
 #include <QDateTime>
 #include <QDir>
 #include <QFileInfo>
-#include <QStandardPaths>
 #include <QThreadPool>
 
 Q_LOGGING_CATEGORY(lcPhotos, "zaf.photos")
@@ -48,13 +48,7 @@ QString candidateName(const QDateTime &when, int attempt)
 
 PhotoLibrary &PhotoLibrary::sharedPhotoLibrary()
 {
-    static PhotoLibrary library([] {
-        const QString overridden = qEnvironmentVariable("ZAF_VIDEO_LIBRARY");
-        if (!overridden.isEmpty())
-            return overridden;
-        QString movies = QStandardPaths::writableLocation(QStandardPaths::MoviesLocation);
-        return movies.isEmpty() ? QDir::homePath() + QStringLiteral("/Videos") : movies;
-    }());
+    static PhotoLibrary library(zaf::files::videoLibraryFolder());
     return library;
 }
 
