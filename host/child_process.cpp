@@ -9,7 +9,6 @@
 #include <cerrno>
 #include <chrono>
 #include <condition_variable>
-#include <csignal>
 #include <cstring>
 #include <mutex>
 #include <thread>
@@ -76,14 +75,8 @@ ChildProcess::~ChildProcess()
 {
     if (!d->started)
         return;
-    if (!d->reaped && !d->waitForEnd(d->graceMs)) {
-        log::error(lcHost(), QStringLiteral("%1 did not exit within %2 ms; sending SIGTERM").arg(d->describe()).arg(d->graceMs));
-        ::kill(d->pid, SIGTERM);
-        if (!d->waitForEnd(d->graceMs)) {
-            log::error(lcHost(), QStringLiteral("%1 did not exit after SIGTERM; sending SIGKILL").arg(d->describe()));
-            ::kill(d->pid, SIGKILL);
-        }
-    }
+    if (!d->reaped)
+        endChild(d->pid, d->graceMs, [this](int milliseconds) { return d->waitForEnd(milliseconds); }, d->describe());
     // The child has ended (or been killed, which ends it at once): the watcher returns.
     d->watcher.join();
     d->reap(false);

@@ -112,6 +112,18 @@ std::optional<pid_t> spawnChild(const ChildSpec &spec, QString *error)
     return pid;
 }
 
+void endChild(pid_t pid, int graceMs, const std::function<bool(int milliseconds)> &waitForEnd, const QString &description)
+{
+    if (waitForEnd(graceMs))
+        return;
+    log::error(lcHost(), QStringLiteral("%1 did not exit within %2 ms; sending SIGTERM").arg(description).arg(graceMs));
+    ::kill(pid, SIGTERM);
+    if (waitForEnd(graceMs))
+        return;
+    log::error(lcHost(), QStringLiteral("%1 did not exit after SIGTERM; sending SIGKILL").arg(description));
+    ::kill(pid, SIGKILL);
+}
+
 int reapChild(pid_t pid, const QString &description)
 {
     int status = 0;

@@ -15,6 +15,7 @@
 
 #include <sys/types.h>
 
+#include <functional>
 #include <optional>
 
 namespace zaf::host {
@@ -31,6 +32,12 @@ struct ChildSpec {
 
 // Starts the child and returns its process ID, or nullopt with `error` filled (when given).
 std::optional<pid_t> spawnChild(const ChildSpec &spec, QString *error = nullptr);
+
+// Ends a child still running, as its owner's destructor does: it gets `graceMs` to exit by itself
+// (its owner has asked it to, by closing its channel say), then SIGTERM and another `graceMs`, then
+// SIGKILL. `waitForEnd(ms)` waits up to ms for the child's end without collecting it, true once it
+// has ended. Logs each escalation under "zaf.host", naming the child `description`. Does not reap.
+void endChild(pid_t pid, int graceMs, const std::function<bool(int milliseconds)> &waitForEnd, const QString &description);
 
 // Collects an ended child (waits for it when it has not ended yet) and logs how it ended under
 // "zaf.host", naming it `description`. Its exit status, 128 + the signal number when a signal

@@ -50,15 +50,10 @@ PolledSession::~PolledSession()
         return;
     // The closed channel is the removal of the extension's view: it tidies up and exits by itself.
     m_channel.reset();
-    if (!waitForEnd(m_graceMs)) {
-        log::error(lcHost(), QStringLiteral("the extension (process %1) did not exit within %2 ms; sending SIGTERM").arg(m_pid).arg(m_graceMs));
-        ::pidfd_send_signal(m_processFd.get(), SIGTERM, nullptr, 0);
-        if (!waitForEnd(m_graceMs)) {
-            log::error(lcHost(), QStringLiteral("the extension (process %1) did not exit after SIGTERM; sending SIGKILL").arg(m_pid));
-            ::pidfd_send_signal(m_processFd.get(), SIGKILL, nullptr, 0);
-        }
-    }
-    reapChild(m_pid, QStringLiteral("the extension (process %1)").arg(m_pid));
+    // The child is not reaped until below, so its process ID cannot have been reused.
+    const QString description = QStringLiteral("the extension (process %1)").arg(m_pid);
+    endChild(m_pid, m_graceMs, [this](int milliseconds) { return waitForEnd(milliseconds); }, description);
+    reapChild(m_pid, description);
 }
 
 bool PolledSession::start(const QString &extensionExecutable, const QList<InputItem> &items, Callbacks callbacks, QString *error)
