@@ -47,7 +47,7 @@
 
 namespace {
 
-constexpr char kExtensionName[] = "zaf-video-editor-extension";
+constexpr const char *kExtensionName = zaf::install::kExtensionProgram;
 // Who asks for the editor when a user opens a movie of their own: the editor, by its desktop entry.
 constexpr char kOwnAppName[] = "Zafrel";
 constexpr char kOwnBundleIdentifier[] = "com.zafrel.VideoEditor";

@@ -25,5 +25,7 @@ QString dataPath(const char *overrideVariable, const QString &relativePath, cons
 inline constexpr const char *kStringTablesDir = "share/zafrel";
 inline constexpr const char *kPluginsDir = "lib/zafrel/plugins";
 inline constexpr const char *kLibexecDir = "libexec/zafrel";
+// The editor extension's program, in kLibexecDir once installed.
+inline constexpr const char *kExtensionProgram = "zaf-video-editor-extension";
 
 } // namespace zaf::install

@@ -3,6 +3,7 @@
 
 #include "host/demo/demo_window.h"
 #include "host/input_items.h"
+#include "platform/install_layout.h"
 #include "platform/log.h"
 
 #include <QApplication>
@@ -15,7 +16,7 @@
 
 namespace {
 
-constexpr char kExtensionName[] = "zaf-video-editor-extension";
+constexpr const char *kExtensionName = zaf::install::kExtensionProgram;
 
 bool isExecutableFile(const QString &path)
 {

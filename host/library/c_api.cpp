@@ -4,6 +4,7 @@
 
 #include "host/input_items.h"
 #include "host/library/polled_session.h"
+#include "platform/install_layout.h"
 
 #include <QByteArray>
 #include <QDir>
@@ -28,7 +29,7 @@ struct zafrel_host_session {
 
 namespace {
 
-constexpr char kExtensionName[] = "zaf-video-editor-extension";
+constexpr const char *kExtensionName = zaf::install::kExtensionProgram;
 
 int failed(zafrel_host_session *s, const QString &message)
 {
@@ -186,7 +187,7 @@ const char *zafrel_host_extension_path(void)
         const QString prefix = installPrefix();
         if (prefix.isEmpty())
             return QByteArray();
-        const QString candidate = QDir(prefix).filePath(QStringLiteral(ZAF_HOST_LIBEXECDIR "/") + QLatin1String(kExtensionName));
+        const QString candidate = QDir(prefix).filePath(QLatin1String(zaf::install::kLibexecDir) + QLatin1Char('/') + QLatin1String(kExtensionName));
         const QFileInfo info(candidate);
         return info.isFile() && info.isExecutable() ? QFile::encodeName(candidate) : QByteArray();
     }();
