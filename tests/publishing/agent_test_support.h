@@ -5,13 +5,18 @@
 // the authorization page the process opens instead of starting a desktop browser. Main thread only.
 
 #include "platform/ui/view_controller.h"
+#include "publishing/plugin_loader.h"
 #include "publishing/publishing_agent.h"
 
 #include <QDesktopServices>
 #include <QObject>
+#include <QStringList>
 #include <QTcpSocket>
 #include <QUrl>
 #include <QUrlQuery>
+
+#include <memory>
+#include <optional>
 
 namespace zaf::test {
 
@@ -34,6 +39,20 @@ inline ui::ViewController *formOf(ZafPublishingAgent *agent)
 {
     const QList<ui::ViewController *> children = agent ? agent->navigationController()->childViewControllers() : QList<ui::ViewController *>();
     return children.isEmpty() ? nullptr : children.first();
+}
+
+// A new agent of the built plug-in (ZAF_PUBLISHING_PLUGIN_PATH) with its form's view loaded, as
+// when the form is presented; null when the plug-in does not load.
+inline std::unique_ptr<ZafPublishingAgent> makeAgent()
+{
+    const auto agentClass = zaf::publishing::publishingAgentClass(QStringLiteral(ZAF_PUBLISHING_PLUGIN_PATH),
+                                                                  QLatin1String(kZafYouTubePublishingAgentClassName));
+    if (!agentClass.ok())
+        return nullptr;
+    std::unique_ptr<ZafPublishingAgent> agent(qobject_cast<ZafPublishingAgent *>(agentClass.value->newInstance()));
+    if (auto *form = formOf(agent.get()))
+        form->view();
+    return agent;
 }
 
 class BrowserStub : public QObject {
@@ -65,6 +84,24 @@ struct SignInEnvironment {
     ~SignInEnvironment() { qunsetenv("ZAF_YOUTUBE_CLIENT_ID"); }
 
     BrowserStub browser;
+};
+
+// The agent's delegate, recording its calls in order ("displayed", "done", "cancel", "begin",
+// "end") and the error publishing ended with.
+class RecordingDelegate : public ZafPublishingAgentDelegate {
+public:
+    void publishingAgentWillBeDisplayed(ZafPublishingAgent *) override { events << QStringLiteral("displayed"); }
+    void publishingAgentDoneButtonClicked(ZafPublishingAgent *) override { events << QStringLiteral("done"); }
+    void publishingAgentCancelButtonClicked(ZafPublishingAgent *) override { events << QStringLiteral("cancel"); }
+    void publishingAgentDidBeginPublishing(ZafPublishingAgent *) override { events << QStringLiteral("begin"); }
+    void publishingAgentDidEndPublishingError(ZafPublishingAgent *, const std::optional<zaf::Error> &e) override
+    {
+        events << QStringLiteral("end");
+        error = e;
+    }
+
+    QStringList events;
+    std::optional<zaf::Error> error;
 };
 
 // Whether something listens on 127.0.0.1:port.

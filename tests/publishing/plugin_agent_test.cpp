@@ -22,36 +22,10 @@ ZAF_PRINT_CASES_AS_NAMES
 using zaf::test::formOf;
 using zaf::test::invokeForObject;
 using zaf::test::invokeForString;
+using zaf::test::makeAgent;
+using zaf::test::RecordingDelegate;
 
 const QString kPluginPath = QStringLiteral(ZAF_PUBLISHING_PLUGIN_PATH);
-
-// A new agent with its form's view loaded, as when the form is presented.
-std::unique_ptr<ZafPublishingAgent> makeAgent()
-{
-    const auto agentClass = zaf::publishing::publishingAgentClass(kPluginPath, QLatin1String(kZafYouTubePublishingAgentClassName));
-    if (!agentClass.ok())
-        return nullptr;
-    std::unique_ptr<ZafPublishingAgent> agent(qobject_cast<ZafPublishingAgent *>(agentClass.value->newInstance()));
-    if (auto *form = formOf(agent.get()))
-        form->view();
-    return agent;
-}
-
-class RecordingDelegate : public ZafPublishingAgentDelegate {
-public:
-    void publishingAgentWillBeDisplayed(ZafPublishingAgent *) override { events << QStringLiteral("displayed"); }
-    void publishingAgentDoneButtonClicked(ZafPublishingAgent *) override { events << QStringLiteral("done"); }
-    void publishingAgentCancelButtonClicked(ZafPublishingAgent *) override { events << QStringLiteral("cancel"); }
-    void publishingAgentDidBeginPublishing(ZafPublishingAgent *) override { events << QStringLiteral("begin"); }
-    void publishingAgentDidEndPublishingError(ZafPublishingAgent *, const std::optional<zaf::Error> &e) override
-    {
-        events << QStringLiteral("end");
-        error = e;
-    }
-
-    QStringList events;
-    std::optional<zaf::Error> error;
-};
 
 class PublishingAgentTest : public ::testing::Test {
 protected:

@@ -3,7 +3,6 @@
 // endpoint. A kept refresh token signs in without the browser; one the service refuses is forgotten
 // and the browser takes over.
 #include "publishing/plugin/signin/refresh_token_store.h"
-#include "publishing/plugin_loader.h"
 #include "tests/publishing/agent_test_support.h"
 #include "tests/publishing/upload_test_server.h"
 #include "tests/support/named_cases.h"
@@ -77,21 +76,6 @@ private:
 
 const auto *const kStore = ::testing::AddGlobalTestEnvironment(new PrivateSecretStore);
 
-class RecordingDelegate : public ZafPublishingAgentDelegate {
-public:
-    void publishingAgentWillBeDisplayed(ZafPublishingAgent *) override {}
-    void publishingAgentDoneButtonClicked(ZafPublishingAgent *) override {}
-    void publishingAgentCancelButtonClicked(ZafPublishingAgent *) override {}
-    void publishingAgentDidBeginPublishing(ZafPublishingAgent *) override {}
-    void publishingAgentDidEndPublishingError(ZafPublishingAgent *, const std::optional<zaf::Error> &e) override
-    {
-        ended = true;
-        error = e;
-    }
-    bool ended = false;
-    std::optional<zaf::Error> error;
-};
-
 // Keeps `token` for the test client in the store, and reads it back.
 QString keep(const QString &token)
 {
@@ -136,16 +120,12 @@ TEST_P(KeptSignInTest, IsRefreshedOrGivesWayToTheBrowser)
     SignInEnvironment signIn;
     ASSERT_EQ(keep(QLatin1String(c.keptToken)), QLatin1String(c.keptToken)) << "the keyring keeps a token";
 
-    const auto agentClass = publishing::publishingAgentClass(QStringLiteral(ZAF_PUBLISHING_PLUGIN_PATH),
-                                                             QLatin1String(kZafYouTubePublishingAgentClassName));
-    ASSERT_TRUE(agentClass.ok());
-    std::unique_ptr<ZafPublishingAgent> agent(qobject_cast<ZafPublishingAgent *>(agentClass.value->newInstance()));
+    std::unique_ptr<ZafPublishingAgent> agent = makeAgent();
     ASSERT_NE(agent, nullptr);
     RecordingDelegate delegate;
     agent->setDelegate(&delegate);
     ui::ViewController *form = formOf(agent.get());
     ASSERT_NE(form, nullptr);
-    form->view();
     QMetaObject::invokeMethod(form, "setTitle", Q_ARG(QString, QStringLiteral("Kept sign-in")));
     QFile movie(scratch.file(QStringLiteral("movie.mp4")));
     ASSERT_TRUE(movie.open(QIODevice::WriteOnly) && movie.write(QByteArray(200 * 1024, 'v')) > 0);
@@ -154,7 +134,7 @@ TEST_P(KeptSignInTest, IsRefreshedOrGivesWayToTheBrowser)
     ASSERT_TRUE(agent->setProperty("signInTimeoutMs", 2000));
     ASSERT_TRUE(QMetaObject::invokeMethod(agent.get(), "publishAction"));
 
-    ASSERT_TRUE(waitUntil([&] { return delegate.ended; }, 20000));
+    ASSERT_TRUE(waitUntil([&] { return delegate.events.contains(QStringLiteral("end")); }, 20000));
     EXPECT_EQ(signIn.browser.opened.size(), c.browserOpenings);
     EXPECT_EQ(delegate.error.has_value(), !c.serviceAcceptsIt) << (delegate.error ? delegate.error->message.toStdString() : "");
     const auto tokenRequests = std::count_if(server.requests().begin(), server.requests().end(),
